@@ -1,0 +1,50 @@
+# The README's commands. Each target installs what it needs, configures,
+# builds only what it runs, and runs it.
+JOBS ?= $(shell nproc)
+CMAKE_GEN := -G Ninja
+
+.PHONY: all deps build test asan tsan bench format format-check clean
+
+all: build
+
+deps:
+	@scripts/install-deps
+
+build/build.ninja: CMakeLists.txt | deps
+	cmake -S . -B build $(CMAKE_GEN)
+
+build: deps build/build.ninja
+	cmake --build build -j $(JOBS)
+
+# Build and run every test suite.
+test: deps build/build.ninja
+	cmake --build build -j $(JOBS) --target all_tests
+	ctest --test-dir build --output-on-failure -j $(JOBS)
+
+# AddressSanitizer and UndefinedBehaviorSanitizer over the whole suite.
+asan: deps
+	cmake -S . -B build-asan $(CMAKE_GEN) -DVR_SANITIZE="address;undefined" -DVR_BUILD_BENCH=OFF
+	cmake --build build-asan -j $(JOBS) --target all_tests
+	ASAN_OPTIONS=detect_leaks=1:abort_on_error=1 UBSAN_OPTIONS=print_stacktrace=1:halt_on_error=1 \
+	  ctest --test-dir build-asan --output-on-failure -j $(JOBS)
+
+# ThreadSanitizer over the suites that run real threads.
+tsan: deps
+	cmake -S . -B build-tsan $(CMAKE_GEN) -DVR_SANITIZE=thread -DVR_BUILD_BENCH=OFF
+	cmake --build build-tsan -j $(JOBS) --target threaded_tests
+	TSAN_OPTIONS=halt_on_error=1:second_deadlock_stack=1 scripts/no-aslr \
+	  ctest --test-dir build-tsan --output-on-failure -L threaded
+
+# Build the benchmarks in the optimised tree and run them all.
+bench: deps build/build.ninja
+	cmake --build build -j $(JOBS)
+	scripts/run-benchmarks build
+
+format:
+	git ls-files '*.h' '*.cpp' | xargs clang-format -i
+
+format-check:
+	git ls-files '*.h' '*.cpp' | xargs clang-format --dry-run --Werror
+
+clean:
+	rm -rf build build-asan build-tsan

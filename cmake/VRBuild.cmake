@@ -1,0 +1,67 @@
+# Project-wide compile settings and the helpers every folder uses.
+
+find_program(VR_CCACHE ccache)
+if(VR_CCACHE)
+    set(CMAKE_C_COMPILER_LAUNCHER "${VR_CCACHE}")
+    set(CMAKE_CXX_COMPILER_LAUNCHER "${VR_CCACHE}")
+endif()
+
+add_compile_options(-Wall -Wextra -Werror)
+
+if(VR_SANITIZE)
+    list(JOIN VR_SANITIZE "," _vr_san)
+    add_compile_options(-fsanitize=${_vr_san} -fno-omit-frame-pointer -fno-sanitize-recover=all)
+    add_link_options(-fsanitize=${_vr_san})
+endif()
+
+# vr_add_library(NAME <sources...>): a host or module library with its public
+# headers in include/ and its private ones beside the sources in src/.
+# The target is NAME with the alias VR::NAME.
+function(vr_add_library NAME)
+    add_library(${NAME} SHARED ${ARGN})
+    add_library(VR::${NAME} ALIAS ${NAME})
+    target_include_directories(${NAME}
+        PUBLIC $<BUILD_INTERFACE:${CMAKE_CURRENT_SOURCE_DIR}/include>
+        PRIVATE ${CMAKE_CURRENT_SOURCE_DIR}/src)
+    set_target_properties(${NAME} PROPERTIES OUTPUT_NAME vr_${NAME})
+endfunction()
+
+# vr_add_test(NAME SOURCES <files...> LIBS <targets...> [THREADED])
+# One GoogleTest executable, run by ctest as one test. THREADED marks suites
+# that exercise real concurrency; the ThreadSanitizer run builds and runs
+# only those (target `threaded_tests`, ctest label `threaded`).
+function(vr_add_test NAME)
+    cmake_parse_arguments(T "THREADED" "" "SOURCES;LIBS" ${ARGN})
+    add_executable(${NAME} ${T_SOURCES})
+    target_link_libraries(${NAME} PRIVATE ${T_LIBS} GTest::gtest GTest::gmock GTest::gtest_main
+                                          Threads::Threads)
+    add_test(NAME ${NAME} COMMAND ${NAME} --gtest_brief=1)
+    set(_labels unit)
+    if(T_THREADED)
+        list(APPEND _labels threaded)
+        set_property(GLOBAL APPEND PROPERTY VR_THREADED_TESTS ${NAME})
+    endif()
+    set_tests_properties(${NAME} PROPERTIES LABELS "${_labels}" TIMEOUT 600)
+    set_property(GLOBAL APPEND PROPERTY VR_ALL_TESTS ${NAME})
+endfunction()
+
+function(vr_finish_tests)
+    get_property(_threaded GLOBAL PROPERTY VR_THREADED_TESTS)
+    get_property(_all GLOBAL PROPERTY VR_ALL_TESTS)
+    add_custom_target(threaded_tests)
+    if(_threaded)
+        add_dependencies(threaded_tests ${_threaded})
+    endif()
+    add_custom_target(all_tests)
+    if(_all)
+        add_dependencies(all_tests ${_all})
+    endif()
+endfunction()
+
+# vr_add_benchmark(NAME <sources...> LIBS <targets...>)
+function(vr_add_benchmark NAME)
+    cmake_parse_arguments(B "" "" "SOURCES;LIBS" ${ARGN})
+    add_executable(${NAME} ${B_SOURCES})
+    target_link_libraries(${NAME} PRIVATE ${B_LIBS} benchmark::benchmark benchmark::benchmark_main
+                                          Threads::Threads)
+endfunction()
