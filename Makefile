@@ -18,7 +18,7 @@ build: deps build/build.ninja
 
 # Build and run every test suite.
 test: deps build/build.ninja
-	cmake --build build -j $(JOBS) --target all_tests
+	cmake --build build -j $(JOBS)
 	ctest --test-dir build --output-on-failure -j $(JOBS)
 
 # AddressSanitizer and UndefinedBehaviorSanitizer over the whole suite.

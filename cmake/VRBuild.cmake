@@ -33,6 +33,7 @@ endfunction()
 function(vr_add_test NAME)
     cmake_parse_arguments(T "THREADED" "" "SOURCES;LIBS" ${ARGN})
     add_executable(${NAME} ${T_SOURCES})
+    target_include_directories(${NAME} PRIVATE ${PROJECT_SOURCE_DIR}/tests/support)
     target_link_libraries(${NAME} PRIVATE ${T_LIBS} GTest::gtest GTest::gmock GTest::gtest_main
                                           Threads::Threads)
     add_test(NAME ${NAME} COMMAND ${NAME} --gtest_brief=1)
