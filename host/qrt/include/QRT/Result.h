@@ -16,6 +16,8 @@ inline constexpr Result kResult_Success = 0;
 inline constexpr Result kResult_NotFound = static_cast<Result>(0xA00F0001u);
 // The object does not implement the requested interface.
 inline constexpr Result kResult_NoInterface = static_cast<Result>(0xA00A0001u);
+// A registration under an identifier or name that is already taken.
+inline constexpr Result kResult_AlreadyExists = static_cast<Result>(0xA00F0002u);
 
 inline constexpr bool Succeeded(Result inResult) noexcept
 {

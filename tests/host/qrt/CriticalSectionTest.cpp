@@ -1,0 +1,142 @@
+#include "QRT/CriticalSection.h"
+
+#include "mvxcore/config/Error.h"
+
+#include <atomic>
+#include <condition_variable>
+#include <cstring>
+#include <mutex>
+#include <thread>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+namespace
+{
+
+class CriticalSectionTest : public ::testing::Test
+{
+};
+
+TEST_F(CriticalSectionTest, LockExcludesOtherThreads)
+{
+    QRT::CriticalSection section;
+    int64_t counter = 0; // guarded by section
+    std::vector<std::thread> threads;
+    for (int t = 0; t < 4; ++t)
+    {
+        threads.emplace_back(
+            [&]
+            {
+                for (int i = 0; i < 20000; ++i)
+                {
+                    QRT::CriticalSectionLock lock(section, "CriticalSectionTest::Increment");
+                    // A non-atomic read-modify-write loses updates without exclusion.
+                    const int64_t value = counter;
+                    counter = value + 1;
+                }
+            });
+    }
+    for (std::thread& thread : threads)
+        thread.join();
+    EXPECT_EQ(counter, 80000);
+}
+
+TEST_F(CriticalSectionTest, LabelIsKeptWhileHeld)
+{
+    QRT::CriticalSection section;
+    {
+        QRT::CriticalSectionLock lock(section, "RenderFrameQueue::OnAcceleratedRenderCompletion");
+        EXPECT_STREQ(lock.GetLabel(), "RenderFrameQueue::OnAcceleratedRenderCompletion");
+        EXPECT_STREQ(section.GetOwnerLabel(), "RenderFrameQueue::OnAcceleratedRenderCompletion");
+        EXPECT_TRUE(section.IsLockedByCurrentThread());
+    }
+    EXPECT_EQ(section.GetOwnerLabel(), nullptr);
+    EXPECT_FALSE(section.IsLockedByCurrentThread());
+}
+
+TEST_F(CriticalSectionTest, UnlockAndRelockLetOthersIn)
+{
+    QRT::CriticalSection section;
+    QRT::CriticalSectionLock lock(section, "outer");
+    lock.Unlock();
+    EXPECT_FALSE(lock.IsLocked());
+    bool taken = false;
+    std::thread other(
+        [&]
+        {
+            taken = section.TryLock("other");
+            if (taken)
+                section.Unlock();
+        });
+    other.join();
+    EXPECT_TRUE(taken);
+    lock.Relock();
+    EXPECT_TRUE(lock.IsLocked());
+    EXPECT_STREQ(section.GetOwnerLabel(), "outer");
+    std::thread blocked([&] { taken = section.TryLock(); });
+    blocked.join();
+    EXPECT_FALSE(taken);
+}
+
+TEST_F(CriticalSectionTest, RelockingOnTheHoldingThreadIsAContractViolation)
+{
+    QRT::CriticalSection section;
+    QRT::CriticalSectionLock lock(section);
+    EXPECT_THROW(section.Lock(), mvxcore::config::Error);
+    EXPECT_THROW(section.TryLock(), mvxcore::config::Error);
+    // The failed attempts left the section held by this thread.
+    EXPECT_TRUE(section.IsLockedByCurrentThread());
+}
+
+TEST_F(CriticalSectionTest, UnlockingWithoutHoldingIsAContractViolation)
+{
+    QRT::CriticalSection section;
+    EXPECT_THROW(section.Unlock(), mvxcore::config::Error);
+    QRT::CriticalSectionLock lock(section);
+    std::thread other(
+        [&]
+        {
+            try
+            {
+                section.Unlock();
+                ADD_FAILURE() << "a foreign unlock was accepted";
+            }
+            catch (const mvxcore::config::Error& inError)
+            {
+                EXPECT_EQ(inError.GetExpression(), "IsLockedByCurrentThread()");
+            }
+        });
+    other.join();
+    EXPECT_TRUE(section.IsLockedByCurrentThread());
+    lock.Unlock();
+    EXPECT_THROW(lock.Unlock(), mvxcore::config::Error);
+}
+
+TEST_F(CriticalSectionTest, WorksWithStandardLockUtilities)
+{
+    QRT::CriticalSection first;
+    QRT::CriticalSection second;
+    {
+        std::scoped_lock both(first, second);
+        EXPECT_TRUE(first.IsLockedByCurrentThread());
+        EXPECT_TRUE(second.IsLockedByCurrentThread());
+    }
+    std::condition_variable_any condition;
+    bool ready = false; // guarded by first
+    std::thread signaller(
+        [&]
+        {
+            std::unique_lock lock(first);
+            ready = true;
+            condition.notify_all();
+        });
+    {
+        std::unique_lock lock(first);
+        condition.wait(lock, [&] { return ready; });
+        EXPECT_TRUE(first.IsLockedByCurrentThread());
+    }
+    signaller.join();
+}
+
+} // namespace

@@ -1,0 +1,173 @@
+#include "QRT/Hash.h"
+
+#include "mvxcore/config/Error.h"
+
+#include <cstring>
+#include <string>
+#include <vector>
+
+#include <gtest/gtest.h>
+#include <xxhash.h>
+
+namespace
+{
+
+// The documented chaining rule, computed independently: add the size to the
+// little-endian length word in bytes 12..15, hash (value || data) with
+// XXH3-128, keep the low 96 digest bits little-endian and the length.
+QRT::HashValue ReferenceMix(const QRT::HashValue& inHash, const void* inData, size_t inSize)
+{
+    std::vector<uint8_t> input(inHash.mBytes.begin(), inHash.mBytes.end());
+    uint32_t length = 0;
+    std::memcpy(&length, &input[12], 4); // the test machines are little-endian
+    length += static_cast<uint32_t>(inSize);
+    std::memcpy(&input[12], &length, 4);
+    const uint8_t* bytes = static_cast<const uint8_t*>(inData);
+    input.insert(input.end(), bytes, bytes + inSize);
+    const XXH128_hash_t digest = XXH3_128bits(input.data(), input.size());
+    QRT::HashValue result;
+    std::memcpy(&result.mBytes[0], &digest.low64, 8);
+    const uint32_t high = static_cast<uint32_t>(digest.high64);
+    std::memcpy(&result.mBytes[8], &high, 4);
+    std::memcpy(&result.mBytes[12], &length, 4);
+    return result;
+}
+
+class HashTest : public ::testing::Test
+{
+};
+
+TEST_F(HashTest, StartsAtZero)
+{
+    const QRT::HashValue hash;
+    EXPECT_TRUE(hash.IsZero());
+    EXPECT_EQ(hash.GetRunningLength(), 0u);
+    EXPECT_EQ(QRT::HashValueToGuid(hash), QRT::Guid());
+}
+
+TEST_F(HashTest, RunningLengthCountsEveryMixedByte)
+{
+    QRT::HashValue hash;
+    QRT::MixHash::MixInString(hash, "ab");
+    EXPECT_EQ(hash.GetRunningLength(), 2u);
+    EXPECT_EQ(hash.mBytes[12], 2u);
+    EXPECT_EQ(hash.mBytes[13], 0u);
+    QRT::MixHash::MixInString(hash, "c");
+    EXPECT_EQ(hash.GetRunningLength(), 3u);
+    QRT::MixHash::MixInGuid(hash, QRT::Guid("{6593E8B4-4082-48a4-A816-D02043C80893}"));
+    EXPECT_EQ(hash.GetRunningLength(), 19u);
+    QRT::MixHash::MixInValue(hash, uint64_t{7});
+    EXPECT_EQ(hash.GetRunningLength(), 27u);
+    EXPECT_FALSE(hash.IsZero());
+}
+
+TEST_F(HashTest, RunningLengthWrapsModulo2To32)
+{
+    QRT::HashValue hash;
+    hash.mBytes[12] = 0xFE;
+    hash.mBytes[13] = 0xFF;
+    hash.mBytes[14] = 0xFF;
+    hash.mBytes[15] = 0xFF;
+    QRT::MixHash::MixInString(hash, "abc");
+    EXPECT_EQ(hash.GetRunningLength(), 1u);
+}
+
+TEST_F(HashTest, SplitRunsDifferFromOneRun)
+{
+    QRT::HashValue split;
+    QRT::MixHash::MixInString(split, "ab");
+    QRT::MixHash::MixInString(split, "c");
+    QRT::HashValue whole;
+    QRT::MixHash::MixInString(whole, "abc");
+    EXPECT_EQ(split.GetRunningLength(), whole.GetRunningLength());
+    EXPECT_NE(split, whole);
+    EXPECT_NE(QRT::HashValueToGuid(split), QRT::HashValueToGuid(whole));
+}
+
+TEST_F(HashTest, EmptyRunStillChangesTheValue)
+{
+    QRT::HashValue hash;
+    QRT::MixHash::MixInString(hash, "");
+    EXPECT_FALSE(hash.IsZero());
+    EXPECT_EQ(hash.GetRunningLength(), 0u);
+}
+
+TEST_F(HashTest, MatchesTheDocumentedChainingRule)
+{
+    QRT::HashValue expected;
+    const std::string first = "ML::RenderableNodeCommonImpl";
+    expected = ReferenceMix(expected, first.data(), first.size());
+    const uint32_t quality = 5;
+    expected = ReferenceMix(expected, &quality, sizeof(quality));
+
+    QRT::HashValue hash;
+    QRT::MixHash::MixInString(hash,
+                              QRT::ImmutableString::CreateStatic("ML::RenderableNodeCommonImpl"));
+    QRT::MixHash::MixInValue(hash, quality);
+    EXPECT_EQ(hash, expected);
+    EXPECT_EQ(hash.GetRunningLength(), 32u);
+}
+
+TEST_F(HashTest, LongRunsUseTheSameRuleAsShortOnes)
+{
+    // Above the one-shot buffer the streaming path must give the same digest.
+    for (size_t size : {size_t{240}, size_t{2048}, size_t{2049}, size_t{10000}})
+    {
+        std::vector<uint8_t> data(size);
+        for (size_t i = 0; i < size; ++i)
+            data[i] = static_cast<uint8_t>(i * 31 + 7);
+        QRT::HashValue start;
+        QRT::MixHash::MixInString(start, "seed");
+        QRT::HashValue hash = start;
+        QRT::MixHash::MixInData(hash, data.data(), data.size());
+        EXPECT_EQ(hash, ReferenceMix(start, data.data(), data.size())) << size;
+    }
+}
+
+TEST_F(HashTest, KnownInputGivesAPinnedKey)
+{
+    // Keys are stored by the frame cache and compared between runs: a change
+    // of chaining, byte order or length handling must show up here. The
+    // running length 3 is visible as the key's last four bytes.
+    QRT::HashValue hash;
+    QRT::MixHash::MixInString(hash, "abc");
+    EXPECT_EQ(hash, ReferenceMix(QRT::HashValue(), "abc", 3));
+    EXPECT_EQ(QRT::HashValueToGuid(hash).ToString(), "{80b88241-fce6-a9d5-7a48-03b700000003}");
+}
+
+TEST_F(HashTest, GuidIsMixedAsItsSixteenMemoryBytes)
+{
+    const QRT::Guid guid("{01020304-0506-0708-090a-0b0c0d0e0f10}");
+    QRT::HashValue viaGuid;
+    QRT::MixHash::MixInGuid(viaGuid, guid);
+    const uint8_t bytes[16] = {4, 3, 2, 1, 6, 5, 8, 7, 9, 10, 11, 12, 13, 14, 15, 16};
+    QRT::HashValue viaBytes;
+    QRT::MixHash::MixInData(viaBytes, bytes, sizeof(bytes));
+    EXPECT_EQ(viaGuid, viaBytes);
+}
+
+TEST_F(HashTest, GuidConversionPlacesEveryByte)
+{
+    QRT::HashValue hash;
+    for (uint8_t i = 0; i < 16; ++i)
+        hash.mBytes[i] = static_cast<uint8_t>(0x10 + i);
+    // w0 = 0x13121110, w1 = 0x17161514, w2 = 0x1B1A1918, w3 = 0x1F1E1D1C.
+    const QRT::Guid guid = QRT::HashValueToGuid(hash);
+    EXPECT_EQ(guid.Data1, 0x13121110u);
+    EXPECT_EQ(guid.Data2, 0x1716u);
+    EXPECT_EQ(guid.Data3, 0x1514u);
+    const std::array<uint8_t, 8> data4{0x1B, 0x1A, 0x19, 0x18, 0x1F, 0x1E, 0x1D, 0x1C};
+    EXPECT_EQ(guid.Data4, data4);
+    EXPECT_EQ(guid.ToString(), "{13121110-1716-1514-1b1a-19181f1e1d1c}");
+}
+
+TEST_F(HashTest, NullDataWithASizeIsAContractViolation)
+{
+    QRT::HashValue hash;
+    EXPECT_THROW(QRT::MixHash::MixInData(hash, nullptr, 4), mvxcore::config::Error);
+    EXPECT_TRUE(hash.IsZero());
+    QRT::MixHash::MixInData(hash, nullptr, 0);
+    EXPECT_FALSE(hash.IsZero());
+}
+
+} // namespace

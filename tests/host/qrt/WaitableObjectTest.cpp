@@ -1,0 +1,132 @@
+#include "QRT/WaitableObject.h"
+
+#include "QRT/Allocator.h"
+
+#include <atomic>
+#include <chrono>
+#include <thread>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+namespace
+{
+
+using namespace std::chrono_literals;
+
+class WaitableObjectTest : public ::testing::Test
+{
+protected:
+    void SetUp() override { mBlocksBefore = QRT::Allocator::GetLiveBlockCount(); }
+    void TearDown() override { EXPECT_EQ(QRT::Allocator::GetLiveBlockCount(), mBlocksBefore); }
+    int64_t mBlocksBefore = 0;
+};
+
+TEST_F(WaitableObjectTest, StartsUnsignalled)
+{
+    const QRT::InterfaceRef<QRT::WaitableObject> waitable = QRT::WaitableObject::Create();
+    ASSERT_TRUE(waitable);
+    EXPECT_FALSE(waitable->IsSignalled());
+    EXPECT_FALSE(waitable->WaitForSignal(0ms));
+}
+
+TEST_F(WaitableObjectTest, SignalBeforeWaitIsNotLost)
+{
+    const auto waitable = QRT::WaitableObject::Create();
+    std::thread signaller([&] { waitable->Signal(); });
+    signaller.join();
+    waitable->WaitForSignal();
+    EXPECT_TRUE(waitable->IsSignalled());
+    // Manual reset: later waits pass too.
+    EXPECT_TRUE(waitable->WaitForSignal(0ms));
+}
+
+TEST_F(WaitableObjectTest, WaiterIsReleasedBySignalFromAnotherThread)
+{
+    const auto waitable = QRT::WaitableObject::Create();
+    std::atomic<bool> signalled{false};
+    std::atomic<bool> released{false};
+    std::thread waiter(
+        [&]
+        {
+            waitable->WaitForSignal();
+            // The waiter must not pass before the signal was given.
+            EXPECT_TRUE(signalled.load());
+            released = true;
+        });
+    std::this_thread::sleep_for(20ms);
+    EXPECT_FALSE(released.load());
+    signalled = true;
+    waitable->Signal();
+    waiter.join();
+    EXPECT_TRUE(released.load());
+}
+
+TEST_F(WaitableObjectTest, TimedWaitTimesOutWithoutSignal)
+{
+    const auto waitable = QRT::WaitableObject::Create();
+    const auto start = std::chrono::steady_clock::now();
+    EXPECT_FALSE(waitable->WaitForSignal(30ms));
+    EXPECT_GE(std::chrono::steady_clock::now() - start, 30ms);
+}
+
+TEST_F(WaitableObjectTest, TimedWaitAnswersTrueWhenSignalledInTime)
+{
+    const auto waitable = QRT::WaitableObject::Create();
+    std::thread signaller(
+        [&]
+        {
+            std::this_thread::sleep_for(10ms);
+            waitable->Signal();
+        });
+    EXPECT_TRUE(waitable->WaitForSignal(std::chrono::milliseconds(60000)));
+    signaller.join();
+}
+
+TEST_F(WaitableObjectTest, OneSignalReleasesEveryWaiter)
+{
+    const auto waitable = QRT::WaitableObject::Create();
+    std::atomic<int> released{0};
+    std::vector<std::thread> waiters;
+    for (int i = 0; i < 6; ++i)
+    {
+        waiters.emplace_back(
+            [&, i]
+            {
+                if (i % 2 == 0)
+                    waitable->WaitForSignal();
+                else
+                    EXPECT_TRUE(waitable->WaitForSignal(std::chrono::milliseconds(60000)));
+                ++released;
+            });
+    }
+    std::this_thread::sleep_for(10ms);
+    EXPECT_EQ(released.load(), 0);
+    waitable->Signal();
+    for (std::thread& waiter : waiters)
+        waiter.join();
+    EXPECT_EQ(released.load(), 6);
+}
+
+TEST_F(WaitableObjectTest, ResetMakesWaitsBlockAgain)
+{
+    const auto waitable = QRT::WaitableObject::Create();
+    waitable->Signal();
+    waitable->Signal();
+    waitable->Reset();
+    EXPECT_FALSE(waitable->IsSignalled());
+    EXPECT_FALSE(waitable->WaitForSignal(5ms));
+}
+
+TEST_F(WaitableObjectTest, HeldAcrossThreadsThroughReferences)
+{
+    auto waitable = QRT::WaitableObject::Create();
+    QRT::InterfaceRef<QRT::IWaitableObject> asInterface(waitable);
+    std::thread signaller([held = asInterface] { held->Signal(); });
+    waitable.Reset();
+    asInterface->WaitForSignal();
+    signaller.join();
+    // The last reference is ours; TearDown proves the object is freed after.
+}
+
+} // namespace
