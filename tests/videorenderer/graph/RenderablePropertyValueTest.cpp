@@ -1,0 +1,87 @@
+// The text form of property values: what a default-formatted stream writes.
+
+#include "ML/RenderablePropertyValue.h"
+
+#include <clocale>
+#include <cstdint>
+#include <limits>
+#include <sstream>
+
+#include <gtest/gtest.h>
+
+namespace
+{
+
+using mvxmediatypes::TickTime;
+
+class RenderablePropertyValueTest : public ::testing::Test
+{
+};
+
+TEST_F(RenderablePropertyValueTest, DoublesHaveSixSignificantDigits)
+{
+    EXPECT_EQ(ML::FormatPropertyValue(0.5), "0.5");
+    EXPECT_EQ(ML::FormatPropertyValue(1.0), "1");
+    EXPECT_EQ(ML::FormatPropertyValue(100.0), "100");
+    EXPECT_EQ(ML::FormatPropertyValue(1234567.0), "1.23457e+06");
+    EXPECT_EQ(ML::FormatPropertyValue(123456.0), "123456");
+    EXPECT_EQ(ML::FormatPropertyValue(0.0001), "0.0001");
+    EXPECT_EQ(ML::FormatPropertyValue(0.00001), "1e-05");
+    EXPECT_EQ(ML::FormatPropertyValue(-2.5), "-2.5");
+    EXPECT_EQ(ML::FormatPropertyValue(1.0 / 3.0), "0.333333");
+}
+
+TEST_F(RenderablePropertyValueTest, DoublesMatchADefaultStreamOverManyValues)
+{
+    const double values[] = {0.0,   -0.0,     3.14159265, 29.97002997, 59.94, 1e100, -1e-100,
+                             0.125, 999999.5, 1e6,        2.0 / 3.0,   12.5,  7e-7,  65535.0};
+    for (double value : values)
+    {
+        std::ostringstream stream;
+        stream.imbue(std::locale::classic());
+        stream << value;
+        EXPECT_EQ(ML::FormatPropertyValue(value), stream.str()) << value;
+    }
+}
+
+TEST_F(RenderablePropertyValueTest, IntegersBooleansAndTimesArePlainDecimal)
+{
+    EXPECT_EQ(ML::FormatPropertyValue(std::int32_t{-42}), "-42");
+    EXPECT_EQ(ML::FormatPropertyValue(std::numeric_limits<std::int64_t>::min()),
+              "-9223372036854775808");
+    EXPECT_EQ(ML::FormatPropertyValue(std::uint32_t{0xFFFFFFFFu}), "4294967295");
+    EXPECT_EQ(ML::FormatPropertyValue(std::uint64_t{18446744073709551615u}),
+              "18446744073709551615");
+    EXPECT_EQ(ML::FormatPropertyValue(true), "1");
+    EXPECT_EQ(ML::FormatPropertyValue(false), "0");
+    EXPECT_EQ(ML::FormatPropertyValue(TickTime::TicksToTime(23543520)), "23543520");
+    EXPECT_EQ(ML::FormatPropertyValue(mvxmediatypes::kTime_Max), "9223372036854775807");
+}
+
+TEST_F(RenderablePropertyValueTest, ParsingRoundTripsAndRefusesOtherText)
+{
+    std::uint32_t color = 7;
+    EXPECT_TRUE(ML::ParsePropertyValue("4278190335", color));
+    EXPECT_EQ(color, 4278190335u);
+    for (const char* bad : {"", "-1", "+5", " 5", "5 ", "4294967296", "0x10", "1.5", "abc"})
+    {
+        color = 7;
+        EXPECT_FALSE(ML::ParsePropertyValue(bad, color)) << '"' << bad << '"';
+        EXPECT_EQ(color, 7u);
+    }
+
+    TickTime time;
+    EXPECT_TRUE(ML::ParsePropertyValue("-705600000", time));
+    EXPECT_EQ(time.GetTicks(), -705600000);
+
+    bool flag = false;
+    EXPECT_TRUE(ML::ParsePropertyValue("1", flag));
+    EXPECT_TRUE(flag);
+    EXPECT_FALSE(ML::ParsePropertyValue("true", flag));
+
+    double number = 0;
+    EXPECT_TRUE(ML::ParsePropertyValue(ML::FormatPropertyValue(1234567.0), number));
+    EXPECT_EQ(number, 1234570.0);
+}
+
+} // namespace
