@@ -1,0 +1,73 @@
+#pragma once
+
+// Opening the back end's video sources: still images (PNG, JPEG), Y4M video
+// files, generated patterns, and two wrappers that slow any source down (a
+// synchronous decode latency, and the same behind the asynchronous-read
+// interface on a worker thread of its own) for prefetch tests and benchmarks.
+//
+// Every function answers a status with a message ("<path or spec>: <problem>")
+// and, on success, the source; on failure the output is empty. Every function
+// may be called from any thread.
+
+#include "BE/IMediaInfo.h"
+#include "BE/IVideoSource.h"
+#include "BE/PatternSpec.h"
+#include "QRT/InterfaceRef.h"
+#include "QRT/Result.h"
+
+#include <chrono>
+#include <string>
+
+namespace BE
+{
+
+struct OpenStatus
+{
+    QRT::Result mResult = QRT::kResult_Success;
+    std::string mMessage;
+
+    bool Succeeded() const { return QRT::Succeeded(mResult); }
+};
+
+using VideoSourceRef = QRT::InterfaceRef<Deprecated::IVideoSource>;
+
+// Opens a file by its extension (.png, .jpg, .jpeg, .y4m, any case) or a
+// "pattern:" spec (BE/PatternSpec.h). Statuses: kResult_MediaCannotOpen,
+// kResult_MediaMalformed, kResult_MediaUnsupported (also for an unknown
+// extension), kResult_BadPatternSpec.
+OpenStatus OpenVideoSource(const std::string& inSpec, VideoSourceRef& outSource);
+
+// A still image. The file's header is read now (size, validity); the pixels
+// are decoded on the first frame request and then held. PNG files deliver
+// straight alpha, JPEG files are opaque. Frame rate kFrameRate_Video1000,
+// still and image.
+OpenStatus OpenImageFileSource(const std::string& inPath, VideoSourceRef& outSource);
+
+// A Y4M file (8-bit 4:2:0, 4:2:2 or 4:4:4; progressive, upper or lower field
+// first). The header is parsed and an index of frame offsets is built now;
+// a truncated or malformed file is refused here. Frames are read by index
+// and delivered as BGRA_4444_8u (BT.601 below 720 rows, BT.709 from 720), or
+// VUYA_4444_8u / YUYV_422_8u when asked for.
+OpenStatus OpenY4MSource(const std::string& inPath, VideoSourceRef& outSource);
+
+// A generated pattern.
+VideoSourceRef CreatePatternSource(const PatternSpec& inSpec);
+
+// Wraps inSource: a frame that is not yet held by inSource costs inLatency
+// of sleep before it is read; held frames and kFrameRequestFlag_NoBlock
+// requests never sleep. Everything else is inSource's (frame keys included).
+// Input contract: "inSource != nullptr".
+VideoSourceRef CreateLatencyVideoSource(const VideoSourceRef& inSource,
+                                        std::chrono::microseconds inLatency);
+
+// As CreateLatencyVideoSource, and also answers
+// Deprecated::IAsyncVideoSource: started reads run one at a time, earliest
+// start first, on the wrapper's own worker thread (each sleeping inLatency,
+// cut short by a cancel). Waits time out after inTimeout of the caller's
+// waiting. Input contract: "inSource != nullptr".
+VideoSourceRef
+CreateAsyncVideoSource(const VideoSourceRef& inSource, std::chrono::microseconds inLatency,
+                       std::chrono::milliseconds inTimeout = std::chrono::seconds(10),
+                       bool inAsyncEnabled = true);
+
+} // namespace BE
