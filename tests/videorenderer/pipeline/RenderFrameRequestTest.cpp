@@ -1,5 +1,6 @@
 #include "ML/RenderFrameRequest.h"
 
+#include "BE/VideoSources.h"
 #include "ContractExpect.h"
 #include "ML/CutlistRenderer.h"
 #include "PipelineTestSupport.h"
@@ -368,3 +369,20 @@ TEST_F(RenderFrameRequestTest, RenderProducesConformedFrameAndCompositesOnBlack)
 }
 
 } // namespace
+
+TEST(RenderFrameRequestMediaTest, FirstMediaComesOnlyFromImportedMediaNodes)
+{
+    BE::VideoSourceRef source;
+    ASSERT_TRUE(BE::OpenVideoSource("pattern:bars", source).Succeeded());
+    const auto media = QRT::QueryRef<BE::Deprecated::IMedia>(source);
+    ASSERT_TRUE(media);
+
+    const BE::ImportedVideoSegmentNode imported(media);
+    EXPECT_EQ(ML::RenderFrameRequest::GetFirstMediaFromVideoSegment(imported), media);
+
+    const BE::VideoSegmentNode clip(2);
+    EXPECT_FALSE(ML::RenderFrameRequest::GetFirstMediaFromVideoSegment(clip));
+
+    const BE::ImportedVideoSegmentNode offline{QRT::InterfaceRef<BE::Deprecated::IMedia>()};
+    EXPECT_FALSE(ML::RenderFrameRequest::GetFirstMediaFromVideoSegment(offline));
+}

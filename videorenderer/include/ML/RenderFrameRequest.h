@@ -23,6 +23,7 @@
 // objects as QRT::NullInterfaceException. The render queue turns them into
 // statuses.
 
+#include "BE/VideoSegmentNode.h"
 #include "MF/FrameTime.h"
 #include "MF/IVideoFrame.h"
 #include "MF/RenderableCutlist.h"
@@ -192,6 +193,11 @@ public:
     // "mKey != QRT::Guid()". Throws on failure.
     void Render(QRT::InterfaceRef<MF::IVideoFrame>& outFrame,
                 mvxmediatypes::PixelFormat inPixelFormat);
+
+    // The media of a segment node: the node's media when it is an imported
+    // media node (kind 1), else an empty reference.
+    static QRT::InterfaceRef<BE::Deprecated::IMedia>
+    GetFirstMediaFromVideoSegment(const BE::VideoSegmentNode& inNode);
 
     // Puts inFrame into the shared result slot.
     void StoreResult(QRT::InterfaceRef<MF::IVideoFrame> inFrame) const;

@@ -408,6 +408,14 @@ void RenderFrameRequest::Render(QRT::InterfaceRef<MF::IVideoFrame>& outFrame,
     outFrame = std::move(frame);
 }
 
+QRT::InterfaceRef<BE::Deprecated::IMedia>
+RenderFrameRequest::GetFirstMediaFromVideoSegment(const BE::VideoSegmentNode& inNode)
+{
+    if (inNode.GetKind() != BE::kVideoSegmentNodeKind_ImportedMedia)
+        return {};
+    return static_cast<const BE::ImportedVideoSegmentNode&>(inNode).GetMedia();
+}
+
 void RenderFrameRequest::StoreResult(QRT::InterfaceRef<MF::IVideoFrame> inFrame) const
 {
     mResult->Store(std::move(inFrame));
