@@ -329,9 +329,12 @@ std::int32_t RowStride(std::int32_t inField)
 // Bilinear motion without rotation or shear (scaling and translation only): the
 // filter separates. Each destination row mixes two source rows vertically with one
 // weight into a premultiplied row (vectorised), then each destination pixel mixes
-// two neighbours of that row horizontally; column positions and weights are the same
-// for every row and are computed once. Straight sources are premultiplied row by row
-// first, so the mix weighs colour by alpha as the general sampler does.
+// two neighbours of that row horizontally (vectorised: pairs at a fixed stride when the
+// step is exactly one or two source pixels, gathered pairs otherwise); column positions
+// and weights are the same for every row and are computed once. Premultiplied samples
+// over a premultiplied lower frame at full opacity are composited as they are made.
+// Straight sources are premultiplied row by row first, so the mix weighs colour by
+// alpha as the general sampler does.
 std::int32_t MotionSeparable8(const MotionCall& inCall, const FormatInfo& inInfo,
                               const Inverse& inInv)
 {
@@ -367,16 +370,60 @@ std::int32_t MotionSeparable8(const MotionCall& inCall, const FormatInfo& inInfo
         columns[x] = static_cast<std::int32_t>(std::clamp<std::int64_t>(u >> 32, -kPad, srcW));
         weights[x] = static_cast<std::uint32_t>(u >> 24) & 0xFF;
     }
+    // A step of exactly one or two source pixels (same size, or exactly half) gives every
+    // column the same weight and pairs at a fixed stride: no gather is needed where no
+    // column was clamped, i.e. on the columns [evenX0, evenX1).
+    std::int32_t stride = 0;
+    std::int32_t evenX0 = 0, evenX1 = 0;
+    if (dU == (std::int64_t{1} << 32) || dU == (std::int64_t{2} << 32))
+    {
+        stride = static_cast<std::int32_t>(dU >> 32);
+        const std::int64_t first = u0 >> 32;
+        // Columns first + stride * x within [-kPad, srcW].
+        const std::int64_t lo = (-kPad - first + stride - 1) / stride;
+        const std::int64_t loClamped = first >= -kPad ? 0 : lo;
+        const std::int64_t hi = srcW - first < 0 ? -1 : (srcW - first) / stride;
+        evenX0 = static_cast<std::int32_t>(std::clamp<std::int64_t>(loClamped, 0, dstW));
+        evenX1 = static_cast<std::int32_t>(std::clamp<std::int64_t>(hi + 1, evenX0, dstW));
+    }
+    // Premultiplied samples over a premultiplied destination at full opacity are
+    // composited as they are made, without a pass through a sample row.
+    const bool fuseOver = inCall.hasLower && !straight && inCall.opacity >= 1.0f;
+    auto horizontal =
+        [&](const std::uint8_t* inMid, std::int32_t inX0, std::int32_t inX1, std::uint8_t* ioOut)
+    {
+        auto gathered = [&](std::int32_t inA, std::int32_t inB)
+        {
+            if (inB > inA)
+                IR::Simd::MixGatheredPairsRow8(inMid, columns + inA, weights + inA,
+                                               ioOut + 4 * static_cast<std::ptrdiff_t>(inA - inX0),
+                                               inB - inA, fuseOver);
+        };
+        const std::int32_t a = std::clamp(evenX0, inX0, inX1);
+        const std::int32_t b = std::clamp(evenX1, a, inX1);
+        if (stride == 0 || b <= a)
+        {
+            gathered(inX0, inX1);
+            return;
+        }
+        gathered(inX0, a);
+        IR::Simd::MixPixelPairsRow8(inMid + 4 * static_cast<std::ptrdiff_t>(columns[a]), stride,
+                                    weights[a], ioOut + 4 * static_cast<std::ptrdiff_t>(a - inX0),
+                                    b - a, fuseOver);
+        gathered(b, inX1);
+    };
     const auto over = IR::Kernels::SelectOverRow8(false, straight);
-    // A source row, premultiplied, or nullptr outside the source (transparent).
-    auto sourceRow = [&](std::int64_t inY, std::uint8_t* inScratch) -> const std::uint8_t*
+    // A source row, premultiplied at least in columns [inC0, inC1), or nullptr outside the
+    // source (transparent).
+    auto sourceRow = [&](std::int64_t inY, std::uint8_t* inScratch, std::int32_t inC0,
+                         std::int32_t inC1) -> const std::uint8_t*
     {
         if (inY < 0 || inY >= inCall.srcH)
             return nullptr;
         const std::uint8_t* row = srcView.Row(static_cast<std::int32_t>(inY));
         if (!straight)
             return row;
-        IR::Kernels::StraightToPremultipliedRow8(row, inScratch, srcW);
+        IR::Kernels::StraightToPremultipliedRow8(row + 4 * inC0, inScratch + 4 * inC0, inC1 - inC0);
         return inScratch;
     };
     for (std::int32_t y = FirstRow(inCall.field); y < inCall.dstH; y += RowStride(inCall.field))
@@ -391,30 +438,38 @@ std::int32_t MotionSeparable8(const MotionCall& inCall, const FormatInfo& inInfo
         const std::int64_t v = ToFixed(inInv.d * (y + 0.5) + inInv.ty - 0.5);
         const std::int64_t sy = v >> 32;
         const std::uint32_t fy = static_cast<std::uint32_t>(v >> 24) & 0xFF;
-        const std::uint8_t* a = sourceRow(sy, top);
-        const std::uint8_t* b = fy != 0 ? sourceRow(sy + 1, bottom) : nullptr;
+        // Only the source columns this row's taps read are mixed; columns run monotonically
+        // (backwards for a mirror image), so the ends of the span bound them.
+        const std::int32_t c0 = std::clamp(std::min(columns[x0], columns[x1 - 1]), 0, srcW);
+        const std::int32_t c1 = std::clamp(std::max(columns[x0], columns[x1 - 1]) + 2, c0, srcW);
+        const std::size_t mixOffset = static_cast<std::size_t>(c0) * 4;
+        const std::size_t mixBytes = static_cast<std::size_t>(c1 - c0) * 4;
+        const std::uint8_t* a = sourceRow(sy, top, c0, c1);
+        const std::uint8_t* b = fy != 0 ? sourceRow(sy + 1, bottom, c0, c1) : nullptr;
         std::uint8_t* mid = mixed + 4 * kPad;
-        // The vertical mix of the two rows over the whole source width.
+        // The vertical mix of the two rows.
         if (a != nullptr && b != nullptr)
-            IR::Simd::MixRows8(a, b, mid, srcW * 4, fy);
+            IR::Simd::MixRows8(a + mixOffset, b + mixOffset, mid + mixOffset,
+                               static_cast<std::int32_t>(mixBytes), fy);
         else if (a != nullptr && fy == 0)
-            std::memcpy(mid, a, srcRowBytes);
+            std::memcpy(mid + mixOffset, a + mixOffset, mixBytes);
         else if (a != nullptr || b != nullptr)
         {
             // One row lies outside the source: mix the other with transparent black.
-            std::memcpy(mid, a != nullptr ? a : b, srcRowBytes);
-            ScaleRowToward(mid, srcRowBytes, a != nullptr ? 256 - fy : fy);
+            std::memcpy(mid + mixOffset, (a != nullptr ? a : b) + mixOffset, mixBytes);
+            ScaleRowToward(mid + mixOffset, mixBytes, a != nullptr ? 256 - fy : fy);
         }
         else
-            std::memset(mid, 0, srcRowBytes);
-        // The horizontal mix of neighbouring pixels of the mixed row.
-        for (std::int32_t x = x0; x < x1; ++x)
-        {
-            const std::uint8_t* p = mid + 4 * static_cast<std::ptrdiff_t>(columns[x]);
-            samples[x] = Pack(Lerp(Expand(Load32(p)), Expand(Load32(p + 4)), weights[x]));
-        }
-        auto* sampleBytes = reinterpret_cast<std::uint8_t*>(samples + x0);
+            std::memset(mid + mixOffset, 0, mixBytes);
         const std::int32_t n = x1 - x0;
+        if (fuseOver)
+        {
+            horizontal(mid, x0, x1, dstRow + 4 * x0);
+            continue;
+        }
+        // The horizontal mix of neighbouring pixels of the mixed row.
+        auto* sampleBytes = reinterpret_cast<std::uint8_t*>(samples + x0);
+        horizontal(mid, x0, x1, sampleBytes);
         if (inCall.hasLower)
         {
             over(sampleBytes, dstRow + 4 * x0, n, inCall.opacity);

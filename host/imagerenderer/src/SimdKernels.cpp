@@ -12,7 +12,10 @@
 //   they lie (B, G, R, A, B, ...) in 16-bit fixed point, the pixel's alpha spread
 //   over its four bytes by a byte shuffle;
 // - the general over and un-premultiplying split pixels into one vector per channel
-//   and work in 32-bit float, with the same operations as the scalar kernels.
+//   and work in 32-bit float, with the same operations as the scalar kernels;
+// - straight over straight and the horizontal bilinear taps compute one weight per
+//   pixel (in float for the former) and mix the even and odd bytes of whole pixels in
+//   16-bit fixed point, where a pixel's weight fills both of its 16-bit lanes.
 
 #undef HWY_TARGET_INCLUDE
 #define HWY_TARGET_INCLUDE "SimdKernels.cpp"
@@ -166,10 +169,17 @@ void MixRows(const std::uint8_t* inA, const std::uint8_t* inB, std::uint8_t* out
             k128);
         return hn::DemoteTo(dh, hn::BitCast(di16, hn::ShiftRight<8>(t)));
     };
+    // An even mix is the rounded average of the bytes, (a + b + 1) >> 1, the same value.
+    const bool even = inWeight == 128;
     auto body = [&](const std::uint8_t* inP, const std::uint8_t* inQ, std::uint8_t* outP) HWY_ATTR
     {
         const auto a = hn::LoadU(d8, inP);
         const auto b = hn::LoadU(d8, inQ);
+        if (even)
+        {
+            hn::StoreU(hn::AverageRound(a, b), d8, outP);
+            return;
+        }
         const auto lo = half(hn::LowerHalf(dh, a), hn::LowerHalf(dh, b));
         const auto hi = half(hn::UpperHalf(dh, a), hn::UpperHalf(dh, b));
         hn::StoreU(hn::Combine(d8, hi, lo), d8, outP);
@@ -315,10 +325,95 @@ void OverSP(const std::uint8_t* inSrc, std::uint8_t* ioDst, std::int32_t inCount
     OverFloat<true, false>(inSrc, ioDst, inCount, inOpacity);
 }
 
+#if HWY_TARGET == HWY_SCALAR
 void OverSS(const std::uint8_t* inSrc, std::uint8_t* ioDst, std::int32_t inCount, float inOpacity)
 {
     OverFloat<true, true>(inSrc, ioDst, inCount, inOpacity);
 }
+#else
+// Straight over straight, the common case of video frames. The result is a weighted mean
+// of the two straight colours, c = cd + (cs - cd) * t with t = ws / (ws + wd),
+// ws = 255 * as and wd = ad * (255 - as) (as scaled by the opacity). Only the weights
+// need float: t comes from the approximate reciprocal (relative error below 2^-11) and
+// the colour mix runs in 16-bit fixed point on the even and odd bytes of the pixels as
+// they lie, where each pixel's t sits in both of its 16-bit lanes. Alpha is
+// round((ws + wd) / 255), exact at full opacity.
+void OverSS(const std::uint8_t* inSrc, std::uint8_t* ioDst, std::int32_t inCount, float inOpacity)
+{
+    const hn::ScalableTag<std::uint32_t> du;
+    const hn::Repartition<float, decltype(du)> df;
+    const hn::RebindToSigned<decltype(df)> di;
+    const hn::Repartition<std::uint8_t, decltype(du)> d8;
+    const hn::Repartition<std::uint16_t, decltype(du)> d16;
+    const hn::Repartition<std::int16_t, decltype(du)> di16;
+    const auto alphaMask = hn::Set(du, 0xFF000000u);
+    const auto colourMask = hn::Set(du, 0x00FFFFFFu);
+    const auto lowBytes = hn::Set(d16, 0x00FF);
+    const auto opacity = hn::Set(df, inOpacity);
+    const auto k255 = hn::Set(df, 255.0f);
+    const auto k1 = hn::Set(df, 1.0f / 255.0f);
+    // Adding 2^23 leaves a rounded value below 2^16 in the low 16 bits of the lane.
+    const auto kMagic = hn::Set(df, 8388608.0f);
+    // t in Q15, scaled so that even an estimate 2^-11 too high stays below 32768; for
+    // t = 1 the shortfall (0.06 %) still rounds every colour difference back to itself.
+    const auto kTScale = hn::Set(df, 255.0f * 32750.0f);
+    // No weight is this small unless both are zero: keeps the reciprocal finite.
+    const auto kTiny = hn::Set(df, 1e-30f);
+    // Bytes 0 and 1 of each lane into both of its 16-bit halves.
+    alignas(16) static constexpr std::uint8_t kLowHalfTwice[16] = {0, 1, 0, 1, 4,  5,  4,  5,
+                                                                   8, 9, 8, 9, 12, 13, 12, 13};
+    const auto lowHalfTwice = hn::LoadDup128(d8, kLowHalfTwice);
+    const bool opaqueSkips = inOpacity >= 1.0f;
+    const bool allTransparent = inOpacity <= 0.0f;
+    auto alphaOf = [&](auto inPixels) HWY_ATTR
+    { return hn::ConvertTo(df, hn::BitCast(di, hn::ShiftRight<24>(inPixels))); };
+    ForEachChunk(
+        inSrc, ioDst, inCount, hn::Lanes(du),
+        [&](const std::uint8_t* inS, std::uint8_t* ioD) HWY_ATTR
+        {
+            const auto s = LoadPixels(du, inS);
+            const auto sAlpha = hn::And(s, alphaMask);
+            if (opaqueSkips && hn::AllTrue(du, hn::Eq(sAlpha, alphaMask)))
+            {
+                StorePixels(du, s, ioD);
+                return;
+            }
+            const auto d = LoadPixels(du, ioD);
+            // A transparent source keeps the destination, whose pixels of alpha 0 lose
+            // their colour.
+            if (allTransparent || hn::AllTrue(du, hn::Eq(sAlpha, hn::Zero(du))))
+            {
+                StorePixels(du, hn::IfThenElseZero(hn::Ne(hn::And(d, alphaMask), hn::Zero(du)), d),
+                            ioD);
+                return;
+            }
+            const auto srcA = hn::Mul(alphaOf(s), opacity);
+            const auto wd = hn::Mul(alphaOf(d), hn::Sub(k255, srcA));
+            const auto total = hn::MulAdd(srcA, k255, wd);
+            const auto inv = hn::ApproximateReciprocal(hn::Max(total, kTiny));
+            const auto tq = hn::BitCast(d8, hn::Add(hn::Mul(hn::Mul(srcA, kTScale), inv), kMagic));
+            const auto t = hn::BitCast(di16, hn::TableLookupBytes(tq, lowHalfTwice));
+            const auto s16 = hn::BitCast(d16, s);
+            const auto d16v = hn::BitCast(d16, d);
+            auto mix = [&](auto inS16, auto inD16) HWY_ATTR
+            {
+                const auto diff = hn::BitCast(di16, hn::Sub(inS16, inD16));
+                return hn::BitCast(d16,
+                                   hn::Add(hn::BitCast(di16, inD16), hn::MulFixedPoint15(diff, t)));
+            };
+            const auto even = mix(hn::And(s16, lowBytes), hn::And(d16v, lowBytes));
+            const auto odd = mix(hn::ShiftRight<8>(s16), hn::ShiftRight<8>(d16v));
+            const auto colour = hn::BitCast(du, hn::Or(even, hn::ShiftLeft<8>(odd)));
+            // The rounded alpha code sits in the low byte; the shift drops the rest.
+            const auto outA =
+                hn::ShiftLeft<24>(hn::BitCast(du, hn::Add(hn::Mul(total, k1), kMagic)));
+            const auto out = hn::Or(hn::And(colour, colourMask), outA);
+            // Alpha 0 carries no colour.
+            StorePixels(
+                du, hn::IfThenElseZero(hn::RebindMask(du, hn::Gt(total, hn::Zero(df))), out), ioD);
+        });
+}
+#endif
 
 void PremultipliedToStraight(const std::uint8_t* inSrc, std::uint8_t* outDst, std::int32_t inCount)
 {
@@ -422,6 +517,190 @@ void YUV420ToBGRA(const std::uint8_t* inY, const std::uint8_t* inU, const std::u
 }
 #endif
 
+// Horizontal bilinear taps: output pixel i mixes a pair of neighbouring pixels with
+// (p * (256 - w) + q * w + 128) >> 8 per byte, the same integer arithmetic as the
+// scalar sampler. With kOver the samples (premultiplied) go over the premultiplied
+// destination at full opacity instead of being stored.
+#if HWY_TARGET == HWY_SCALAR
+HWY_INLINE std::uint8_t MixByte(std::uint32_t inP, std::uint32_t inQ, std::uint32_t inW)
+{
+    return static_cast<std::uint8_t>((inP * (256u - inW) + inQ * inW + 128u) >> 8);
+}
+
+HWY_INLINE void EmitPair(const std::uint8_t* inP, const std::uint8_t* inQ, std::uint32_t inW,
+                         std::uint8_t* ioD, bool inOver)
+{
+    std::uint8_t sample[4];
+    for (int c = 0; c < 4; ++c)
+        sample[c] = MixByte(inP[c], inQ[c], inW);
+    if (!inOver)
+    {
+        std::memcpy(ioD, sample, 4);
+        return;
+    }
+    OverPremultipliedOpaque(sample, ioD, 1);
+}
+
+void MixPixelPairs(const std::uint8_t* inRow, std::int32_t inStride, std::uint32_t inWeight,
+                   std::uint8_t* ioDst, std::int32_t inCount, bool inOver)
+{
+    for (std::int32_t i = 0; i < inCount; ++i)
+    {
+        const std::uint8_t* p = inRow + 4 * static_cast<std::ptrdiff_t>(inStride) * i;
+        EmitPair(p, p + 4, inWeight, ioDst + 4 * i, inOver);
+    }
+}
+
+void MixGatheredPairs(const std::uint8_t* inRow, const std::int32_t* inColumns,
+                      const std::uint32_t* inWeights, std::uint8_t* ioDst, std::int32_t inCount,
+                      bool inOver)
+{
+    for (std::int32_t i = 0; i < inCount; ++i)
+    {
+        const std::uint8_t* p = inRow + 4 * static_cast<std::ptrdiff_t>(inColumns[i]);
+        EmitPair(p, p + 4, inWeights[i], ioDst + 4 * i, inOver);
+    }
+}
+#else
+// The pair mix on whole vectors of pixels p and q. inFactor holds w * 128 in both 16-bit
+// lanes of each pixel: p + ((q - p) * w * 128 + 2^14) >> 15 on the even and on the odd
+// bytes is exactly the scalar formula.
+template <class DU, class V16>
+HWY_INLINE hn::Vec<DU> MixPairs(DU inDu, hn::Vec<DU> inP, hn::Vec<DU> inQ, V16 inFactor)
+{
+    const hn::Repartition<std::uint16_t, DU> d16;
+    const hn::Repartition<std::int16_t, DU> di16;
+    const auto lowBytes = hn::Set(d16, 0x00FF);
+    const auto p = hn::BitCast(d16, inP);
+    const auto q = hn::BitCast(d16, inQ);
+    auto mix = [&](auto inA, auto inB) HWY_ATTR
+    {
+        const auto diff = hn::BitCast(di16, hn::Sub(inB, inA));
+        return hn::BitCast(d16,
+                           hn::Add(hn::BitCast(di16, inA), hn::MulFixedPoint15(diff, inFactor)));
+    };
+    const auto even = mix(hn::And(p, lowBytes), hn::And(q, lowBytes));
+    const auto odd = mix(hn::ShiftRight<8>(p), hn::ShiftRight<8>(q));
+    return hn::BitCast(inDu, hn::Or(even, hn::ShiftLeft<8>(odd)));
+}
+
+// Stores the samples, or composites them over the destination.
+template <class DU>
+HWY_INLINE void Emit(DU inDu, hn::Vec<DU> inSamples, std::uint8_t* ioD, bool inOver)
+{
+    if (!inOver)
+    {
+        StorePixels(inDu, inSamples, ioD);
+        return;
+    }
+    const hn::Repartition<std::uint8_t, DU> d8;
+    const auto s = hn::BitCast(d8, inSamples);
+    const auto d = hn::LoadU(d8, ioD);
+    hn::StoreU(hn::SaturatedAdd(s, MulDiv255(d8, d, hn::Not(BroadcastAlpha(d8, s)))), d8, ioD);
+}
+
+template <int kStride>
+HWY_INLINE void MixPixelPairsStride(const std::uint8_t* inRow, std::uint32_t inWeight,
+                                    std::uint8_t* ioDst, std::int32_t inCount, bool inOver)
+{
+    const hn::ScalableTag<std::uint32_t> du;
+    const hn::Repartition<std::int16_t, decltype(du)> di16;
+    const std::size_t n = hn::Lanes(du);
+    const auto factor = hn::Set(di16, static_cast<std::int16_t>(inWeight * 128));
+    auto body = [&](const std::uint8_t* inP, std::uint8_t* ioD) HWY_ATTR
+    {
+        hn::Vec<decltype(du)> p, q;
+        if constexpr (kStride == 1)
+        {
+            p = LoadPixels(du, inP);
+            q = LoadPixels(du, inP + 4);
+        }
+        else
+        {
+            // Pixels 2i and 2i + 1 of two vectors' worth of the row.
+            const auto lo = LoadPixels(du, inP);
+            const auto hi = LoadPixels(du, inP + 4 * n);
+            p = hn::ConcatEven(du, hi, lo);
+            q = hn::ConcatOdd(du, hi, lo);
+        }
+        // Phase-aligned halving (w = 128) is the rounded average, the same value; a
+        // whole-pixel phase (w = 0) takes the first pixel of each pair as it is.
+        if (inWeight == 0)
+            Emit(du, p, ioD, inOver);
+        else if (inWeight == 128)
+        {
+            const hn::Repartition<std::uint8_t, decltype(du)> d8;
+            Emit(du, hn::BitCast(du, hn::AverageRound(hn::BitCast(d8, p), hn::BitCast(d8, q))), ioD,
+                 inOver);
+        }
+        else
+            Emit(du, MixPairs(du, p, q, factor), ioD, inOver);
+    };
+    const auto count = static_cast<std::size_t>(inCount);
+    std::size_t i = 0;
+    for (; i + n <= count; i += n)
+        body(inRow + 4 * kStride * i, ioDst + 4 * i);
+    if (i == count)
+        return;
+    // The last partial vector through stack copies: the pixels the taps read (the pair
+    // of the last output pixel ends at kStride * (rest - 1) + 1) and the destination.
+    alignas(64) std::uint8_t src[HWY_MAX_BYTES * 2 + 8] = {};
+    alignas(64) std::uint8_t dst[HWY_MAX_BYTES] = {};
+    const std::size_t rest = count - i;
+    std::memcpy(src, inRow + 4 * kStride * i, 4 * (kStride * (rest - 1) + 2));
+    std::memcpy(dst, ioDst + 4 * i, 4 * rest);
+    body(src, dst);
+    std::memcpy(ioDst + 4 * i, dst, 4 * rest);
+}
+
+void MixPixelPairs(const std::uint8_t* inRow, std::int32_t inStride, std::uint32_t inWeight,
+                   std::uint8_t* ioDst, std::int32_t inCount, bool inOver)
+{
+    if (inStride == 1)
+        MixPixelPairsStride<1>(inRow, inWeight, ioDst, inCount, inOver);
+    else
+        MixPixelPairsStride<2>(inRow, inWeight, ioDst, inCount, inOver);
+}
+
+void MixGatheredPairs(const std::uint8_t* inRow, const std::int32_t* inColumns,
+                      const std::uint32_t* inWeights, std::uint8_t* ioDst, std::int32_t inCount,
+                      bool inOver)
+{
+    const hn::ScalableTag<std::uint32_t> du;
+    const hn::RebindToSigned<decltype(du)> di;
+    const hn::Repartition<std::int16_t, decltype(du)> di16;
+    const std::size_t n = hn::Lanes(du);
+    const auto* pixels = reinterpret_cast<const std::uint32_t*>(inRow);
+    const auto one = hn::Set(di, 1);
+    auto body = [&](const std::int32_t* inC, const std::uint32_t* inW, std::uint8_t* ioD) HWY_ATTR
+    {
+        const auto columns = hn::LoadU(di, inC);
+        const auto p = hn::GatherIndex(du, pixels, columns);
+        const auto q = hn::GatherIndex(du, pixels, hn::Add(columns, one));
+        // w * 128 in both 16-bit halves of the pixel's lane.
+        const auto factor =
+            hn::BitCast(di16, hn::Mul(hn::LoadU(du, inW), hn::Set(du, 0x00800080u)));
+        Emit(du, MixPairs(du, p, q, factor), ioD, inOver);
+    };
+    const auto count = static_cast<std::size_t>(inCount);
+    std::size_t i = 0;
+    for (; i + n <= count; i += n)
+        body(inColumns + i, inWeights + i, ioDst + 4 * i);
+    if (i == count)
+        return;
+    // Unused lanes read the pair at column 0 with weight 0 and are never written back.
+    alignas(64) std::int32_t columns[HWY_MAX_BYTES / 4] = {};
+    alignas(64) std::uint32_t weights[HWY_MAX_BYTES / 4] = {};
+    alignas(64) std::uint8_t dst[HWY_MAX_BYTES] = {};
+    const std::size_t rest = count - i;
+    std::memcpy(columns, inColumns + i, 4 * rest);
+    std::memcpy(weights, inWeights + i, 4 * rest);
+    std::memcpy(dst, ioDst + 4 * i, 4 * rest);
+    body(columns, weights, dst);
+    std::memcpy(ioDst + 4 * i, dst, 4 * rest);
+}
+#endif
+
 } // namespace IR::Simd::HWY_NAMESPACE
 HWY_AFTER_NAMESPACE();
 
@@ -438,6 +717,23 @@ HWY_EXPORT(StraightToPremultiplied);
 HWY_EXPORT(PremultipliedToStraight);
 HWY_EXPORT(YUV420ToBGRA);
 HWY_EXPORT(MixRows);
+HWY_EXPORT(MixPixelPairs);
+HWY_EXPORT(MixGatheredPairs);
+
+void MixPixelPairsRow8(const std::uint8_t* inRow, std::int32_t inStride, std::uint32_t inWeight,
+                       std::uint8_t* ioDst, std::int32_t inCount, bool inOverPremultiplied)
+{
+    HWY_DYNAMIC_DISPATCH(MixPixelPairs)
+    (inRow, inStride, inWeight, ioDst, inCount, inOverPremultiplied);
+}
+
+void MixGatheredPairsRow8(const std::uint8_t* inRow, const std::int32_t* inColumns,
+                          const std::uint32_t* inWeights, std::uint8_t* ioDst, std::int32_t inCount,
+                          bool inOverPremultiplied)
+{
+    HWY_DYNAMIC_DISPATCH(MixGatheredPairs)
+    (inRow, inColumns, inWeights, ioDst, inCount, inOverPremultiplied);
+}
 
 void MixRows8(const std::uint8_t* inA, const std::uint8_t* inB, std::uint8_t* outDst,
               std::int32_t inBytes, std::uint32_t inWeight)

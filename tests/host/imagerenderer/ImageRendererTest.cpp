@@ -1298,6 +1298,46 @@ TEST_F(FastKernelTest, OpaqueAndTransparentSourcesGiveExactResults)
     EXPECT_EQ(MaxDifference(dst, opaque), 0);
 }
 
+TEST_F(FastKernelTest, StraightCompositeCoversEveryAlphaPair)
+{
+    // Source alpha runs along x, destination alpha along y: all 65536 pairs, with colours
+    // far apart (the weight error shows most) and close together.
+    for (float opacity : {1.0f, 0.5f, 0.03f})
+    {
+        Image src(kIR_PixelFormat_BGRA_8u, 256, 256, 1), dst(kIR_PixelFormat_BGRA_8u, 256, 256, 3);
+        for (std::int32_t y = 0; y < 256; ++y)
+            for (std::int32_t x = 0; x < 256; ++x)
+            {
+                src.Set(x, y,
+                        {255, 0, static_cast<std::uint8_t>((x * 7 + y) % 256),
+                         static_cast<std::uint8_t>(x)});
+                dst.Set(x, y,
+                        {0, 255, static_cast<std::uint8_t>((x + y * 5) % 256),
+                         static_cast<std::uint8_t>(y)});
+            }
+        Image expected = Copy(dst, 0);
+        IR::Reference::Composite(src.Data(), src.RowBytes(), expected.Data(), expected.RowBytes(),
+                                 kIR_PixelFormat_BGRA_8u, 256, 256, opacity);
+        ASSERT_EQ(IR_Composite(src.Data(), src.RowBytes(), dst.Data(), dst.RowBytes(),
+                               kIR_PixelFormat_BGRA_8u, 256, 256, opacity, 4),
+                  kIR_NoError);
+        EXPECT_LE(MaxDifference(dst, expected), 1) << opacity;
+        if (opacity < 1.0f)
+            continue;
+        // At full opacity the alpha is exact, and so is the colour over a destination of
+        // alpha 0 (the source's own colour) and of an opaque source.
+        for (std::int32_t y = 0; y < 256; ++y)
+            for (std::int32_t x = 0; x < 256; ++x)
+            {
+                ASSERT_EQ(dst.Get(x, y)[3], expected.Get(x, y)[3]) << x << "," << y;
+                if (y == 0 || x == 255)
+                {
+                    ASSERT_EQ(dst.Get(x, y), expected.Get(x, y)) << x << "," << y;
+                }
+            }
+    }
+}
+
 TEST_F(FastKernelTest, AssociationChangesMatchReferenceAtEveryTailLengthAndInPlace)
 {
     std::mt19937 random(24);
@@ -1465,6 +1505,87 @@ TEST_F(FastKernelTest, ScaledBilinearMotionMatchesReference)
                         << format << " lower " << lower << " scale " << c.scaleX << "x" << c.scaleY
                         << " opacity " << opacity;
                 }
+}
+
+TEST_F(FastKernelTest, SeparableMotionMatchesReferenceAtEveryWidth)
+{
+    // Exactly half size with the taps on pixel pairs (w = 128) and between them, the same
+    // size moved by a fraction (stride 1), and a general scale (gathered taps); sources
+    // twice as wide plus one (odd) hang over both edges of the destination.
+    std::mt19937 random(28);
+    struct Case
+    {
+        double scale, tx, ty;
+    };
+    const Case cases[] = {{0.5, 1.0, 0.0}, {0.5, 0.3, 0.45}, {1.0, -0.35, 0.2}, {0.8, 0.6, -0.3}};
+    for (IR_PixelFormat format : {kIR_PixelFormat_BGRP_8u, kIR_PixelFormat_BGRA_8u})
+        for (const Case& c : cases)
+            for (std::int32_t width : Widths())
+                for (bool lower : {false, true})
+                    for (float opacity : {1.0f, 0.6f})
+                    {
+                        const std::int32_t srcW = 2 * width + 1;
+                        Image src(format, srcW, 9, width % 4);
+                        src.Randomise(random);
+                        Image dst(format, width, 5, 3 - width % 4);
+                        dst.Randomise(random);
+                        Image expected = Copy(dst, 0);
+                        IR_AffineMatrix matrix;
+                        matrix.a = matrix.d = c.scale;
+                        matrix.tx = c.tx;
+                        matrix.ty = c.ty;
+                        const bool straight = format == kIR_PixelFormat_BGRA_8u;
+                        IR::Reference::Motion8(src.Data(), src.RowBytes(), srcW, 9, expected.Data(),
+                                               expected.RowBytes(), width, 5, straight, matrix,
+                                               opacity, 4, lower);
+                        ASSERT_EQ(IR_Motion(src.Data(), src.RowBytes(), format, srcW, 9, dst.Data(),
+                                            dst.RowBytes(), format, width, 5, &matrix, opacity, 4,
+                                            kIR_Field_All, lower),
+                                  kIR_NoError);
+                        ASSERT_LE(MotionDifference(dst, expected, straight), 2)
+                            << format << " scale " << c.scale << " tx " << c.tx << " width "
+                            << width << " lower " << lower << " opacity " << opacity;
+                    }
+}
+
+TEST_F(FastKernelTest, AlignedHalfSizeAveragesEachTwoByTwoBlock)
+{
+    // A 5 x 3 opaque source halved from the origin: each destination pixel is the mean of
+    // a 2 x 2 block; the last column and row take half of a block that is transparent
+    // outside the source; the rest of the cleared destination stays transparent.
+    Image src(kIR_PixelFormat_BGRP_8u, 5, 3, 1);
+    src.Fill({200, 200, 200, 255});
+    src.Set(0, 0, {10, 100, 0, 255});
+    src.Set(1, 0, {20, 110, 4, 255});
+    src.Set(0, 1, {30, 120, 8, 255});
+    src.Set(1, 1, {40, 130, 12, 255});
+    Image dst(kIR_PixelFormat_BGRP_8u, 4, 3, 2);
+    dst.Fill({9, 9, 9, 9});
+    IR_AffineMatrix half;
+    half.a = half.d = 0.5;
+    ASSERT_EQ(IR_Motion(src.Data(), src.RowBytes(), src.Format(), 5, 3, dst.Data(), dst.RowBytes(),
+                        dst.Format(), 4, 3, &half, 1.0f, 4, kIR_Field_All, false),
+              kIR_NoError);
+    EXPECT_EQ(dst.Get(0, 0), (Pixel{25, 115, 6, 255}));
+    EXPECT_EQ(dst.Get(1, 0), (Pixel{200, 200, 200, 255}));
+    EXPECT_EQ(dst.Get(2, 0), (Pixel{100, 100, 100, 128}));
+    EXPECT_EQ(dst.Get(1, 1), (Pixel{100, 100, 100, 128}));
+    EXPECT_EQ(dst.Get(2, 1), (Pixel{50, 50, 50, 64}));
+    for (std::int32_t y = 0; y < 3; ++y)
+        EXPECT_EQ(dst.Get(3, y), (Pixel{0, 0, 0, 0})) << y;
+    for (std::int32_t x = 0; x < 4; ++x)
+        EXPECT_EQ(dst.Get(x, 2), (Pixel{0, 0, 0, 0})) << x;
+
+    // The same halving onto an opaque lower frame composites the averages over it.
+    Image lower(kIR_PixelFormat_BGRP_8u, 4, 3, 1);
+    lower.Fill({0, 0, 0, 255});
+    ASSERT_EQ(IR_Motion(src.Data(), src.RowBytes(), src.Format(), 5, 3, lower.Data(),
+                        lower.RowBytes(), lower.Format(), 4, 3, &half, 1.0f, 4, kIR_Field_All,
+                        true),
+              kIR_NoError);
+    EXPECT_EQ(lower.Get(0, 0), (Pixel{25, 115, 6, 255}));
+    EXPECT_EQ(lower.Get(2, 0), (Pixel{100, 100, 100, 255}));
+    EXPECT_EQ(lower.Get(3, 0), (Pixel{0, 0, 0, 255}));
 }
 
 } // namespace
