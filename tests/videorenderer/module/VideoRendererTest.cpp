@@ -347,8 +347,11 @@ TEST_F(VideoRendererTest, RendersTheSourceOnceItsPrefetchHasArrived)
     EXPECT_TRUE(Asserts().empty());
 }
 
-TEST_F(VideoRendererTest, SourceWithoutPrefetchesIsAnsweredWithoutAFrame)
+TEST_F(VideoRendererTest, SourceWithoutPrefetchesIsStillRendered)
 {
+    // A source whose reads are cheap collects no prefetch; the queue then
+    // completes the request with no frame and status 0, and the source is
+    // rendered on the delivering thread all the same.
     ML::VideoRenderer::Initialize();
     auto source = NewSource();
     CallbackRecorder recorder;
@@ -357,12 +360,13 @@ TEST_F(VideoRendererTest, SourceWithoutPrefetchesIsAnsweredWithoutAFrame)
                        recorder.Callback());
     ASSERT_TRUE(recorder.WaitForCount(1));
     const CallbackCall call = recorder.Get()[0];
-    EXPECT_FALSE(call.mFrame);
+    ASSERT_TRUE(call.mFrame);
+    EXPECT_TRUE(IsFilledWith(call.mFrame, source->mColor));
     EXPECT_EQ(call.mRequestID, 77u);
     EXPECT_EQ(call.mSource.Get(), AsSource(source).Get());
     EXPECT_FALSE(call.mCancelled);
     EXPECT_EQ(call.mStatus, 0);
-    EXPECT_EQ(source->mRenderCount.load(), 0);
+    EXPECT_EQ(source->mRenderCount.load(), 1);
     ML::VideoRenderer::Shutdown();
     EXPECT_EQ(recorder.Count(), 1u);
 }

@@ -31,16 +31,18 @@ std::atomic<std::uint32_t> sLastRequestID{1};
 // The completion function of an InitiateRender request: the queue calls it
 // once, on the thread that delivers, when the request's prefetches are done
 // (inFrame the first handle's frame), when it was cancelled, or when it
-// failed. The source is rendered here, on the delivering thread, only when
-// the prefetch brought a frame.
+// failed. The source is rendered here, on the delivering thread, unless the
+// request was cancelled or failed. A source that needed no prefetch (its
+// reads are cheap) arrives here with no frame and status 0, and is rendered
+// all the same: otherwise such a source could never be rendered this way.
 void RenderSourceFrame(const QRT::InterfaceRef<IRenderableSource>& inSource,
                        const CutlistRenderParams& inParams, unsigned int inRequestID,
                        const InitiateRenderCallback& inCallback,
-                       const QRT::InterfaceRef<MF::IVideoFrame>& inFrame, bool inCancelled,
+                       const QRT::InterfaceRef<MF::IVideoFrame>& /*inFrame*/, bool inCancelled,
                        int inStatus)
 {
     QRT::InterfaceRef<MF::IVideoFrame> rendered;
-    if (!inCancelled && inStatus >= 0 && inSource && inFrame)
+    if (!inCancelled && inStatus >= 0 && inSource)
     {
         try
         {
