@@ -3,7 +3,7 @@
 JOBS ?= $(shell nproc)
 CMAKE_GEN := -G Ninja
 
-.PHONY: all deps build test asan tsan bench format format-check clean
+.PHONY: all deps build test asan tsan bench demo format format-check clean
 
 all: build
 
@@ -34,6 +34,11 @@ tsan: deps
 	cmake --build build-tsan -j $(JOBS) --target threaded_tests
 	TSAN_OPTIONS=halt_on_error=1:second_deadlock_stack=1 scripts/no-aslr \
 	  ctest --test-dir build-tsan --output-on-failure -L threaded
+
+# Build the command-line renderer and run its built-in demo (frames in out/demo/).
+demo: deps build/build.ninja
+	cmake --build build -j $(JOBS) --target vrender
+	build/bin/vrender
 
 # Build the benchmarks in the optimised tree and run them all.
 bench: deps build/build.ninja

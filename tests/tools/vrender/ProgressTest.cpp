@@ -1,0 +1,62 @@
+#include "Progress.h"
+
+#include <cstdio>
+#include <string>
+
+#include <gtest/gtest.h>
+
+namespace
+{
+
+class ProgressTest : public ::testing::Test
+{
+};
+
+TEST_F(ProgressTest, LineShowsBarCountRateAndEta)
+{
+    EXPECT_EQ(vrender::FormatProgressLine(0, 100, 0.0, 10), "[----------]   0/100");
+    EXPECT_EQ(vrender::FormatProgressLine(50, 100, 2.0, 10),
+              "[#####-----]  50/100    25.0 fps  ETA 2.0 s");
+    EXPECT_EQ(vrender::FormatProgressLine(100, 100, 4.0, 10),
+              "[##########] 100/100    25.0 fps  ETA 0.0 s");
+    EXPECT_EQ(vrender::FormatProgressLine(1, 3, 0.5, 3), "[#--] 1/3     2.0 fps  ETA 1.0 s");
+}
+
+TEST_F(ProgressTest, LineSurvivesOddInput)
+{
+    EXPECT_EQ(vrender::FormatProgressLine(5, 0, 1.0, 4), "[####] 5/0     1.0 fps  ETA 0.0 s");
+    EXPECT_EQ(vrender::FormatProgressLine(-1, 10, 1.0, 4), "[----] -1/10");
+}
+
+TEST_F(ProgressTest, Summary)
+{
+    EXPECT_EQ(vrender::FormatSummary(50, 1.25, "out/demo/frame_%05d.png"),
+              "Rendered 50 frames in 1.25 s (40.0 fps) to out/demo/frame_%05d.png");
+    EXPECT_EQ(vrender::FormatSummary(1, 0.5, "standard output"),
+              "Rendered 1 frame in 0.50 s (2.0 fps) to standard output");
+    EXPECT_EQ(vrender::FormatSummary(0, 0.0, "x"), "Rendered 0 frames in 0.00 s (0.0 fps) to x");
+}
+
+TEST_F(ProgressTest, DisabledDisplayWritesNothingEnabledOneErasesItsLine)
+{
+    std::FILE* file = std::tmpfile();
+    ASSERT_NE(file, nullptr);
+    {
+        vrender::ProgressDisplay quiet(file, false, 10);
+        quiet.Update(5);
+        quiet.Clear();
+    }
+    EXPECT_EQ(std::ftell(file), 0);
+    vrender::ProgressDisplay shown(file, true, 10);
+    shown.Update(10);
+    shown.Clear();
+    std::rewind(file);
+    char text[256] = {};
+    const std::size_t size = std::fread(text, 1, sizeof(text) - 1, file);
+    std::fclose(file);
+    const std::string written(text, size);
+    EXPECT_EQ(written.rfind("\r[##############################] 10/10", 0), 0u) << written;
+    EXPECT_EQ(written.substr(written.size() - 4), "\r\x1b[K");
+}
+
+} // namespace

@@ -1,0 +1,97 @@
+#pragma once
+
+// vrender's output writers: numbered PNG files and Y4M streams.
+//
+// Writing a frame is split in two so that the expensive part runs in
+// parallel and the output still comes out in order:
+// - Encode (any thread, concurrently for different frames) does the pixel
+//   work: PNG compression into a temporary file beside the final one, or the
+//   conversion to planar Y'CbCr bytes of a Y4M frame;
+// - Commit (one thread, in frame order) makes the frame visible: renames the
+//   PNG file into place, or appends the Y4M frame to the stream.
+// Discard removes what Encode produced for a frame that will not be
+// committed (a cancelled or failed render). Every failure answers a message
+// that names the file and the problem; nothing throws.
+
+#include "MF/IVideoFrame.h"
+#include "QRT/InterfaceRef.h"
+#include "mvxmediatypes/FieldType.h"
+#include "mvxmediatypes/FrameRate.h"
+#include "mvxmediatypes/PixelAspectRatio.h"
+
+#include <cstdint>
+#include <cstdio>
+#include <memory>
+#include <string>
+#include <vector>
+
+namespace vrender
+{
+
+enum class Y4MChroma;
+
+// What every frame of the output is.
+struct StreamInfo
+{
+    std::uint32_t mWidth = 0;
+    std::uint32_t mHeight = 0;
+    mvxmediatypes::FrameRate mFrameRate = mvxmediatypes::kFrameRate_Video25;
+    mvxmediatypes::FieldType mFieldType = mvxmediatypes::kFieldType_Progressive;
+    mvxmediatypes::PixelAspectRatio mPixelAspectRatio = mvxmediatypes::kPixelAspectRatio_Square;
+    mvxmediatypes::RenderQuality mQuality = mvxmediatypes::kRenderQuality_Max;
+};
+
+// One encoded frame, between Encode and Commit.
+struct EncodedFrame
+{
+    std::int64_t mIndex = 0;
+    // Y4M: the frame's bytes ("FRAME\n" and the planes).
+    std::vector<std::uint8_t> mBytes;
+    // PNG: the temporary file and the final path.
+    std::string mTemporaryPath;
+    std::string mFinalPath;
+    // Empty on success.
+    std::string mError;
+};
+
+class FrameWriter
+{
+public:
+    virtual ~FrameWriter() = default;
+
+    // Prepares the output (creates the directory, writes the stream header).
+    // Called once, before any other operation. False with outError on failure.
+    virtual bool Begin(const StreamInfo& inInfo, std::string& outError) = 0;
+    // Any thread, concurrently. inFrame has the stream's size.
+    virtual EncodedFrame Encode(std::int64_t inIndex,
+                                const QRT::InterfaceRef<MF::IVideoFrame>& inFrame) = 0;
+    // One thread, in index order.
+    virtual bool Commit(EncodedFrame& ioFrame, std::string& outError) = 0;
+    // Removes what Encode left for a frame that is not committed.
+    virtual void Discard(EncodedFrame& ioFrame) = 0;
+    // Flushes and closes the output. False with outError on failure.
+    virtual bool Finish(std::string& outError) = 0;
+    // Where the output goes, for the summary ("out/demo/frame_%05d.png").
+    virtual std::string Describe() const = 0;
+};
+
+// Numbered PNG files from a printf-style pattern (vrender::CheckFramePattern).
+// Frames without alpha, or whose alpha is opaque, are written as RGB.
+std::unique_ptr<FrameWriter> CreatePngSequenceWriter(std::string inPattern);
+
+// A Y4M stream written to inFile (not closed by the writer), or to a file
+// that the writer creates at inPath when inFile is null. Frames are
+// converted to 8-bit video-range Y'CbCr (BT.601 below 720 rows, BT.709 from
+// 720), 4:4:4 or 4:2:0 with each chroma sample the mean of its 2x2 block.
+std::unique_ptr<FrameWriter> CreateY4MWriter(std::FILE* inFile, std::string inPath,
+                                             Y4MChroma inChroma);
+
+// The Y4M stream header line, newline included:
+// "YUV4MPEG2 W<w> H<h> F<n>:<d> I<p|t|b> A<n>:<d> C<420|444> XCOLORRANGE=LIMITED\n".
+std::string MakeY4MHeader(const StreamInfo& inInfo, Y4MChroma inChroma);
+
+// The frame rate as a reduced ratio of frames per second.
+void GetFrameRateRatio(mvxmediatypes::FrameRate inRate, std::int64_t& outNumerator,
+                       std::int64_t& outDenominator);
+
+} // namespace vrender

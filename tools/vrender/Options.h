@@ -1,0 +1,109 @@
+#pragma once
+
+// vrender's command line: what the user asked for, parsed and checked.
+//
+// ParseCommandLine never prints and never exits: it answers the command and
+// its options, or an error message that names the argument and the problem
+// ("--size: 'abc' is not WIDTHxHEIGHT, e.g. 1280x720"). main prints the
+// message and the usage hint. Plain functions over plain values; any thread.
+
+#include "mvxmediatypes/FieldType.h"
+#include "mvxmediatypes/FrameRate.h"
+#include "mvxmediatypes/PixelAspectRatio.h"
+#include "mvxmediatypes/PixelFormat.h"
+
+#include <cstdint>
+#include <optional>
+#include <span>
+#include <string>
+#include <string_view>
+
+namespace vrender
+{
+
+enum class Command
+{
+    kHelp,   // print the usage
+    kDemo,   // the built-in demo (no arguments, or "demo")
+    kSource, // render frames of one media source
+    kInfo,   // print a cutlist
+};
+
+enum class OutputKind
+{
+    kPngSequence, // numbered PNG files
+    kY4MStream,   // a Y4M stream on standard output
+    kY4MFile,     // a Y4M file
+};
+
+enum class Y4MChroma
+{
+    k420,
+    k444,
+};
+
+// Largest --jobs value: each frame in flight holds a full frame or two.
+inline constexpr std::uint32_t kMaxJobs = 64;
+
+struct RenderOptions
+{
+    // The media: a file path or a "pattern:" spec.
+    std::string mMedia;
+    // First frame and number of frames; unset means the whole media (or the
+    // default length of endless media).
+    std::optional<std::int64_t> mStart;
+    std::optional<std::int64_t> mCount;
+    // Output size; 0 x 0 means the source's size.
+    std::uint32_t mWidth = 0;
+    std::uint32_t mHeight = 0;
+    // Unset: the source's pixel aspect ratio.
+    std::optional<mvxmediatypes::PixelAspectRatio> mPixelAspectRatio;
+    mvxmediatypes::PixelFormat mPixelFormat = mvxmediatypes::kPixelFormat_BGRA_4444_8u;
+    // Unset: the source's field order.
+    std::optional<mvxmediatypes::FieldType> mFieldType;
+    // Unset: the source's frame rate (25 for still images).
+    std::optional<mvxmediatypes::FrameRate> mFrameRate;
+    std::uint32_t mQuality = mvxmediatypes::kRenderQuality_Max;
+    OutputKind mOutputKind = OutputKind::kPngSequence;
+    // The PNG path pattern (one printf-style frame number, e.g. %05d) or the
+    // Y4M file path; empty for a stream.
+    std::string mOutputPath;
+    Y4MChroma mChroma = Y4MChroma::k420;
+    // 0: the default (twice the core count, at most kMaxJobs).
+    std::uint32_t mJobs = 0;
+    bool mQuiet = false;
+};
+
+struct ParsedCommandLine
+{
+    Command mCommand = Command::kHelp;
+    RenderOptions mOptions;
+    // Empty on success.
+    std::string mError;
+
+    bool Succeeded() const { return mError.empty(); }
+};
+
+// Parses the arguments after the program name.
+ParsedCommandLine ParseCommandLine(std::span<const std::string_view> inArguments);
+
+// The options of the built-in demo: the moving pattern at 1280x720, 50
+// frames, PNG files in out/demo/.
+RenderOptions MakeDemoOptions();
+
+// The text of --help.
+std::string GetUsageText();
+
+// Parsers of single values, shared with the tests. Each answers nothing when
+// the text is not a valid value.
+std::optional<std::int64_t> ParseCount(std::string_view inText);
+std::optional<mvxmediatypes::FrameRate> ParseFrameRate(std::string_view inText);
+
+// A printf-style frame-number pattern: exactly one %d, %Nd or %0Nd (N up to
+// 2 digits) and any number of %% escapes. Answers an empty string when the
+// pattern is valid, else the problem.
+std::string CheckFramePattern(std::string_view inPattern);
+// The pattern with its frame number filled in (the pattern must be valid).
+std::string FormatFramePath(std::string_view inPattern, std::int64_t inFrame);
+
+} // namespace vrender

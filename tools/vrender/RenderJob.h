@@ -1,0 +1,92 @@
+#pragma once
+
+// vrender's render loop: renders a range of frames of one media source
+// through ML::InitiateRender and writes them in order.
+//
+// The loop runs on the caller's thread. It keeps up to `jobs` frames in
+// flight: each is conformed (IRenderableSource::ConformFrameTime) and handed
+// to ML::InitiateRender; the module calls back on its delivering thread,
+// which only posts the frame to vrender's encoder pool (format conversion,
+// PNG compression or Y'CbCr packing run there, in parallel); finished frames
+// go through an OrderingWindow back into frame order and are committed by
+// the loop. A cancel request (Ctrl-C) or a failed frame cancels everything
+// in flight with ML::CancelRender, waits until every request has ended and
+// removes what was produced but not written. The module must be up
+// (ML::VideoRenderer::Initialize) for the whole call.
+
+#include "FrameWriters.h"
+#include "Options.h"
+#include "mvxmediatypes/FieldType.h"
+#include "mvxmediatypes/FrameRate.h"
+#include "mvxmediatypes/PixelAspectRatio.h"
+#include "mvxmediatypes/TickTime.h"
+
+#include <atomic>
+#include <cstdint>
+#include <cstdio>
+#include <string>
+
+namespace vrender
+{
+
+// What vrender needs to know about a source to plan a render.
+struct SourceFacts
+{
+    std::uint32_t mWidth = 0;
+    std::uint32_t mHeight = 0;
+    mvxmediatypes::FrameRate mFrameRate;
+    bool mIsStill = false;
+    mvxmediatypes::FieldType mFieldType = mvxmediatypes::kFieldType_Progressive;
+    mvxmediatypes::PixelAspectRatio mPixelAspectRatio;
+    // kTime_Max for media without an end.
+    mvxmediatypes::TickTime mDuration = mvxmediatypes::kTime_Max;
+};
+
+// Frames of endless media rendered when no range is given.
+inline constexpr std::int64_t kDefaultEndlessFrameCount = 50;
+// Frame rate of the frame grid for still images when none is given.
+inline constexpr mvxmediatypes::FrameRate kDefaultStillFrameRate =
+    mvxmediatypes::kFrameRate_Video25;
+
+struct RenderPlan
+{
+    std::int64_t mFirst = 0;
+    std::int64_t mCount = 0;
+    StreamInfo mStream;
+    mvxmediatypes::PixelFormat mPixelFormat;
+    std::uint32_t mJobs = 1;
+};
+
+// Resolves the options against the source: frame range (checked against the
+// media's length), size, pixel aspect ratio, field order, frame rate and the
+// number of frames in flight. False with outError naming the option and the
+// problem ("--frames 90:120: the media has 100 frames (0 to 99)").
+bool PlanRender(const RenderOptions& inOptions, const SourceFacts& inSource, unsigned inCoreCount,
+                RenderPlan& outPlan, std::string& outError);
+
+struct RenderOutcome
+{
+    // 0 success, 1 failure, 130 cancelled.
+    int mExitCode = 0;
+    // The failure, naming the file or frame and the problem; empty otherwise.
+    std::string mError;
+    std::int64_t mFramesWritten = 0;
+    double mSeconds = 0.0;
+    // Where the frames went (the writer's description).
+    std::string mWhere;
+};
+
+struct RenderEnvironment
+{
+    // Y4M streams go here.
+    std::FILE* mOutput = stdout;
+    // Progress goes here.
+    std::FILE* mProgress = stderr;
+    bool mShowProgress = false;
+    // Set from another thread or a signal handler to cancel.
+    const std::atomic<bool>* mCancel = nullptr;
+};
+
+RenderOutcome RunRender(const RenderOptions& inOptions, const RenderEnvironment& inEnvironment);
+
+} // namespace vrender
