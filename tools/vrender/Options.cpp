@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <charconv>
 #include <cmath>
+#include <cstdlib>
 #include <set>
 
 namespace vrender
@@ -162,6 +163,28 @@ private:
             return;
 
         RenderOptions& options = mResult.mOptions;
+        static const std::set<std::string_view> kFilterFlags = {
+            "--reverse-field-dominance", "--field-reverse",         "--deinterlace",
+            "--remove-flicker",          "--interlace-consecutive", "--frame-blend"};
+        if (kFilterFlags.contains(name))
+        {
+            if (inlineValue)
+                return Fail(std::string(name) + " takes no value");
+            FilterOptions& filters = options.mFilters;
+            if (name == "--reverse-field-dominance")
+                filters.mReverseFieldDominance = true;
+            else if (name == "--field-reverse")
+                filters.mFieldReverse = true;
+            else if (name == "--deinterlace")
+                filters.mDeinterlace = true;
+            else if (name == "--remove-flicker")
+                filters.mRemoveFlicker = true;
+            else if (name == "--interlace-consecutive")
+                filters.mInterlaceConsecutive = true;
+            else
+                filters.mFrameBlend = true;
+            return;
+        }
         if (name == "--quiet" || name == "--y4m")
         {
             if (inlineValue)
@@ -178,8 +201,9 @@ private:
         }
 
         static const std::set<std::string_view> kValued = {
-            "--frames",  "--start", "--count", "--size", "--par",        "--format", "--field",
-            "--quality", "--rate",  "--jobs",  "-o",     "--output-dir", "--chroma"};
+            "--frames", "--start",   "--count", "--size",           "--par", "--format",
+            "--field",  "--quality", "--rate",  "--jobs",           "-o",    "--output-dir",
+            "--chroma", "--scale",   "--speed", "--remove-pulldown"};
         if (!kValued.contains(name))
             return Fail("unknown option " + Quoted(inArgument) + " (see vrender --help)");
         const std::optional<std::string_view> value = TakeValue(name, inlineValue);
@@ -217,7 +241,33 @@ private:
             if (!options.mCount || *options.mCount < 1)
                 return Fail(prefix + Quoted(*value) + " is not a frame count (1 or more)");
         }
-        else if (name == "--size")
+        else if (name == "--remove-pulldown")
+        {
+            static const std::pair<std::string_view, mvxmediatypes::PulldownCadence> kCadences[] = {
+                {"AA", mvxmediatypes::kPulldownCadence_23_AA},
+                {"BB", mvxmediatypes::kPulldownCadence_23_BB},
+                {"BC", mvxmediatypes::kPulldownCadence_23_BC},
+                {"CD", mvxmediatypes::kPulldownCadence_23_CD},
+                {"DD", mvxmediatypes::kPulldownCadence_23_DD}};
+            for (const auto& [text, cadence] : kCadences)
+                if (*value == text)
+                    options.mFilters.mRemovePulldown = cadence;
+            if (options.mFilters.mRemovePulldown == mvxmediatypes::kPulldownCadence_None)
+                return Fail(prefix + Quoted(*value) +
+                            " is not a 2:3 cadence phase (AA, BB, BC, CD or DD)");
+        }
+        else if (name == "--speed")
+        {
+            const std::string text(*value);
+            char* end = nullptr;
+            const double speed = std::strtod(text.c_str(), &end);
+            if (text.empty() || end != text.c_str() + text.size() || !std::isfinite(speed) ||
+                speed == 0.0 || std::fabs(speed) > 1000.0)
+                return Fail(prefix + Quoted(*value) +
+                            " is not a speed (a non-zero number from -1000 to 1000, e.g. 0.5)");
+            options.mFilters.mSpeed = speed;
+        }
+        else if (name == "--size" || name == "--scale")
         {
             const std::size_t x = value->find_first_of("xX");
             const std::optional<std::uint64_t> width =
@@ -231,6 +281,8 @@ private:
                 return Fail(prefix + Quoted(*value) + " is out of range (1 to 32768 each)");
             options.mWidth = static_cast<std::uint32_t>(*width);
             options.mHeight = static_cast<std::uint32_t>(*height);
+            if (name == "--scale")
+                options.mFilters.mScale = true;
         }
         else if (name == "--par")
         {
@@ -247,6 +299,7 @@ private:
                             " is not N:D with both terms positive, e.g. 1:1 or 10:11");
             options.mPixelAspectRatio = mt::PixelAspectRatio(
                 static_cast<std::uint32_t>(*numerator), static_cast<std::uint32_t>(*denominator));
+            options.mFilters.mScale = true;
         }
         else if (name == "--format")
         {
@@ -575,6 +628,20 @@ Options:
   -j, --jobs N        frames in flight, 1 to 64 (default: twice the cores)
   -q, --quiet         no progress bar
   -h, --help          this text
+
+Filters, stacked on the source in this order:
+  --remove-pulldown P       remove 2:3 pulldown; P is the cadence phase of
+                            frame 0: AA, BB, BC, CD or DD (replaces the
+                            field filters below)
+  --reverse-field-dominance treat the source's field order as swapped
+  --field-reverse           deliver the fields in the requested order
+  --deinterlace             keep one field and rebuild the other
+  --remove-flicker          vertical flicker filter
+  --interlace-consecutive   interlace each two consecutive frames
+  --scale WxH               scale to WxH with pixel-aspect correction (--par
+                            also brings in the scaler)
+  --speed S                 re-time by S (0.5 slow motion, -1 reverse) with
+                            frame mixing, or frame blending with --frame-blend
 
 Ctrl-C cancels the frames in flight and stops cleanly.
 )";

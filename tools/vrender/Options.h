@@ -11,6 +11,7 @@
 #include "mvxmediatypes/FrameRate.h"
 #include "mvxmediatypes/PixelAspectRatio.h"
 #include "mvxmediatypes/PixelFormat.h"
+#include "mvxmediatypes/Pulldown.h"
 
 #include <cstdint>
 #include <optional>
@@ -45,6 +46,35 @@ enum class Y4MChroma
 // Largest --jobs value: each frame in flight holds a full frame or two.
 inline constexpr std::uint32_t kMaxJobs = 64;
 
+// The frame filters stacked on the media source, applied in the order a
+// media node stacks them: pulldown removal (which replaces the field steps),
+// reverse field dominance, field reverse, deinterlace, flicker removal,
+// interlacing of consecutive frames, scaling, then re-timing.
+struct FilterOptions
+{
+    // --remove-pulldown AA|BB|BC|CD|DD: the 2:3 cadence phase of frame 0.
+    mvxmediatypes::PulldownCadence mRemovePulldown = mvxmediatypes::kPulldownCadence_None;
+    bool mReverseFieldDominance = false;
+    bool mFieldReverse = false;
+    bool mDeinterlace = false;
+    bool mRemoveFlicker = false;
+    bool mInterlaceConsecutive = false;
+    // --scale WxH (also sets the output size) or --par: the scaler with
+    // pixel-aspect correction.
+    bool mScale = false;
+    // --speed S: media time = output time x S, through time mix, or time
+    // blend with --frame-blend.
+    std::optional<double> mSpeed;
+    bool mFrameBlend = false;
+
+    bool Any() const
+    {
+        return mRemovePulldown != mvxmediatypes::kPulldownCadence_None || mReverseFieldDominance ||
+               mFieldReverse || mDeinterlace || mRemoveFlicker || mInterlaceConsecutive || mScale ||
+               mSpeed.has_value();
+    }
+};
+
 struct RenderOptions
 {
     // The media: a file path or a "pattern:" spec.
@@ -72,6 +102,7 @@ struct RenderOptions
     // 0: the default (twice the core count, at most kMaxJobs).
     std::uint32_t mJobs = 0;
     bool mQuiet = false;
+    FilterOptions mFilters;
 };
 
 struct ParsedCommandLine

@@ -3,7 +3,9 @@
 #include "BE/IMediaInfo.h"
 #include "BE/VideoSources.h"
 #include "MF/BinaryData.h"
+#include "MF/TimeTransform.h"
 #include "ML/RenderRequestException.h"
+#include "ML/RenderableSourceFilters.h"
 #include "ML/RenderableVideoSources.h"
 #include "ML/VideoRenderer.h"
 #include "OrderingWindow.h"
@@ -56,11 +58,12 @@ struct FrameResult
 struct SharedState
 {
     SharedState(std::int64_t inFirst, SourceRef inSource, std::unique_ptr<FrameWriter> inWriter,
-                RenderPlan inPlan)
+                RenderPlan inPlan, QRT::InterfaceRef<MF::ITimeTransform> inTimeTransform)
         : mWindow(inFirst)
         , mSource(std::move(inSource))
         , mWriter(std::move(inWriter))
         , mPlan(inPlan)
+        , mTimeTransform(std::move(inTimeTransform))
     {
     }
 
@@ -68,6 +71,8 @@ struct SharedState
     const SourceRef mSource;
     const std::unique_ptr<FrameWriter> mWriter;
     const RenderPlan mPlan;
+    // Output time to media time (--speed); empty when frames are not re-timed.
+    const QRT::InterfaceRef<MF::ITimeTransform> mTimeTransform;
 };
 
 // The delivered frame in the stream's format and size: the source delivers
@@ -102,6 +107,40 @@ FrameRef ConformToStream(const FrameRef& inFrame, const RenderPlan& inPlan, std:
         converted->SetAlphaChannel(inFrame->HasAlpha() ? inFrame->GetAlphaChannel()
                                                        : mt::kAlphaChannel_Straight);
     return converted;
+}
+
+// Stacks the frame filters of inFilters on inSource in the order a media
+// node stacks them. outTimeTransform is the output-to-media time mapping
+// when frames are re-timed, else empty.
+SourceRef StackFilters(SourceRef inSource, const FilterOptions& inFilters, bool inStill,
+                       QRT::InterfaceRef<MF::ITimeTransform>& outTimeTransform)
+{
+    SourceRef source = std::move(inSource);
+    if (inFilters.mRemovePulldown != mvxmediatypes::kPulldownCadence_None)
+        source = ML::RemovePulldownFromSource(source, inFilters.mRemovePulldown);
+    else
+    {
+        if (inFilters.mReverseFieldDominance)
+            source = ML::ReverseFieldDominanceOfSource(source);
+        if (inFilters.mFieldReverse)
+            source = ML::FieldReverseSource(source);
+        if (inFilters.mDeinterlace)
+            source = ML::DeinterlaceSource(source);
+        if (inFilters.mRemoveFlicker)
+            source = ML::RemoveFlickerFromSource(source);
+        if (inFilters.mInterlaceConsecutive && !inStill)
+            source = ML::InterlaceConsecutiveFramesFromSource(source);
+    }
+    if (inFilters.mScale)
+        source = ML::ScaleAndPARCorrectSource(source);
+    if (inFilters.mSpeed && !inStill)
+    {
+        outTimeTransform = MF::CreateTimeTransform(*inFilters.mSpeed);
+        source = inFilters.mFrameBlend
+                     ? ML::TimeBlendSource(source, outTimeTransform, *inFilters.mSpeed)
+                     : ML::TimeMixSource(source);
+    }
+    return source;
 }
 
 // Runs on the encoder pool: finishes one delivered frame.
@@ -262,7 +301,13 @@ private:
         const mt::TickTime time = mt::TickTime::FromFrame(inIndex, stream.mFrameRate);
         const mt::TickTime fieldDuration = mt::TickTime::TicksToTime(
             std::max<std::int64_t>(stream.mFrameRate.GetTicksPerFrame() / 2, 1));
-        const MF::FrameTime requested = MF::FrameTime::Make(time, stream.mFieldType, fieldDuration);
+        MF::FrameTime requested = MF::FrameTime::Make(time, stream.mFieldType, fieldDuration);
+        // Re-timed output asks the time filter for the media times of its
+        // fields; the filter blends or picks the media frames around them.
+        if (mState->mTimeTransform)
+            requested =
+                MF::FrameTime(mState->mTimeTransform->Transform(requested.GetFirstFieldTime()),
+                              mState->mTimeTransform->Transform(requested.GetSecondFieldTime()));
 
         ML::CutlistRenderParams params;
         params.SetFrameTime(requested);
@@ -451,7 +496,10 @@ RenderOutcome RunRender(const RenderOptions& inOptions, const RenderEnvironment&
     std::unique_ptr<FrameWriter> writer = CreateWriter(inOptions, inEnvironment);
     if (!writer->Begin(plan.mStream, outcome.mError))
         return outcome;
-    auto state = std::make_shared<SharedState>(plan.mFirst, source, std::move(writer), plan);
+    QRT::InterfaceRef<MF::ITimeTransform> timeTransform;
+    source = StackFilters(source, inOptions.mFilters, media->IsStill(), timeTransform);
+    auto state =
+        std::make_shared<SharedState>(plan.mFirst, source, std::move(writer), plan, timeTransform);
     const ExecutorRef encoders =
         mvxcore::threads::CreateThreadPoolExecutor(mvxcore::threads::GetCPUCoreCount());
 

@@ -236,3 +236,29 @@ TEST_F(EndToEndTest, InfoPrintsTheExampleCutlist)
 }
 
 } // namespace
+
+TEST_F(EndToEndTest, SpeedRetimesThroughTimeMixOrTimeBlend)
+{
+    // At half speed, time mix shows media frame floor(n / 2): output frames 0
+    // and 1 are the same picture. Time blend mixes media frames 0 and 1 into
+    // output frame 1, which then differs from both neighbours.
+    const fs::path mix = mDirectory / "mix";
+    const fs::path blend = mDirectory / "blend";
+    ASSERT_EQ(Run("source 'pattern:moving?size=64x36' --count 3 --speed 0.5 -o '" + mix.string() +
+                  "/f_%d.png'"),
+              0)
+        << ReadText("err.txt");
+    ASSERT_EQ(Run("source 'pattern:moving?size=64x36' --count 3 --speed 0.5 --frame-blend -o '" +
+                  blend.string() + "/f_%d.png'"),
+              0)
+        << ReadText("err.txt");
+    const FrameRef mix0 = ReadPng(mix / "f_0.png");
+    const FrameRef mix1 = ReadPng(mix / "f_1.png");
+    const FrameRef mix2 = ReadPng(mix / "f_2.png");
+    const FrameRef blend1 = ReadPng(blend / "f_1.png");
+    ASSERT_TRUE(mix0 && mix1 && mix2 && blend1);
+    EXPECT_FALSE(Differ(mix0, mix1, 0)) << "time mix repeats media frame 0";
+    EXPECT_TRUE(Differ(mix1, mix2, 0));
+    EXPECT_TRUE(Differ(blend1, mix0, 0)) << "time blend mixes media frames 0 and 1";
+    EXPECT_TRUE(Differ(blend1, mix2, 0));
+}

@@ -252,3 +252,39 @@ TEST_F(OptionsTest, FramePatterns)
 }
 
 } // namespace
+
+TEST_F(OptionsTest, FilterOptionsStackInTheMediaNodeOrder)
+{
+    const ParsedCommandLine parsed =
+        Parse({"source", "clip.y4m", "--remove-pulldown", "BC", "--deinterlace", "--speed", "0.5",
+               "--frame-blend", "--scale", "320x180", "--reverse-field-dominance"});
+    ASSERT_TRUE(parsed.Succeeded()) << parsed.mError;
+    const vrender::FilterOptions& filters = parsed.mOptions.mFilters;
+    EXPECT_EQ(filters.mRemovePulldown, mvxmediatypes::kPulldownCadence_23_BC);
+    EXPECT_TRUE(filters.mDeinterlace);
+    EXPECT_TRUE(filters.mReverseFieldDominance);
+    EXPECT_FALSE(filters.mFieldReverse);
+    EXPECT_FALSE(filters.mRemoveFlicker);
+    EXPECT_FALSE(filters.mInterlaceConsecutive);
+    ASSERT_TRUE(filters.mSpeed);
+    EXPECT_EQ(*filters.mSpeed, 0.5);
+    EXPECT_TRUE(filters.mFrameBlend);
+    EXPECT_TRUE(filters.mScale);
+    EXPECT_EQ(parsed.mOptions.mWidth, 320u);
+    EXPECT_EQ(parsed.mOptions.mHeight, 180u);
+
+    // --par alone also brings in the scaler; no filter option means no filters.
+    EXPECT_TRUE(Parse({"source", "x.png", "--par", "10:11"}).mOptions.mFilters.mScale);
+    EXPECT_FALSE(Parse({"source", "x.png", "--size", "64x36"}).mOptions.mFilters.Any());
+}
+
+TEST_F(OptionsTest, BadFilterValuesAreNamed)
+{
+    EXPECT_EQ(SourceError({"--remove-pulldown", "XY"}),
+              "--remove-pulldown: 'XY' is not a 2:3 cadence phase (AA, BB, BC, CD or DD)");
+    EXPECT_EQ(SourceError({"--speed", "0"}),
+              "--speed: '0' is not a speed (a non-zero number from -1000 to 1000, e.g. 0.5)");
+    EXPECT_EQ(SourceError({"--speed", "fast"}),
+              "--speed: 'fast' is not a speed (a non-zero number from -1000 to 1000, e.g. 0.5)");
+    EXPECT_EQ(SourceError({"--deinterlace=1"}), "--deinterlace takes no value");
+}
