@@ -1,10 +1,12 @@
 #include "ML/VideoRenderer.h"
 
+#include "BE/VideoSources.h"
 #include "BrambleSupport/BrambleSupport.h"
 #include "ContractExpect.h"
 #include "ImporterHost/ImporterHost.h"
 #include "ML/RenderExecutors.h"
 #include "ML/RenderFrameQueue.h"
+#include "ML/RenderableVideoSources.h"
 #include "ModuleTestSupport.h"
 #include "module/ModuleInternals.h"
 #include "mvxcore/debug/Contract.h"
@@ -568,3 +570,33 @@ TEST_F(VideoRendererTest, ConcurrentRendersAndCancelsAreEachAnsweredExactlyOnce)
 }
 
 } // namespace
+
+TEST_F(VideoRendererTest, PatternSourceRendersEndToEndWithItsPixels)
+{
+    // A real back-end source (a solid pattern) wrapped by the media adaptor
+    // and rendered through InitiateRender at two sizes.
+    ML::VideoRenderer::Initialize();
+    BE::VideoSourceRef media;
+    ASSERT_TRUE(BE::OpenVideoSource("pattern:solid?size=64x36&color=3366CC", media).Succeeded());
+    const auto source = ML::CreateRenderableSource(
+        media, MF::BinaryData(), media->GetAlphaChannel(), media->GetMatteColor(), false, false,
+        media->GetFrameRate(), media->GetFieldType(), media->GetPixelAspectRatio(),
+        media->GetColorProfile());
+    ASSERT_TRUE(source);
+
+    CallbackRecorder recorder;
+    const MF::FrameTime frameTime(TickTime::TicksToTime(0));
+    ML::InitiateRender(source, frameTime, MakeParams(frameTime, 16, 8), 501, recorder.Callback());
+    ML::InitiateRender(source, frameTime, MakeParams(frameTime, 64, 36), 502, recorder.Callback());
+    ASSERT_TRUE(recorder.WaitForCount(2));
+    const std::uint8_t expected[4] = {0xCC, 0x66, 0x33, 0xFF}; // B, G, R, A
+    for (const CallbackCall& call : recorder.Get())
+    {
+        ASSERT_TRUE(call.mFrame) << call.mRequestID;
+        EXPECT_FALSE(call.mCancelled);
+        EXPECT_EQ(call.mStatus, 0);
+        EXPECT_EQ(call.mFrame->GetBounds().Width(), call.mRequestID == 501 ? 16 : 64);
+        EXPECT_TRUE(IsFilledWith(call.mFrame, expected)) << call.mRequestID;
+    }
+    ML::VideoRenderer::Shutdown();
+}
