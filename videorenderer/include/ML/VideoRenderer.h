@@ -50,8 +50,10 @@ using InitiateRenderCallback =
                          QRT::InterfaceRef<IRenderableSource>, bool, int)>;
 
 // Renders one frame of inSource asynchronously: collects the source's
-// prefetches, queues a prefetch-only request, and when the prefetches are
-// done renders the source on the delivering thread and calls inCallback.
+// prefetches for inFrameTime, queues a prefetch-only request, and when the
+// prefetches are done renders the source on the delivering thread and calls
+// inCallback. The render uses the frame time held by inParams (its leading
+// MF::FrameTime), so callers set it to inFrameTime.
 // An empty source does nothing and never calls back.
 void InitiateRender(QRT::InterfaceRef<IRenderableSource> inSource, const MF::FrameTime& inFrameTime,
                     const CutlistRenderParams& inParams, unsigned int inRequestID,

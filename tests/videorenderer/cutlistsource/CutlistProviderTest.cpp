@@ -1,0 +1,175 @@
+#include "BE/CutlistProvider.h"
+
+#include "ContractExpect.h"
+#include "ML/IMutableCutlist.h"
+
+#include <atomic>
+#include <thread>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+namespace
+{
+
+using mvxmediatypes::FieldType;
+
+QRT::InterfaceRef<MF::IRenderableCutlist> NewCutlist(const char* inName)
+{
+    auto cutlist = ML::CreateMutableCutlist(QRT::ImmutableString::CreateStatic(inName));
+    cutlist->MakeImmutable();
+    return QRT::InterfaceRef<MF::IRenderableCutlist>(cutlist);
+}
+
+BE::CutlistProviderSettings Settings(std::int32_t inRight, std::int32_t inBottom)
+{
+    BE::CutlistProviderSettings settings;
+    settings.mRight = inRight;
+    settings.mBottom = inBottom;
+    settings.mPixelAspectRatio = mvxmediatypes::kPixelAspectRatio_D1PAL;
+    settings.mFieldType = mvxmediatypes::kFieldType_LowerFirst;
+    settings.mFrameRate = mvxmediatypes::kFrameRate_Video25;
+    return settings;
+}
+
+class CutlistProviderTest : public ::testing::Test
+{
+protected:
+    QRT::InterfaceRef<BE::ICutlistProvider> mProvider =
+        BE::CreateCutlistProvider(Settings(720, 576));
+    const QRT::ImmutableString mSequence = QRT::ImmutableString::CreateStatic("Sequence 01");
+    const QRT::ImmutableString mDefault;
+};
+
+TEST_F(CutlistProviderTest, PropertiesAnswerTheSettingsThroughTheirInterface)
+{
+    const auto properties = QRT::QueryRef<MF::IRenderableCutlistProviderProperties>(mProvider);
+    ASSERT_TRUE(properties);
+    std::int32_t left = -1, top = -1, right = -1, bottom = -1;
+    properties->GetBounds(left, top, right, bottom);
+    EXPECT_EQ(left, 0);
+    EXPECT_EQ(top, 0);
+    EXPECT_EQ(right, 720);
+    EXPECT_EQ(bottom, 576);
+    EXPECT_EQ(properties->GetPixelAspectRatio(), mvxmediatypes::kPixelAspectRatio_D1PAL);
+    EXPECT_EQ(properties->GetFieldType(), mvxmediatypes::kFieldType_LowerFirst);
+    EXPECT_EQ(properties->GetFrameRate(), mvxmediatypes::kFrameRate_Video25);
+    // The provider is also reachable as the plain provider interface.
+    EXPECT_TRUE(QRT::QueryRef<MF::IRenderableCutlistProvider>(properties));
+}
+
+TEST_F(CutlistProviderTest, GettersAnswerTheCutlistsOfTheNameOrTheDefaultSet)
+{
+    const auto main = NewCutlist("main");
+    const auto alternate = NewCutlist("alternate");
+    const auto third = NewCutlist("third");
+    const auto fallback = NewCutlist("fallback");
+    mProvider->SetCutlists(mSequence, {main, alternate, third});
+
+    EXPECT_EQ(mProvider->GetMainCutlist(mSequence, true), main);
+    EXPECT_EQ(mProvider->GetAlternateCutlist(mSequence, true), alternate);
+    EXPECT_EQ(mProvider->GetThirdCutlist(mSequence, false), third);
+    // No default set yet: another name gets nothing.
+    const auto other = QRT::ImmutableString::CreateDynamic("Sequence 02");
+    EXPECT_FALSE(mProvider->GetMainCutlist(other, true));
+
+    mProvider->SetCutlists(mDefault, {fallback, {}, {}});
+    EXPECT_EQ(mProvider->GetMainCutlist(other, true), fallback);
+    EXPECT_FALSE(mProvider->GetAlternateCutlist(other, true));
+    // A name with its own set never falls back.
+    EXPECT_EQ(mProvider->GetMainCutlist(mSequence, true), main);
+
+    mProvider->RemoveCutlists(mSequence);
+    EXPECT_EQ(mProvider->GetMainCutlist(mSequence, true), fallback);
+    mProvider->RemoveCutlists(QRT::ImmutableString::CreateStatic("never registered"));
+    EXPECT_EQ(mProvider->GetMainCutlist(other, true), fallback);
+}
+
+TEST_F(CutlistProviderTest, SetCutlistsReplacesTheSetOfThatName)
+{
+    const auto first = NewCutlist("first");
+    const auto second = NewCutlist("second");
+    mProvider->SetCutlists(mSequence, {first, first, first});
+    mProvider->SetCutlists(mSequence, {second, {}, {}});
+    EXPECT_EQ(mProvider->GetMainCutlist(mSequence, true), second);
+    EXPECT_FALSE(mProvider->GetAlternateCutlist(mSequence, true));
+    EXPECT_FALSE(mProvider->GetThirdCutlist(mSequence, true));
+}
+
+TEST_F(CutlistProviderTest, BadSettingsBreakTheContractAndChangeNothing)
+{
+    BE::CutlistProviderSettings inverted = Settings(720, 576);
+    inverted.mLeft = 800;
+    EXPECT_INPUT_CONTRACT(mProvider->SetSettings(inverted),
+                          "inSettings.mRight >= inSettings.mLeft");
+    BE::CutlistProviderSettings upsideDown = Settings(720, -1);
+    EXPECT_INPUT_CONTRACT(mProvider->SetSettings(upsideDown),
+                          "inSettings.mBottom >= inSettings.mTop");
+    BE::CutlistProviderSettings badField = Settings(720, 576);
+    badField.mFieldType = mvxmediatypes::kFieldType_Invalid;
+    EXPECT_INPUT_CONTRACT(mProvider->SetSettings(badField),
+                          "inSettings.mFieldType >= mvxmediatypes::kFieldType_Progressive && "
+                          "inSettings.mFieldType <= mvxmediatypes::kFieldType_AsSource");
+    BE::CutlistProviderSettings badRatio = Settings(720, 576);
+    badRatio.mPixelAspectRatio = mvxmediatypes::kPixelAspectRatio_Any;
+    EXPECT_INPUT_CONTRACT(BE::CreateCutlistProvider(badRatio),
+                          "inSettings.mPixelAspectRatio.IsValid()");
+
+    const BE::CutlistProviderSettings kept = mProvider->GetSettings();
+    EXPECT_EQ(kept.mRight, 720);
+    EXPECT_EQ(kept.mBottom, 576);
+    EXPECT_EQ(kept.mFieldType, mvxmediatypes::kFieldType_LowerFirst);
+    EXPECT_EQ(kept.mPixelAspectRatio, mvxmediatypes::kPixelAspectRatio_D1PAL);
+}
+
+TEST_F(CutlistProviderTest, ConcurrentReadersSeeWholeSettingsAndWholeSets)
+{
+    const auto properties = QRT::QueryRef<MF::IRenderableCutlistProviderProperties>(mProvider);
+    const auto a = NewCutlist("a");
+    const auto b = NewCutlist("b");
+    mProvider->SetCutlists(mSequence, {a, a, a});
+    std::atomic<bool> stop{false};
+    std::atomic<int> torn{0};
+    std::atomic<int> reads{0};
+
+    std::thread writer(
+        [&]
+        {
+            // The readers are running before the first change.
+            while (reads.load() < 3)
+                std::this_thread::yield();
+            for (int i = 0; i < 2000; ++i)
+            {
+                mProvider->SetSettings(i % 2 == 0 ? Settings(1920, 1080) : Settings(720, 576));
+                mProvider->SetCutlists(mSequence, i % 2 == 0 ? BE::CutlistSet{b, b, b}
+                                                             : BE::CutlistSet{a, a, a});
+            }
+            stop = true;
+        });
+    std::vector<std::thread> readers;
+    for (int r = 0; r < 3; ++r)
+    {
+        readers.emplace_back(
+            [&]
+            {
+                while (!stop.load())
+                {
+                    std::int32_t left, top, right, bottom;
+                    properties->GetBounds(left, top, right, bottom);
+                    if (!((right == 1920 && bottom == 1080) || (right == 720 && bottom == 576)))
+                        ++torn;
+                    const auto main = mProvider->GetMainCutlist(mSequence, true);
+                    if (main != a && main != b)
+                        ++torn;
+                    ++reads;
+                }
+            });
+    }
+    writer.join();
+    for (auto& reader : readers)
+        reader.join();
+    EXPECT_EQ(torn.load(), 0);
+    EXPECT_GE(reads.load(), 3);
+}
+
+} // namespace
