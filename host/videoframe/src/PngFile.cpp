@@ -63,6 +63,8 @@ PngStatus WritePngFile(const std::string& inPath, const QRT::InterfaceRef<MF::IV
     png.mImage.width = static_cast<png_uint_32>(bounds.Width());
     png.mImage.height = static_cast<png_uint_32>(bounds.Height());
     png.mImage.format = withAlpha ? PNG_FORMAT_BGRA : PNG_FORMAT_BGR;
+    // Rendered frames are written as they come: favour speed over file size.
+    png.mImage.flags = PNG_IMAGE_FLAG_FAST;
     int ok = 0;
     if (withAlpha)
     {
