@@ -99,7 +99,7 @@ public:
             return;
         if (mTakesMedia && !mHaveMedia)
             return Fail("source: no media given (an image file, a .y4m file or a pattern: "
-                        "spec such as pattern:bars)");
+                        "text such as pattern:bars)");
         Finish();
     }
 

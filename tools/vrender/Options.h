@@ -77,7 +77,7 @@ struct FilterOptions
 
 struct RenderOptions
 {
-    // The media: a file path or a "pattern:" spec.
+    // The media: a file path or a "pattern:" text.
     std::string mMedia;
     // First frame and number of frames; unset means the whole media (or the
     // default length of endless media).

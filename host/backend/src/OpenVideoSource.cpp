@@ -10,24 +10,25 @@ namespace
 constexpr std::string_view kPatternPrefix = "pattern:";
 } // namespace
 
-OpenStatus OpenVideoSource(const std::string& inSpec, VideoSourceRef& outSource)
+OpenStatus OpenVideoSource(const std::string& inMedia, VideoSourceRef& outSource)
 {
     outSource.Reset();
-    if (std::string_view(inSpec).substr(0, kPatternPrefix.size()) == kPatternPrefix)
+    if (std::string_view(inMedia).substr(0, kPatternPrefix.size()) == kPatternPrefix)
     {
-        const PatternParseResult parsed = ParsePatternSpec(inSpec);
+        const PatternParseResult parsed = ParsePatternSettings(inMedia);
         if (!parsed.Succeeded())
             return OpenStatus{parsed.mResult, parsed.mMessage};
-        outSource = CreatePatternSource(parsed.mSpec);
+        outSource = CreatePatternSource(parsed.mSettings);
         return {};
     }
-    const std::string extension = detail::GetLowerCaseExtension(inSpec);
+    const std::string extension = detail::GetLowerCaseExtension(inMedia);
     if (extension == "png" || extension == "jpg" || extension == "jpeg")
-        return OpenImageFileSource(inSpec, outSource);
+        return OpenImageFileSource(inMedia, outSource);
     if (extension == "y4m")
-        return OpenY4MSource(inSpec, outSource);
+        return OpenY4MSource(inMedia, outSource);
     return OpenStatus{kResult_MediaUnsupported,
-                      inSpec + ": unknown media (expected .png, .jpg, .jpeg, .y4m or pattern:...)"};
+                      inMedia +
+                          ": unknown media (expected .png, .jpg, .jpeg, .y4m or pattern:...)"};
 }
 
 } // namespace BE

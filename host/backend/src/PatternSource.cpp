@@ -1,4 +1,4 @@
-// Generated test pictures (BE/PatternSpec.h).
+// Generated test pictures (BE/PatternSettings.h).
 //
 // Moving pattern geometry for a picture of W x H:
 //   background  grey 48, 48, 48
@@ -12,7 +12,7 @@
 // draws its earlier field at phase 2n and its later field at 2n + 1 (upper
 // first: rows 0, 2, 4 ... earlier; lower first: rows 1, 3, 5 ... earlier), so
 // the box sits at two places, one per field, as a camera would have seen it.
-// Alpha variants give every pixel the spec's opacity; premultiplied variants
+// Alpha variants give every pixel the pattern's opacity; premultiplied variants
 // store round((a * c + (255 - a) * matte) / 255) per colour channel.
 
 #include "BE/MediaStatus.h"
@@ -106,9 +106,9 @@ std::uint8_t Lerp(std::uint8_t inFrom, std::uint8_t inTo, std::uint32_t inX, std
 class PatternSource : public detail::VideoSourceBase
 {
 public:
-    explicit PatternSource(const PatternSpec& inSpec)
-        : VideoSourceBase(Describe(inSpec))
-        , mSpec(inSpec)
+    explicit PatternSource(const PatternSettings& inSettings)
+        : VideoSourceBase(Describe(inSettings))
+        , mSettings(inSettings)
     {
     }
 
@@ -117,13 +117,14 @@ protected:
                              FrameRef& outFrame) override
     {
         FrameRef frame;
-        const QRT::Result created = VF::CreateVideoFrame(
-            inFormat, mSpec.mWidth, mSpec.mHeight, mSpec.mPixelAspectRatio, false, false, frame);
+        const QRT::Result created =
+            VF::CreateVideoFrame(inFormat, mSettings.mWidth, mSettings.mHeight,
+                                 mSettings.mPixelAspectRatio, false, false, frame);
         if (QRT::Failed(created))
             return created;
         auto* base = static_cast<std::uint8_t*>(frame->GetWritableBaseAddress());
         const std::int32_t rowBytes = frame->GetRowBytes();
-        for (std::uint32_t y = 0; y < mSpec.mHeight; ++y)
+        for (std::uint32_t y = 0; y < mSettings.mHeight; ++y)
         {
             std::uint8_t* row = base + std::size_t{y} * rowBytes;
             DrawRow(row, y, inIndex);
@@ -135,35 +136,35 @@ protected:
 
     QRT::InterfaceRef<Deprecated::IMediaInfo> Reopen() const override
     {
-        return CreatePatternSource(mSpec);
+        return CreatePatternSource(mSettings);
     }
 
 private:
-    static detail::SourceDescription Describe(const PatternSpec& inSpec)
+    static detail::SourceDescription Describe(const PatternSettings& inSettings)
     {
         detail::SourceDescription description;
-        description.mMediaPath = inSpec.ToText();
+        description.mMediaPath = inSettings.ToText();
         description.mIdentity = description.mMediaPath;
         description.mName = mvxcore::utility::UTF8to16(description.mMediaPath);
-        description.mWidth = inSpec.mWidth;
-        description.mHeight = inSpec.mHeight;
-        description.mFrameRate = inSpec.mFrameRate;
-        description.mFieldType = inSpec.mFieldType;
-        description.mPixelAspectRatio = inSpec.mPixelAspectRatio;
-        description.mAlpha = inSpec.mAlpha;
-        if (inSpec.mAlpha == mvxmediatypes::kAlphaChannel_Premultiplied)
+        description.mWidth = inSettings.mWidth;
+        description.mHeight = inSettings.mHeight;
+        description.mFrameRate = inSettings.mFrameRate;
+        description.mFieldType = inSettings.mFieldType;
+        description.mPixelAspectRatio = inSettings.mPixelAspectRatio;
+        description.mAlpha = inSettings.mAlpha;
+        if (inSettings.mAlpha == mvxmediatypes::kAlphaChannel_Premultiplied)
         {
-            const Rgb matte = FromRgb24(inSpec.mMatte);
+            const Rgb matte = FromRgb24(inSettings.mMatte);
             // Alpha byte 0, so that a black matte reads as the colour 0.
             description.mMatte =
                 QRT::ParamColor::FromRGBA(matte.mRed, matte.mGreen, matte.mBlue, 0);
         }
-        description.mStill = inSpec.IsTimeInvariant();
+        description.mStill = inSettings.IsTimeInvariant();
         description.mImage = false;
         // Drawing a pattern is cheaper than scheduling a read ahead.
         description.mPrefetchWanted = false;
-        description.mKind = inSpec.IsTimeInvariant() ? Deprecated::kMediaInfoKind_TimeInvariant
-                                                     : Deprecated::kMediaInfoKind_Clip;
+        description.mKind = inSettings.IsTimeInvariant() ? Deprecated::kMediaInfoKind_TimeInvariant
+                                                         : Deprecated::kMediaInfoKind_Clip;
         description.mFrameCount = -1;
         description.mPixelFormats = {mvxmediatypes::kPixelFormat_BGRA_4444_8u};
         description.mColorProfile.mName = "sRGB";
@@ -172,8 +173,8 @@ private:
 
     void DrawRow(std::uint8_t* ioRow, std::uint32_t inY, std::int64_t inIndex) const
     {
-        const std::uint32_t width = mSpec.mWidth;
-        switch (mSpec.mKind)
+        const std::uint32_t width = mSettings.mWidth;
+        switch (mSettings.mKind)
         {
         case PatternKind::kBars:
             for (std::uint32_t bar = 0; bar < kBars.size(); ++bar)
@@ -184,12 +185,12 @@ private:
             }
             break;
         case PatternKind::kSolid:
-            FillSpan(ioRow, 0, width, FromRgb24(mSpec.mColor));
+            FillSpan(ioRow, 0, width, FromRgb24(mSettings.mColor));
             break;
         case PatternKind::kGradient:
         {
-            const Rgb from = FromRgb24(mSpec.mFrom);
-            const Rgb to = FromRgb24(mSpec.mTo);
+            const Rgb from = FromRgb24(mSettings.mFrom);
+            const Rgb to = FromRgb24(mSettings.mTo);
             for (std::uint32_t x = 0; x < width; ++x)
                 PutPixel(ioRow, x,
                          Rgb{Lerp(from.mRed, to.mRed, x, width - 1),
@@ -205,14 +206,14 @@ private:
 
     void DrawMovingRow(std::uint8_t* ioRow, std::uint32_t inY, std::int64_t inIndex) const
     {
-        const std::uint32_t width = mSpec.mWidth;
-        const std::uint32_t height = mSpec.mHeight;
+        const std::uint32_t width = mSettings.mWidth;
+        const std::uint32_t height = mSettings.mHeight;
         // The row's field decides its moment: the earlier field at phase 2n,
         // the later one at 2n + 1.
         std::int64_t phase = inIndex * 2;
         const bool oddRow = (inY & 1) != 0;
-        if ((mSpec.mFieldType == mvxmediatypes::kFieldType_UpperFirst && oddRow) ||
-            (mSpec.mFieldType == mvxmediatypes::kFieldType_LowerFirst && !oddRow))
+        if ((mSettings.mFieldType == mvxmediatypes::kFieldType_UpperFirst && oddRow) ||
+            (mSettings.mFieldType == mvxmediatypes::kFieldType_LowerFirst && !oddRow))
             phase += 1;
 
         FillSpan(ioRow, 0, width, kBackground);
@@ -267,13 +268,13 @@ private:
 
     void ApplyAlpha(std::uint8_t* ioRow) const
     {
-        if (mSpec.mAlpha == mvxmediatypes::kAlphaChannel_None)
+        if (mSettings.mAlpha == mvxmediatypes::kAlphaChannel_None)
             return;
-        const std::uint32_t alpha = mSpec.mOpacity;
-        const Rgb matte = FromRgb24(mSpec.mMatte);
+        const std::uint32_t alpha = mSettings.mOpacity;
+        const Rgb matte = FromRgb24(mSettings.mMatte);
         const std::uint32_t matteBgr[3] = {matte.mBlue, matte.mGreen, matte.mRed};
-        const bool premultiply = mSpec.mAlpha == mvxmediatypes::kAlphaChannel_Premultiplied;
-        for (std::uint32_t x = 0; x < mSpec.mWidth; ++x)
+        const bool premultiply = mSettings.mAlpha == mvxmediatypes::kAlphaChannel_Premultiplied;
+        for (std::uint32_t x = 0; x < mSettings.mWidth; ++x)
         {
             std::uint8_t* pixel = ioRow + std::size_t{x} * 4;
             if (premultiply)
@@ -284,18 +285,18 @@ private:
         }
     }
 
-    const PatternSpec mSpec;
+    const PatternSettings mSettings;
 };
 
 } // namespace
 
-VideoSourceRef CreatePatternSource(const PatternSpec& inSpec)
+VideoSourceRef CreatePatternSource(const PatternSettings& inSettings)
 {
-    MVX_INPUT_CONTRACT(inSpec.mWidth > 0 && inSpec.mWidth <= VF::kMaxFrameDimension);
-    MVX_INPUT_CONTRACT(inSpec.mHeight > 0 && inSpec.mHeight <= VF::kMaxFrameDimension);
-    MVX_INPUT_CONTRACT(!inSpec.mFrameRate.IsZero());
-    MVX_INPUT_CONTRACT(inSpec.mPixelAspectRatio.IsValid());
-    return QRT::Allocated<PatternSource>::Create<Deprecated::IVideoSource>(inSpec);
+    MVX_INPUT_CONTRACT(inSettings.mWidth > 0 && inSettings.mWidth <= VF::kMaxFrameDimension);
+    MVX_INPUT_CONTRACT(inSettings.mHeight > 0 && inSettings.mHeight <= VF::kMaxFrameDimension);
+    MVX_INPUT_CONTRACT(!inSettings.mFrameRate.IsZero());
+    MVX_INPUT_CONTRACT(inSettings.mPixelAspectRatio.IsValid());
+    return QRT::Allocated<PatternSource>::Create<Deprecated::IVideoSource>(inSettings);
 }
 
 } // namespace BE

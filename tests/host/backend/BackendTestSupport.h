@@ -56,10 +56,10 @@ inline FrameRef ReadFrameOrFail(const BE::VideoSourceRef& inSource, TickTime inT
     return frame;
 }
 
-inline BE::VideoSourceRef OpenOrFail(const std::string& inSpec)
+inline BE::VideoSourceRef OpenOrFail(const std::string& inMedia)
 {
     BE::VideoSourceRef source;
-    const BE::OpenStatus status = BE::OpenVideoSource(inSpec, source);
+    const BE::OpenStatus status = BE::OpenVideoSource(inMedia, source);
     EXPECT_TRUE(status.Succeeded()) << status.mMessage;
     EXPECT_TRUE(source);
     return source;

@@ -1,5 +1,5 @@
 #include "BE/MediaStatus.h"
-#include "BE/PatternSpec.h"
+#include "BE/PatternSettings.h"
 #include "BackendTestSupport.h"
 #include "ContractExpect.h"
 #include "VF/VideoFrame.h"
@@ -184,7 +184,7 @@ TEST_F(PatternSourceTest, RequestedSizeAndAspectAreHonoured)
     EXPECT_EQ(frame->GetPixelAspectRatio(), mvxmediatypes::PixelAspectRatio(10, 11));
 }
 
-TEST_F(PatternSourceTest, DescriptionFollowsTheSpec)
+TEST_F(PatternSourceTest, DescriptionFollowsThePattern)
 {
     const BE::VideoSourceRef moving =
         OpenOrFail("pattern:moving?size=720x486&rate=29.97&field=lower&par=10:11");
@@ -240,8 +240,8 @@ TEST_F(PatternSourceTest, PrefetchHoldKeepsEveryFrameReadWhileItLasts)
 
 TEST_F(PatternSourceTest, FrameKeysAreStableAndTellFramesApart)
 {
-    const std::string spec = "pattern:moving?size=32x16";
-    const BE::VideoSourceRef first = OpenOrFail(spec);
+    const std::string media = "pattern:moving?size=32x16";
+    const BE::VideoSourceRef first = OpenOrFail(media);
     const BE::VideoSourceRef second = OpenOrFail("pattern:moving?rate=25&size=32x16");
     const BE::VideoFrameRequest request;
     const MF::BinaryData none;
@@ -303,7 +303,8 @@ TEST_F(PatternSourceTest, MediaInterfacesReachTheSameObject)
     EXPECT_EQ(info->GetVideoSource(BE::Deprecated::kMediaType_Video, 0), source);
     EXPECT_EQ(info->GetStreamCount(BE::Deprecated::kMediaType_Video), 1u);
     EXPECT_EQ(info->GetStreamCount(BE::Deprecated::kMediaType_Audio), 0u);
-    EXPECT_EQ(media->GetMediaPath(), BE::ParsePatternSpec("pattern:bars?size=8x8").mSpec.ToText());
+    EXPECT_EQ(media->GetMediaPath(),
+              BE::ParsePatternSettings("pattern:bars?size=8x8").mSettings.ToText());
     vrtest::ExpectInputContract([&] { info->GetVideoSource(BE::Deprecated::kMediaType_Audio, 0); },
                                 "inType == Deprecated::kMediaType_Video");
     vrtest::ExpectInputContract([&] { info->GetVideoSource(BE::Deprecated::kMediaType_Video, 1); },
@@ -316,83 +317,82 @@ TEST_F(PatternSourceTest, MediaInterfacesReachTheSameObject)
               source->GetFrameKey(TickTime(), {}, {}, {}));
 }
 
-class PatternSpecTest : public ::testing::Test
+class PatternSettingsTest : public ::testing::Test
 {
 protected:
     static std::string Problem(const std::string& inText)
     {
-        const BE::PatternParseResult result = BE::ParsePatternSpec(inText);
-        EXPECT_EQ(result.mResult, BE::kResult_BadPatternSpec) << inText;
+        const BE::PatternParseResult result = BE::ParsePatternSettings(inText);
+        EXPECT_EQ(result.mResult, BE::kResult_BadPattern) << inText;
         return result.mMessage;
     }
 };
 
-TEST_F(PatternSpecTest, DefaultsAndCanonicalText)
+TEST_F(PatternSettingsTest, DefaultsAndCanonicalText)
 {
-    const BE::PatternParseResult bars = BE::ParsePatternSpec("pattern:bars");
+    const BE::PatternParseResult bars = BE::ParsePatternSettings("pattern:bars");
     ASSERT_TRUE(bars.Succeeded());
-    EXPECT_EQ(bars.mSpec.ToText(),
+    EXPECT_EQ(bars.mSettings.ToText(),
               "pattern:bars?size=1920x1080&rate=705600000/28224000&field=progressive&par=1:1"
               "&alpha=none");
-    EXPECT_EQ(BE::ParsePatternSpec(bars.mSpec.ToText()).mSpec, bars.mSpec);
-    const BE::PatternParseResult full = BE::ParsePatternSpec(
+    EXPECT_EQ(BE::ParsePatternSettings(bars.mSettings.ToText()).mSettings, bars.mSettings);
+    const BE::PatternParseResult full = BE::ParsePatternSettings(
         "pattern:moving?size=1920x1080&rate=25&field=upper&par=10:11&alpha=straight");
     ASSERT_TRUE(full.Succeeded()) << full.mMessage;
-    EXPECT_EQ(full.mSpec.mFieldType, mvxmediatypes::kFieldType_UpperFirst);
-    EXPECT_EQ(full.mSpec.mPixelAspectRatio, mvxmediatypes::PixelAspectRatio(10, 11));
-    EXPECT_EQ(full.mSpec.mAlpha, mvxmediatypes::kAlphaChannel_Straight);
-    EXPECT_EQ(BE::ParsePatternSpec("pattern:bars?rate=30000/1001").mSpec.mFrameRate,
+    EXPECT_EQ(full.mSettings.mFieldType, mvxmediatypes::kFieldType_UpperFirst);
+    EXPECT_EQ(full.mSettings.mPixelAspectRatio, mvxmediatypes::PixelAspectRatio(10, 11));
+    EXPECT_EQ(full.mSettings.mAlpha, mvxmediatypes::kAlphaChannel_Straight);
+    EXPECT_EQ(BE::ParsePatternSettings("pattern:bars?rate=30000/1001").mSettings.mFrameRate,
               mvxmediatypes::kFrameRate_Video2997);
-    EXPECT_EQ(BE::ParsePatternSpec("pattern:bars?rate=59.94").mSpec.mFrameRate,
+    EXPECT_EQ(BE::ParsePatternSettings("pattern:bars?rate=59.94").mSettings.mFrameRate,
               mvxmediatypes::kFrameRate_Video5994);
 }
 
-TEST_F(PatternSpecTest, BadSpecsNameTheirProblem)
+TEST_F(PatternSettingsTest, BadPatternsNameTheirProblem)
 {
     EXPECT_EQ(Problem("pattern:stripes"),
-              "pattern spec 'pattern:stripes': unknown pattern 'stripes' (expected bars, solid, "
+              "pattern 'pattern:stripes': unknown pattern 'stripes' (expected bars, solid, "
               "gradient or moving)");
     EXPECT_EQ(Problem("pattern:bars?size=0x10"),
-              "pattern spec 'pattern:bars?size=0x10': size '0x10' is not WxH with 1..32768 each");
+              "pattern 'pattern:bars?size=0x10': size '0x10' is not WxH with 1..32768 each");
     EXPECT_EQ(Problem("pattern:bars?size=40000x10"),
-              "pattern spec 'pattern:bars?size=40000x10': size '40000x10' is not WxH with "
+              "pattern 'pattern:bars?size=40000x10': size '40000x10' is not WxH with "
               "1..32768 each");
     EXPECT_EQ(Problem("pattern:bars?rate=0"),
-              "pattern spec 'pattern:bars?rate=0': rate '0' is not a frame rate between 1/1000 "
+              "pattern 'pattern:bars?rate=0': rate '0' is not a frame rate between 1/1000 "
               "and 1000");
     EXPECT_EQ(Problem("pattern:bars?field=top"),
-              "pattern spec 'pattern:bars?field=top': field 'top' is not progressive, upper or "
+              "pattern 'pattern:bars?field=top': field 'top' is not progressive, upper or "
               "lower");
     EXPECT_EQ(Problem("pattern:bars?par=1:0"),
-              "pattern spec 'pattern:bars?par=1:0': par '1:0' is not N:D with positive terms");
+              "pattern 'pattern:bars?par=1:0': par '1:0' is not N:D with positive terms");
     EXPECT_EQ(Problem("pattern:bars?color=FF0000"),
-              "pattern spec 'pattern:bars?color=FF0000': color applies to solid patterns only");
+              "pattern 'pattern:bars?color=FF0000': color applies to solid patterns only");
     EXPECT_EQ(Problem("pattern:solid?color=red"),
-              "pattern spec 'pattern:solid?color=red': color 'red' is not RRGGBB");
+              "pattern 'pattern:solid?color=red': color 'red' is not RRGGBB");
     EXPECT_EQ(Problem("pattern:bars?size=8x8&size=9x9"),
-              "pattern spec 'pattern:bars?size=8x8&size=9x9': parameter 'size' given twice");
+              "pattern 'pattern:bars?size=8x8&size=9x9': parameter 'size' given twice");
     EXPECT_EQ(Problem("pattern:bars?speed=2"),
-              "pattern spec 'pattern:bars?speed=2': unknown parameter 'speed'");
+              "pattern 'pattern:bars?speed=2': unknown parameter 'speed'");
     EXPECT_EQ(Problem("pattern:bars?opacity=9"),
-              "pattern spec 'pattern:bars?opacity=9': opacity needs alpha=straight or "
+              "pattern 'pattern:bars?opacity=9': opacity needs alpha=straight or "
               "alpha=premultiplied");
     EXPECT_EQ(Problem("pattern:bars?alpha=straight&opacity=256"),
-              "pattern spec 'pattern:bars?alpha=straight&opacity=256': opacity '256' is not "
+              "pattern 'pattern:bars?alpha=straight&opacity=256': opacity '256' is not "
               "0..255");
-    EXPECT_EQ(Problem("pattern:bars?"),
-              "pattern spec 'pattern:bars?': empty parameter list after '?'");
+    EXPECT_EQ(Problem("pattern:bars?"), "pattern 'pattern:bars?': empty parameter list after '?'");
     EXPECT_EQ(Problem("pattern:bars?size=8x8&"),
-              "pattern spec 'pattern:bars?size=8x8&': empty parameter after '&'");
+              "pattern 'pattern:bars?size=8x8&': empty parameter after '&'");
     EXPECT_EQ(Problem("pattern:bars?size"),
-              "pattern spec 'pattern:bars?size': parameter 'size' is not key=value");
+              "pattern 'pattern:bars?size': parameter 'size' is not key=value");
 }
 
-TEST_F(PatternSpecTest, OpenVideoSourceReportsBadSpecsAndUnknownMedia)
+TEST_F(PatternSettingsTest, OpenVideoSourceReportsBadPatternsAndUnknownMedia)
 {
     BE::VideoSourceRef source;
     BE::OpenStatus status = BE::OpenVideoSource("pattern:waves", source);
-    EXPECT_EQ(status.mResult, BE::kResult_BadPatternSpec);
-    EXPECT_EQ(status.mMessage, "pattern spec 'pattern:waves': unknown pattern 'waves' (expected "
+    EXPECT_EQ(status.mResult, BE::kResult_BadPattern);
+    EXPECT_EQ(status.mMessage, "pattern 'pattern:waves': unknown pattern 'waves' (expected "
                                "bars, solid, gradient or moving)");
     EXPECT_FALSE(source);
     status = BE::OpenVideoSource("/tmp/clip.mov", source);

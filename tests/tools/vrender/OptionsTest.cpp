@@ -195,7 +195,7 @@ TEST_F(OptionsTest, BadFormatsListTheRenderableOnes)
 TEST_F(OptionsTest, StructuralMistakes)
 {
     EXPECT_EQ(Parse({"source"}).mError, "source: no media given (an image file, a .y4m file or a "
-                                        "pattern: spec such as pattern:bars)");
+                                        "pattern: text such as pattern:bars)");
     EXPECT_EQ(SourceError({"other"}), "unexpected argument 'other'");
     EXPECT_EQ(SourceError({"--size"}), "--size needs a value");
     EXPECT_EQ(SourceError({"--bogus"}), "unknown option '--bogus' (see vrender --help)");

@@ -78,10 +78,10 @@ inline ::testing::AssertionResult AllPixelsAre(const FrameRef& inFrame,
     return ::testing::AssertionSuccess();
 }
 
-inline BE::VideoSourceRef OpenPattern(const std::string& inSpec)
+inline BE::VideoSourceRef OpenPattern(const std::string& inMedia)
 {
     BE::VideoSourceRef source;
-    const BE::OpenStatus status = BE::OpenVideoSource(inSpec, source);
+    const BE::OpenStatus status = BE::OpenVideoSource(inMedia, source);
     EXPECT_TRUE(status.Succeeded()) << status.mMessage;
     return source;
 }

@@ -47,7 +47,7 @@ public:
 
     // A MediaInfoKind value.
     virtual std::int32_t GetKind() const noexcept = 0;
-    // The media's name (its file name, or its pattern spec).
+    // The media's name (its file name, or its pattern text).
     virtual std::u16string GetName() const = 0;
     // The number of streams of a type (1 video stream, 0 audio streams for
     // the sources of this library). inType is a MediaType (input contract
@@ -74,7 +74,7 @@ class IMedia : public QRT::QRTUnknown
 public:
     QRT_INTERFACE_ID("{d85027bf-c106-4884-9a94-9f228894d1a9}");
 
-    // What the media was opened from: a file path or a "pattern:" spec.
+    // What the media was opened from: a file path or a "pattern:" text.
     virtual std::string GetMediaPath() const = 0;
     virtual QRT::InterfaceRef<IMediaInfo> GetMediaInfo() = 0;
 

@@ -5,13 +5,13 @@
 // synchronous decode latency, and the same behind the asynchronous-read
 // interface on a worker thread of its own) for prefetch tests and benchmarks.
 //
-// Every function answers a status with a message ("<path or spec>: <problem>")
+// Every function answers a status with a message ("<path or pattern>: <problem>")
 // and, on success, the source; on failure the output is empty. Every function
 // may be called from any thread.
 
 #include "BE/IMediaInfo.h"
 #include "BE/IVideoSource.h"
-#include "BE/PatternSpec.h"
+#include "BE/PatternSettings.h"
 #include "QRT/InterfaceRef.h"
 #include "QRT/Result.h"
 
@@ -32,10 +32,10 @@ struct OpenStatus
 using VideoSourceRef = QRT::InterfaceRef<Deprecated::IVideoSource>;
 
 // Opens a file by its extension (.png, .jpg, .jpeg, .y4m, any case) or a
-// "pattern:" spec (BE/PatternSpec.h). Statuses: kResult_MediaCannotOpen,
+// "pattern:" text (BE/PatternSettings.h). Statuses: kResult_MediaCannotOpen,
 // kResult_MediaMalformed, kResult_MediaUnsupported (also for an unknown
-// extension), kResult_BadPatternSpec.
-OpenStatus OpenVideoSource(const std::string& inSpec, VideoSourceRef& outSource);
+// extension), kResult_BadPattern.
+OpenStatus OpenVideoSource(const std::string& inMedia, VideoSourceRef& outSource);
 
 // A still image. The file's header is read now (size, validity); the pixels
 // are decoded on the first frame request and then held. PNG files deliver
@@ -51,7 +51,7 @@ OpenStatus OpenImageFileSource(const std::string& inPath, VideoSourceRef& outSou
 OpenStatus OpenY4MSource(const std::string& inPath, VideoSourceRef& outSource);
 
 // A generated pattern.
-VideoSourceRef CreatePatternSource(const PatternSpec& inSpec);
+VideoSourceRef CreatePatternSource(const PatternSettings& inMedia);
 
 // Wraps inSource: a frame that is not yet held by inSource costs inLatency
 // of sleep before it is read; held frames and kFrameRequestFlag_NoBlock

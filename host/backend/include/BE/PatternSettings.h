@@ -1,6 +1,6 @@
 #pragma once
 
-// BE::PatternSpec: the description of a generated test picture, and its text
+// BE::PatternSettings: the description of a generated test picture, and its text
 // form.
 //
 // Syntax:   pattern:KIND[?KEY=VALUE[&KEY=VALUE]...]
@@ -32,7 +32,7 @@
 // Keys may come in any order, each at most once; hexadecimal digits in either
 // case. Bars, solid and gradient are time-invariant (media kind 1); moving
 // varies with time. The canonical text (ToText) spells every key, so two
-// specs that mean the same picture have the same canonical text.
+// texts that mean the same picture have the same canonical text.
 
 #include "QRT/Param.h"
 #include "QRT/Result.h"
@@ -55,7 +55,7 @@ enum class PatternKind
     kMoving,
 };
 
-struct PatternSpec
+struct PatternSettings
 {
     PatternKind mKind = PatternKind::kBars;
     std::uint32_t mWidth = 1920;
@@ -76,21 +76,21 @@ struct PatternSpec
     // The canonical "pattern:..." text.
     std::string ToText() const;
 
-    friend bool operator==(const PatternSpec&, const PatternSpec&) = default;
+    friend bool operator==(const PatternSettings&, const PatternSettings&) = default;
 };
 
 struct PatternParseResult
 {
     QRT::Result mResult = QRT::kResult_Success;
-    // Empty on success; otherwise "pattern spec '<text>': <problem>".
+    // Empty on success; otherwise "pattern '<text>': <problem>".
     std::string mMessage;
-    PatternSpec mSpec;
+    PatternSettings mSettings;
 
     bool Succeeded() const { return QRT::Succeeded(mResult); }
 };
 
-// Parses a "pattern:" spec. Failures answer kResult_BadPatternSpec with a
-// message naming the spec and the offending part.
-PatternParseResult ParsePatternSpec(std::string_view inText);
+// Parses a "pattern:" text. Failures answer kResult_BadPattern with a
+// message naming the text and what is wrong in it.
+PatternParseResult ParsePatternSettings(std::string_view inText);
 
 } // namespace BE

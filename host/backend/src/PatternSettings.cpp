@@ -1,4 +1,4 @@
-#include "BE/PatternSpec.h"
+#include "BE/PatternSettings.h"
 
 #include "BE/MediaStatus.h"
 #include "VF/VideoFrame.h"
@@ -130,14 +130,14 @@ std::string RateText(const FrameRate& inRate)
 PatternParseResult Fail(std::string_view inText, const std::string& inProblem)
 {
     PatternParseResult result;
-    result.mResult = kResult_BadPatternSpec;
-    result.mMessage = "pattern spec '" + std::string(inText) + "': " + inProblem;
+    result.mResult = kResult_BadPattern;
+    result.mMessage = "pattern '" + std::string(inText) + "': " + inProblem;
     return result;
 }
 
 } // namespace
 
-std::string PatternSpec::ToText() const
+std::string PatternSettings::ToText() const
 {
     std::string text(kPrefix);
     for (const KindName& name : kKindNames)
@@ -167,7 +167,7 @@ std::string PatternSpec::ToText() const
     return text;
 }
 
-PatternParseResult ParsePatternSpec(std::string_view inText)
+PatternParseResult ParsePatternSettings(std::string_view inText)
 {
     if (inText.substr(0, kPrefix.size()) != kPrefix)
         return Fail(inText, "does not start with \"pattern:\"");
@@ -175,13 +175,13 @@ PatternParseResult ParsePatternSpec(std::string_view inText)
     const size_t question = body.find('?');
     const std::string_view kindText = body.substr(0, question);
 
-    PatternSpec spec;
+    PatternSettings settings;
     bool knownKind = false;
     for (const KindName& name : kKindNames)
     {
         if (kindText == name.mName)
         {
-            spec.mKind = name.mKind;
+            settings.mKind = name.mKind;
             knownKind = true;
         }
     }
@@ -219,23 +219,23 @@ PatternParseResult ParsePatternSpec(std::string_view inText)
             if (!ParsePair(value, 'x', first, second) || first == 0 || second == 0 ||
                 first > VF::kMaxFrameDimension || second > VF::kMaxFrameDimension)
                 return Fail(inText, "size '" + valueText + "' is not WxH with 1..32768 each");
-            spec.mWidth = static_cast<std::uint32_t>(first);
-            spec.mHeight = static_cast<std::uint32_t>(second);
+            settings.mWidth = static_cast<std::uint32_t>(first);
+            settings.mHeight = static_cast<std::uint32_t>(second);
         }
         else if (key == "rate")
         {
-            if (!ParseRate(value, spec.mFrameRate))
+            if (!ParseRate(value, settings.mFrameRate))
                 return Fail(inText,
                             "rate '" + valueText + "' is not a frame rate between 1/1000 and 1000");
         }
         else if (key == "field")
         {
             if (value == "progressive")
-                spec.mFieldType = mvxmediatypes::kFieldType_Progressive;
+                settings.mFieldType = mvxmediatypes::kFieldType_Progressive;
             else if (value == "upper")
-                spec.mFieldType = mvxmediatypes::kFieldType_UpperFirst;
+                settings.mFieldType = mvxmediatypes::kFieldType_UpperFirst;
             else if (value == "lower")
-                spec.mFieldType = mvxmediatypes::kFieldType_LowerFirst;
+                settings.mFieldType = mvxmediatypes::kFieldType_LowerFirst;
             else
                 return Fail(inText, "field '" + valueText + "' is not progressive, upper or lower");
         }
@@ -244,17 +244,17 @@ PatternParseResult ParsePatternSpec(std::string_view inText)
             if (!ParsePair(value, ':', first, second) || first == 0 || second == 0 ||
                 first > UINT32_MAX || second > UINT32_MAX)
                 return Fail(inText, "par '" + valueText + "' is not N:D with positive terms");
-            spec.mPixelAspectRatio = mvxmediatypes::PixelAspectRatio(
+            settings.mPixelAspectRatio = mvxmediatypes::PixelAspectRatio(
                 static_cast<std::uint32_t>(first), static_cast<std::uint32_t>(second));
         }
         else if (key == "alpha")
         {
             if (value == "none")
-                spec.mAlpha = mvxmediatypes::kAlphaChannel_None;
+                settings.mAlpha = mvxmediatypes::kAlphaChannel_None;
             else if (value == "straight")
-                spec.mAlpha = mvxmediatypes::kAlphaChannel_Straight;
+                settings.mAlpha = mvxmediatypes::kAlphaChannel_Straight;
             else if (value == "premultiplied")
-                spec.mAlpha = mvxmediatypes::kAlphaChannel_Premultiplied;
+                settings.mAlpha = mvxmediatypes::kAlphaChannel_Premultiplied;
             else
                 return Fail(inText,
                             "alpha '" + valueText + "' is not none, straight or premultiplied");
@@ -263,34 +263,34 @@ PatternParseResult ParsePatternSpec(std::string_view inText)
         {
             if (!ParseUnsigned(value, first) || first > 255)
                 return Fail(inText, "opacity '" + valueText + "' is not 0..255");
-            spec.mOpacity = static_cast<std::uint8_t>(first);
+            settings.mOpacity = static_cast<std::uint8_t>(first);
         }
         else if (key == "matte" || key == "color" || key == "from" || key == "to")
         {
-            if (key == "color" && spec.mKind != PatternKind::kSolid)
+            if (key == "color" && settings.mKind != PatternKind::kSolid)
                 return Fail(inText, "color applies to solid patterns only");
-            if ((key == "from" || key == "to") && spec.mKind != PatternKind::kGradient)
+            if ((key == "from" || key == "to") && settings.mKind != PatternKind::kGradient)
                 return Fail(inText, keyText + " applies to gradient patterns only");
             std::uint32_t color = 0;
             if (!ParseColor(value, color))
                 return Fail(inText, keyText + " '" + valueText + "' is not RRGGBB");
-            (key == "matte"   ? spec.mMatte
-             : key == "color" ? spec.mColor
-             : key == "from"  ? spec.mFrom
-                              : spec.mTo) = color;
+            (key == "matte"   ? settings.mMatte
+             : key == "color" ? settings.mColor
+             : key == "from"  ? settings.mFrom
+                              : settings.mTo) = color;
         }
         else
         {
             return Fail(inText, "unknown parameter '" + keyText + "'");
         }
     }
-    if (seen.contains("opacity") && spec.mAlpha == mvxmediatypes::kAlphaChannel_None)
+    if (seen.contains("opacity") && settings.mAlpha == mvxmediatypes::kAlphaChannel_None)
         return Fail(inText, "opacity needs alpha=straight or alpha=premultiplied");
-    if (seen.contains("matte") && spec.mAlpha != mvxmediatypes::kAlphaChannel_Premultiplied)
+    if (seen.contains("matte") && settings.mAlpha != mvxmediatypes::kAlphaChannel_Premultiplied)
         return Fail(inText, "matte needs alpha=premultiplied");
 
     PatternParseResult result;
-    result.mSpec = spec;
+    result.mSettings = settings;
     return result;
 }
 
