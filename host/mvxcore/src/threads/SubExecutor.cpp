@@ -1,5 +1,6 @@
 #include "mvxcore/debug/Contract.h"
 #include "mvxcore/threads/ExecutorFactories.h"
+#include "threads/CoreExecutor.h"
 #include "threads/RunningTasks.h"
 
 #include <atomic>
@@ -252,42 +253,6 @@ void ParentTask::operator()() const
         ticket->core->RunNext();
 }
 
-// The sub-executor as callers hold it. Dropping the last reference shuts it
-// down; the parent lives on as long as others hold it or tickets of this
-// executor are still queued there.
-class SubExecutor final : public AsyncThreadedExecutor
-{
-public:
-    SubExecutor(boost::shared_ptr<AsyncThreadedExecutor> inParent, unsigned inMaxConcurrency)
-        : mCore(std::make_shared<SubCore>(std::move(inParent), inMaxConcurrency))
-    {
-    }
-
-    ~SubExecutor() override
-    {
-        mCore->BeginShutdown();
-        mCore->DiscardPendingTasks();
-        mCore->WaitForRunningTasks();
-    }
-
-    bool Post(Task inTask, int inScheduling) override
-    {
-        return mCore->Post(std::move(inTask), inScheduling);
-    }
-    bool IsCurrentThreadOrShutDown() const override
-    {
-        return mCore->IsShutDown() || mCore->IsCurrentThread();
-    }
-    bool IsCurrentThread() const override { return mCore->IsCurrentThread(); }
-    bool IsShutDown() const override { return mCore->IsShutDown(); }
-    void BeginShutdown() override { mCore->BeginShutdown(); }
-    void DiscardPendingTasks() override { mCore->DiscardPendingTasks(); }
-    void WaitForRunningTasks() override { mCore->WaitForRunningTasks(); }
-
-private:
-    const std::shared_ptr<SubCore> mCore;
-};
-
 } // namespace
 
 boost::shared_ptr<AsyncThreadedExecutor>
@@ -295,7 +260,10 @@ CreateSubExecutor(boost::shared_ptr<AsyncThreadedExecutor> inParent, unsigned in
 {
     MVX_INPUT_CONTRACT(inParent != nullptr);
     MVX_INPUT_CONTRACT(inMaxConcurrency > 0);
-    return boost::make_shared<SubExecutor>(std::move(inParent), inMaxConcurrency);
+    // The last reference shuts it down; the parent lives on as long as others
+    // hold it or tickets of this executor are still queued there.
+    return boost::make_shared<CoreExecutor<SubCore>>(
+        std::make_shared<SubCore>(std::move(inParent), inMaxConcurrency));
 }
 
 } // namespace mvxcore::threads

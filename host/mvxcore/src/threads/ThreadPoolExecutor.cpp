@@ -1,5 +1,6 @@
 #include "mvxcore/debug/Contract.h"
 #include "mvxcore/threads/ExecutorFactories.h"
+#include "threads/CoreExecutor.h"
 #include "threads/RunningTasks.h"
 
 #include <algorithm>
@@ -258,41 +259,12 @@ private:
     bool mStopping = false;
 };
 
-// The pool as callers hold it. Dropping the last reference shuts the pool
-// down and ends its workers.
-class ThreadPoolExecutor final : public AsyncThreadedExecutor
+// The pool as callers hold it: the last reference shuts it down and ends its
+// workers.
+boost::shared_ptr<AsyncThreadedExecutor> MakePool(unsigned inThreadCount)
 {
-public:
-    explicit ThreadPoolExecutor(unsigned inThreadCount)
-        : mCore(std::make_shared<PoolCore>(inThreadCount))
-    {
-    }
-
-    ~ThreadPoolExecutor() override
-    {
-        mCore->BeginShutdown();
-        mCore->DiscardPendingTasks();
-        mCore->WaitForRunningTasks();
-        mCore->StopWorkers();
-    }
-
-    bool Post(Task inTask, int inScheduling) override
-    {
-        return mCore->Post(std::move(inTask), inScheduling);
-    }
-    bool IsCurrentThreadOrShutDown() const override
-    {
-        return mCore->IsShutDown() || mCore->IsCurrentThread();
-    }
-    bool IsCurrentThread() const override { return mCore->IsCurrentThread(); }
-    bool IsShutDown() const override { return mCore->IsShutDown(); }
-    void BeginShutdown() override { mCore->BeginShutdown(); }
-    void DiscardPendingTasks() override { mCore->DiscardPendingTasks(); }
-    void WaitForRunningTasks() override { mCore->WaitForRunningTasks(); }
-
-private:
-    const std::shared_ptr<PoolCore> mCore;
-};
+    return boost::make_shared<CoreExecutor<PoolCore>>(std::make_shared<PoolCore>(inThreadCount));
+}
 
 } // namespace
 
@@ -303,13 +275,13 @@ unsigned GetCPUCoreCount()
 
 boost::shared_ptr<AsyncThreadedExecutor> CreateCPUBoundExecutor()
 {
-    return boost::make_shared<ThreadPoolExecutor>(GetCPUCoreCount());
+    return MakePool(GetCPUCoreCount());
 }
 
 boost::shared_ptr<AsyncThreadedExecutor> CreateThreadPoolExecutor(unsigned inThreadCount)
 {
     MVX_INPUT_CONTRACT(inThreadCount > 0);
-    return boost::make_shared<ThreadPoolExecutor>(inThreadCount);
+    return MakePool(inThreadCount);
 }
 
 } // namespace mvxcore::threads
