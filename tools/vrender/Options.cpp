@@ -22,7 +22,12 @@ constexpr std::int64_t kDemoFrameCount = 50;
 
 std::string Quoted(std::string_view inText)
 {
-    return "'" + std::string(inText) + "'";
+    std::string quoted;
+    quoted.reserve(inText.size() + 2);
+    quoted.push_back('\'');
+    quoted.append(inText);
+    quoted.push_back('\'');
+    return quoted;
 }
 
 bool EndsWithNoCase(std::string_view inText, std::string_view inSuffix)

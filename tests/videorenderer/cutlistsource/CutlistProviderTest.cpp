@@ -38,7 +38,7 @@ protected:
     QRT::InterfaceRef<BE::ICutlistProvider> mProvider =
         BE::CreateCutlistProvider(Settings(720, 576));
     const QRT::ImmutableString mSequence = QRT::ImmutableString::CreateStatic("Sequence 01");
-    const QRT::ImmutableString mDefault;
+    const QRT::ImmutableString mDefault{};
 };
 
 TEST_F(CutlistProviderTest, PropertiesAnswerTheSettingsThroughTheirInterface)

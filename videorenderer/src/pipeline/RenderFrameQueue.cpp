@@ -679,8 +679,8 @@ private:
         DeliveryBatch batch;
         for (const QueueEntry& entry : cancelled)
             batch.Run([&entry] { DeliverCancellation(entry.mRequest); });
-        for (const auto& [entry, status] : failed)
-            batch.Run([&entry, status] { Finish(entry.mRequest, {}, status, 0); });
+        for (const auto& failure : failed)
+            batch.Run([&failure] { Finish(failure.first.mRequest, {}, failure.second, 0); });
         for (const QueueEntry& entry : dropped)
             WakeWaiter(entry.mRequest);
         batch.Run([this] { ProcessPrefetchRequests(false); });
