@@ -3,7 +3,7 @@
 JOBS ?= $(shell nproc)
 CMAKE_GEN := -G Ninja
 
-.PHONY: all deps build test asan tsan bench demo format format-check clean
+.PHONY: all deps build test asan tsan coverage release clang bench demo format format-check clean
 
 all: build
 
@@ -16,9 +16,10 @@ build/build.ninja: CMakeLists.txt | deps
 build: deps build/build.ninja
 	cmake --build build -j $(JOBS)
 
-# Build and run every test suite.
+# Build the test suites (and the vrender binary their end-to-end cases run),
+# not the benchmarks, and run them.
 test: deps build/build.ninja
-	cmake --build build -j $(JOBS)
+	cmake --build build -j $(JOBS) --target all_tests vrender
 	ctest --test-dir build --output-on-failure -j $(JOBS)
 
 # AddressSanitizer and UndefinedBehaviorSanitizer over the whole suite.
@@ -35,12 +36,38 @@ tsan: deps
 	TSAN_OPTIONS=halt_on_error=1:second_deadlock_stack=1 scripts/no-aslr \
 	  ctest --test-dir build-tsan --output-on-failure -L threaded
 
+# Line and branch coverage of host/, videorenderer/ and tools/ over the whole
+# suite; the report is build-coverage/coverage/index.html.
+COVERAGE_FILTERS := --filter '$(CURDIR)/host/' --filter '$(CURDIR)/videorenderer/' --filter '$(CURDIR)/tools/'
+coverage:
+	@scripts/install-deps coverage
+	cmake -S . -B build-coverage $(CMAKE_GEN) -DCMAKE_BUILD_TYPE=Debug -DVR_COVERAGE=ON -DVR_BUILD_BENCH=OFF
+	cmake --build build-coverage -j $(JOBS) --target all_tests vrender
+	find build-coverage -name '*.gcda' -delete
+	ctest --test-dir build-coverage --output-on-failure -j $(JOBS)
+	mkdir -p build-coverage/coverage
+	gcovr -r $(CURDIR) build-coverage $(COVERAGE_FILTERS) -j $(JOBS) \
+	  --exclude-unreachable-branches --exclude-throw-branches \
+	  --html-details build-coverage/coverage/index.html --print-summary
+
+# Warning-free builds in the other configurations users build: Release with
+# GCC, and everything once with Clang; each runs the suite.
+release: deps
+	cmake -S . -B build-release $(CMAKE_GEN) -DCMAKE_BUILD_TYPE=Release
+	cmake --build build-release -j $(JOBS)
+	ctest --test-dir build-release --output-on-failure -j $(JOBS)
+
+clang: deps
+	CC=clang-14 CXX=clang++-14 cmake -S . -B build-clang $(CMAKE_GEN)
+	cmake --build build-clang -j $(JOBS)
+	ctest --test-dir build-clang --output-on-failure -j $(JOBS)
+
 # Build the command-line renderer and run its built-in demo (frames in out/demo/).
 demo: deps build/build.ninja
 	cmake --build build -j $(JOBS) --target vrender
 	build/bin/vrender
 
-# Build the benchmarks in the optimised tree and run them all.
+# Build the benchmark programs (in the default RelWithDebInfo tree) and run them all.
 bench: deps build/build.ninja
 	cmake --build build -j $(JOBS)
 	scripts/run-benchmarks build
@@ -52,4 +79,4 @@ format-check:
 	git ls-files '*.h' '*.cpp' | xargs clang-format --dry-run --Werror
 
 clean:
-	rm -rf build build-asan build-tsan
+	rm -rf build build-asan build-tsan build-coverage build-release build-clang

@@ -8,6 +8,11 @@ endif()
 
 add_compile_options(-Wall -Wextra -Werror)
 
+if(VR_COVERAGE)
+    add_compile_options(--coverage)
+    add_link_options(--coverage)
+endif()
+
 if(VR_SANITIZE)
     list(JOIN VR_SANITIZE "," _vr_san)
     add_compile_options(-fsanitize=${_vr_san} -fno-omit-frame-pointer -fno-sanitize-recover=all)
