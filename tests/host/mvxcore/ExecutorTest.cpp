@@ -1,3 +1,4 @@
+#include "ContractExpect.h"
 #include "ExecutorTestSupport.h"
 #include "mvxcore/config/Error.h"
 #include "mvxcore/debug/Contract.h"
@@ -5,7 +6,6 @@
 
 #include <atomic>
 #include <chrono>
-#include <functional>
 #include <mutex>
 #include <numeric>
 #include <stdexcept>
@@ -330,28 +330,6 @@ TEST_P(ExecutorTest, ShutdownRefusesNewTasksStartsNoQueuedOneAndDiscardReleasesT
     ExpectParentStillRuns();
 }
 
-TEST_P(ExecutorTest, WaitForRunningTasksReturnsOnlyAfterTheRunningTaskEnds)
-{
-    const ExecutorRef executor = Make(1);
-    CountingSignal started;
-    std::atomic<bool> finished{false};
-    executor->Post(
-        [&]
-        {
-            started.Notify();
-            mGate.WaitFor();
-            std::this_thread::sleep_for(std::chrono::milliseconds(5));
-            finished = true;
-        });
-    ASSERT_TRUE(started.WaitFor());
-    executor->BeginShutdown();
-    executor->DiscardPendingTasks();
-    std::thread opener([&] { mGate.Notify(); });
-    executor->WaitForRunningTasks();
-    EXPECT_TRUE(finished.load());
-    opener.join();
-}
-
 TEST_P(ExecutorTest, WaitForRunningTasksFromItsOwnTaskWaitsForTheOthersOnly)
 {
     const ExecutorRef executor = Make(2);
@@ -468,25 +446,8 @@ TEST_P(ExecutorTest, DroppingTheLastReferenceDiscardsPendingTasksAndWaitsForTheR
 TEST_P(ExecutorTest, BadTasksAreInputContractErrors)
 {
     const ExecutorRef executor = Make(1);
-    try
-    {
-        executor->Post(Task());
-        FAIL() << "an empty task was accepted";
-    }
-    catch (const mvxcore::config::Error& inError)
-    {
-        EXPECT_EQ(inError.GetExpression(), "!inTask.empty()");
-        EXPECT_EQ(inError.GetMinor(), 25);
-    }
-    try
-    {
-        executor->Post([] {}, -1);
-        FAIL() << "a negative delay was accepted";
-    }
-    catch (const mvxcore::config::Error& inError)
-    {
-        EXPECT_EQ(inError.GetExpression(), "inScheduling >= 0");
-    }
+    EXPECT_INPUT_CONTRACT(executor->Post(Task()), "!inTask.empty()");
+    EXPECT_INPUT_CONTRACT(executor->Post([] {}, -1), "inScheduling >= 0");
 }
 
 INSTANTIATE_TEST_SUITE_P(Kinds, ExecutorTest,
@@ -498,28 +459,10 @@ INSTANTIATE_TEST_SUITE_P(Kinds, ExecutorTest,
 
 TEST(ExecutorFactoryTest, BadArgumentsAreInputContractErrors)
 {
-    const struct
-    {
-        const char* expression;
-        std::function<void()> create;
-    } cases[] = {
-        {"inThreadCount > 0", [] { CreateThreadPoolExecutor(0); }},
-        {"inParent != nullptr", [] { CreateSubExecutor(ExecutorRef(), 1); }},
-        {"inMaxConcurrency > 0", [] { CreateSubExecutor(CreateThreadPoolExecutor(1), 0); }},
-    };
-    for (const auto& c : cases)
-    {
-        SCOPED_TRACE(c.expression);
-        try
-        {
-            c.create();
-            ADD_FAILURE() << "the executor was made";
-        }
-        catch (const mvxcore::config::Error& inError)
-        {
-            EXPECT_EQ(inError.GetExpression(), c.expression);
-        }
-    }
+    EXPECT_INPUT_CONTRACT(CreateThreadPoolExecutor(0), "inThreadCount > 0");
+    EXPECT_INPUT_CONTRACT(CreateSubExecutor(ExecutorRef(), 1), "inParent != nullptr");
+    EXPECT_INPUT_CONTRACT(CreateSubExecutor(CreateThreadPoolExecutor(1), 0),
+                          "inMaxConcurrency > 0");
 }
 
 TEST(ExecutorFactoryTest, CPUBoundExecutorRunsEveryTaskOnAtMostOneWorkerPerCore)
