@@ -4,6 +4,7 @@
 
 #include <atomic>
 #include <barrier>
+#include <string>
 #include <thread>
 #include <vector>
 
@@ -90,6 +91,21 @@ public:
     uint32_t mCount = 0;
 };
 
+// The text of the exception inCall throws; empty when it throws none.
+template <class Exception, class Call>
+std::string WhatOf(Call inCall)
+{
+    try
+    {
+        inCall();
+    }
+    catch (const Exception& inException)
+    {
+        return inException.what();
+    }
+    return {};
+}
+
 // Every case must leave no object and no allocator block behind.
 class ObjectModelTest : public ::testing::Test
 {
@@ -141,40 +157,18 @@ TEST_F(ObjectModelTest, QueryAnswersOwnInterfacesParentsAndRootOnlyAndCountsRefe
 TEST_F(ObjectModelTest, ExceptionsCarryExactTexts)
 {
     const QRT::InterfaceRef<ISquare> square = QRT::Allocated<Square>::Create<ISquare>(1);
-    try
-    {
-        QRT::InterfaceRef<IUnimplemented> bad(square);
-        FAIL() << "conversion to an unimplemented interface succeeded";
-    }
-    catch (const QRT::InterfaceNotFoundException& e)
-    {
-        EXPECT_STREQ(e.what(), "The requested interface has not been registered.");
-    }
     const QRT::InterfaceRef<ISquare> empty;
-    try
-    {
-        (void)empty->Side();
-        FAIL() << "dereferencing an empty reference succeeded";
-    }
-    catch (const QRT::NullInterfaceException& e)
-    {
-        EXPECT_STREQ(e.what(), "A NULL interface pointer has been dereferenced.");
-    }
-    EXPECT_THROW((void)*empty, QRT::NullInterfaceException);
     Rootless rootless;
-    {
-        const QRT::InterfaceRef<IShape> bad(&rootless);
-        try
-        {
-            (void)(bad == square);
-            FAIL() << "comparison with a rootless object succeeded";
-        }
-        catch (const QRT::IllegalComparisonException& e)
-        {
-            EXPECT_STREQ(e.what(), "A comparison of two refs has failed because we are unable "
-                                   "to convert one of them to QRTUnknown.");
-        }
-    }
+    EXPECT_EQ(
+        WhatOf<QRT::InterfaceNotFoundException>([&] { QRT::InterfaceRef<IUnimplemented>{square}; }),
+        "The requested interface has not been registered.");
+    EXPECT_EQ(WhatOf<QRT::NullInterfaceException>([&] { (void)empty->Side(); }),
+              "A NULL interface pointer has been dereferenced.");
+    EXPECT_THROW((void)*empty, QRT::NullInterfaceException);
+    EXPECT_EQ(WhatOf<QRT::IllegalComparisonException>(
+                  [&] { (void)(QRT::InterfaceRef<IShape>(&rootless) == square); }),
+              "A comparison of two refs has failed because we are unable to convert one of "
+              "them to QRTUnknown.");
     EXPECT_EQ(rootless.mCount, 0u);
 
     // An empty reference converts to an empty one instead of throwing.
