@@ -59,9 +59,8 @@ bool RunsAndAnswers(const ExecutorRef& inExecutor)
     return inExecutor->Post([&] { ran.Notify(); }) && ran.WaitFor();
 }
 
-// The behaviour both kinds of executor share, run over a pool of n workers
-// and over a sub-executor limited to n on a pool with two workers to spare.
-class ExecutorTest : public ::testing::TestWithParam<Kind>
+// Captures failure reports and holds executors' threads at a gate.
+class ExecutorFixture : public ::testing::Test
 {
 protected:
     void SetUp() override
@@ -75,16 +74,8 @@ protected:
     }
     void TearDown() override { mvxcore::debug::SetAssertHook({}); }
 
-    ExecutorRef Make(unsigned inCount)
-    {
-        if (GetParam() == Kind::kThreadPool)
-            return CreateThreadPoolExecutor(inCount);
-        const ExecutorRef parent = CreateThreadPoolExecutor(inCount + 2);
-        mParent = parent;
-        return CreateSubExecutor(parent, inCount);
-    }
-
-    // Holds one of inExecutor's threads until mGate opens.
+    // Holds one of inExecutor's threads until mGate opens; mOccupantDone is
+    // set when that task ends.
     void Occupy(const ExecutorRef& inExecutor)
     {
         CountingSignal started;
@@ -93,6 +84,7 @@ protected:
             {
                 started.Notify();
                 mGate.WaitFor();
+                mOccupantDone = true;
             }));
         ASSERT_TRUE(started.WaitFor());
     }
@@ -114,11 +106,27 @@ protected:
     }
 
     CountingSignal mGate;
+    std::atomic<bool> mOccupantDone{false};
     WeakExecutor mParent;
 
 private:
     std::mutex mAssertMutex; // guards mAssertMessages
     std::vector<std::string> mAssertMessages;
+};
+
+// The behaviour both kinds of executor share, run over a pool of n workers
+// and over a sub-executor limited to n on a pool with two workers to spare.
+class ExecutorTest : public ExecutorFixture, public ::testing::WithParamInterface<Kind>
+{
+protected:
+    ExecutorRef Make(unsigned inCount)
+    {
+        if (GetParam() == Kind::kThreadPool)
+            return CreateThreadPoolExecutor(inCount);
+        const ExecutorRef parent = CreateThreadPoolExecutor(inCount + 2);
+        mParent = parent;
+        return CreateSubExecutor(parent, inCount);
+    }
 };
 
 TEST_P(ExecutorTest, AtOneRunsReadyTasksOneByOneInPostOrderUnderLoadFromSeveralThreads)
@@ -333,18 +341,9 @@ TEST_P(ExecutorTest, ShutdownRefusesNewTasksStartsNoQueuedOneAndDiscardReleasesT
 TEST_P(ExecutorTest, WaitForRunningTasksFromItsOwnTaskWaitsForTheOthersOnly)
 {
     const ExecutorRef executor = Make(2);
-    CountingSignal otherStarted;
     CountingSignal done;
-    std::atomic<bool> otherFinished{false};
     std::atomic<bool> otherFinishedAtReturn{false};
-    executor->Post(
-        [&]
-        {
-            otherStarted.Notify();
-            mGate.WaitFor();
-            otherFinished = true;
-        });
-    ASSERT_TRUE(otherStarted.WaitFor());
+    Occupy(executor);
     executor->Post(
         [&]
         {
@@ -352,7 +351,7 @@ TEST_P(ExecutorTest, WaitForRunningTasksFromItsOwnTaskWaitsForTheOthersOnly)
             executor->DiscardPendingTasks();
             mGate.Notify();
             executor->WaitForRunningTasks();
-            otherFinishedAtReturn = otherFinished.load();
+            otherFinishedAtReturn = mOccupantDone.load();
             done.Notify();
         });
     ASSERT_TRUE(done.WaitFor());
@@ -412,17 +411,8 @@ TEST_P(ExecutorTest, DroppingTheLastReferenceDiscardsPendingTasksAndWaitsForTheR
     ExecutorRef executor = Make(1);
     std::atomic<int> live{0};
     std::atomic<int> ran{0};
-    std::atomic<bool> finished{false};
     std::atomic<bool> discardedWhileRunning{false};
-    CountingSignal started;
-    executor->Post(
-        [&]
-        {
-            started.Notify();
-            mGate.WaitFor();
-            finished = true;
-        });
-    ASSERT_TRUE(started.WaitFor());
+    Occupy(executor);
     for (int i = 0; i < 5; ++i)
         executor->Post([&ran, held = Tracked(live)] { ++ran; });
     // The running task is released only once the pending ones are gone.
@@ -438,7 +428,7 @@ TEST_P(ExecutorTest, DroppingTheLastReferenceDiscardsPendingTasksAndWaitsForTheR
     executor.reset();
     opener.join();
     EXPECT_TRUE(discardedWhileRunning.load());
-    EXPECT_TRUE(finished.load());
+    EXPECT_TRUE(mOccupantDone.load());
     EXPECT_EQ(live.load(), 0);
     EXPECT_EQ(ran.load(), 0);
 }
@@ -488,7 +478,9 @@ TEST(ExecutorFactoryTest, CPUBoundExecutorRunsEveryTaskOnAtMostOneWorkerPerCore)
     EXPECT_LE(most.load(), static_cast<int>(cores));
 }
 
-TEST(SubExecutorTest, StateQueryFollowsTheNesting)
+using SubExecutorTest = ExecutorFixture;
+
+TEST_F(SubExecutorTest, StateQueryFollowsTheNesting)
 {
     const ExecutorRef parent = CreateCPUBoundExecutor();
     const ExecutorRef sub = CreateSubExecutor(parent, 2);
@@ -515,21 +507,13 @@ TEST(SubExecutorTest, StateQueryFollowsTheNesting)
     EXPECT_EQ(seen[2].load(), 0b111);
 }
 
-TEST(SubExecutorTest, ParentShutdownShutsItDownAndReleasesItsTasks)
+TEST_F(SubExecutorTest, ParentShutdownShutsItDownAndReleasesItsTasks)
 {
     const ExecutorRef parent = CreateThreadPoolExecutor(1);
     const ExecutorRef sub = CreateSubExecutor(parent, 1);
-    CountingSignal gate;
-    CountingSignal started;
     std::atomic<int> live{0};
     std::atomic<int> ran{0};
-    parent->Post(
-        [&]
-        {
-            started.Notify();
-            gate.WaitFor();
-        });
-    ASSERT_TRUE(started.WaitFor());
+    Occupy(parent);
     for (int i = 0; i < 5; ++i)
         sub->Post([&ran, held = Tracked(live)] { ++ran; });
     sub->Post([&ran, held = Tracked(live)] { ++ran; }, 5);
@@ -540,12 +524,12 @@ TEST(SubExecutorTest, ParentShutdownShutsItDownAndReleasesItsTasks)
     EXPECT_EQ(live.load(), 0);
     EXPECT_TRUE(sub->IsShutDown());
     EXPECT_FALSE(sub->Post([&ran] { ++ran; }));
-    gate.Notify();
+    mGate.Notify();
     parent->WaitForRunningTasks();
     EXPECT_EQ(ran.load(), 0);
 }
 
-TEST(SubExecutorTest, KeepsItsParentAliveUntilItGoes)
+TEST_F(SubExecutorTest, KeepsItsParentAliveUntilItGoes)
 {
     ExecutorRef parent = CreateCPUBoundExecutor();
     const WeakExecutor watch = parent;
