@@ -6,6 +6,7 @@
 #include <functional>
 #include <iterator>
 #include <limits>
+#include <tuple>
 #include <utility>
 
 #include <gtest/gtest.h>
@@ -21,27 +22,21 @@ using FrameRateTest = ::testing::Test;
 
 TEST_F(FrameRateTest, NamedRatesAreExactRationals)
 {
-    struct Case
-    {
-        FrameRate rate;
-        std::int64_t numerator, denominator;
-    };
-    const Case cases[] = {
+    const std::tuple<FrameRate, std::int64_t, std::int64_t> cases[] = {
         {kFrameRate_Video2398, 24000, 1001}, {kFrameRate_Video24, 24, 1},
         {kFrameRate_Video25, 25, 1},         {kFrameRate_Video2997, 30000, 1001},
         {kFrameRate_Video30, 30, 1},         {kFrameRate_Video50, 50, 1},
         {kFrameRate_Video5994, 60000, 1001}, {kFrameRate_Video60, 60, 1},
-        {kFrameRate_Audio48000, 48000, 1},   {kFrameRate_Video1000, 1000, 1},
-    };
-    for (const Case& c : cases)
+        {kFrameRate_Audio48000, 48000, 1},   {kFrameRate_Video1000, 1000, 1}};
+    for (const auto& [rate, numerator, denominator] : cases)
     {
-        SCOPED_TRACE(::testing::Message() << c.numerator << "/" << c.denominator);
+        SCOPED_TRACE(::testing::Message() << numerator << "/" << denominator);
         // Ticks per frame x numerator is exactly a whole number of seconds.
-        EXPECT_EQ(c.rate.GetTicksPerFrame() * c.numerator, 705'600'000LL * c.denominator);
-        EXPECT_EQ(FrameRate::Create(c.numerator, c.denominator), c.rate);
-        EXPECT_DOUBLE_EQ(c.rate.GetValue(), double(c.numerator) / double(c.denominator));
-        EXPECT_EQ(FrameRate::FromValue(double(c.numerator) / double(c.denominator)), c.rate);
-        EXPECT_EQ(c.rate.GetFrameDuration().GetTicks(), c.rate.GetTicksPerFrame());
+        EXPECT_EQ(rate.GetTicksPerFrame() * numerator, 705'600'000LL * denominator);
+        EXPECT_EQ(FrameRate::Create(numerator, denominator), rate);
+        EXPECT_DOUBLE_EQ(rate.GetValue(), double(numerator) / double(denominator));
+        EXPECT_EQ(FrameRate::FromValue(double(numerator) / double(denominator)), rate);
+        EXPECT_EQ(rate.GetFrameDuration().GetTicks(), rate.GetTicksPerFrame());
     }
     EXPECT_EQ(kFrameRate_Zero.GetTicksPerFrame(), 0);
     EXPECT_EQ(kFrameRate_Zero.GetValue(), 0.0);
@@ -69,8 +64,7 @@ TEST_F(FrameRateTest, OperatorsScaleTheRateNotTheDuration)
         {FrameRate::Create(5) * 2, FrameRate::Create(3)},
         {FrameRate::Create(7) * 4, FrameRate::Create(2)},
         {FrameRate::Create(9) * 4, FrameRate::Create(2)},
-        {FrameRate::Create(10) * 4, FrameRate::Create(3)},
-    };
+        {FrameRate::Create(10) * 4, FrameRate::Create(3)}};
     for (const auto& [got, expected] : cases)
         EXPECT_EQ(got.GetTicksPerFrame(), expected.GetTicksPerFrame());
 }
@@ -83,8 +77,7 @@ TEST_F(FrameRateTest, ComparisonsOrderByFramesPerSecond)
         kFrameRate_Zero,    FrameRate::Create(kInt64Max), kFrameRate_Video2398,
         kFrameRate_Video24, kFrameRate_Video25,           kFrameRate_Video2997,
         kFrameRate_Video30, kFrameRate_Video50,           kFrameRate_Video5994,
-        kFrameRate_Video60, kFrameRate_Video1000,         kFrameRate_Audio48000,
-    };
+        kFrameRate_Video60, kFrameRate_Video1000,         kFrameRate_Audio48000};
     for (std::size_t i = 0; i < std::size(ascending); ++i)
         for (std::size_t j = 0; j < std::size(ascending); ++j)
         {
@@ -117,8 +110,7 @@ TEST_F(FrameRateTest, BadInputViolatesContracts)
         // Faster than one frame per tick cannot be represented.
         {[] { (void)FrameRate::FromValue(1e12); }, "ticks >= 1.0"},
         {[] { (void)FrameRate::Create(705'600'001LL * 10, 1); }, "ticks >= 1"},
-        {[] { (void)kFrameRate_Zero.FrameToTime(1); }, "inRate.GetTicksPerFrame() > 0"},
-    };
+        {[] { (void)kFrameRate_Zero.FrameToTime(1); }, "inRate.GetTicksPerFrame() > 0"}};
     for (const auto& [call, expression] : cases)
         vrtest::ExpectInputContract(call, expression);
 }

@@ -33,8 +33,7 @@ TEST_F(PixelAspectRatioTest, ConstantsHoldTheStandardRatiosAndReduceToLowestTerm
         {kPixelAspectRatio_Anamorphic, 2, 1, 2, 1}, {kPixelAspectRatio_HD1440, 4, 3, 4, 3},
         {kPixelAspectRatio_HD1280, 3, 2, 3, 2},     {PixelAspectRatio(), 1, 1, 1, 1},
         {PixelAspectRatio(20, 22), 20, 22, 10, 11}, {PixelAspectRatio(7, 7), 7, 7, 1, 1},
-        {PixelAspectRatio(0, 6), 0, 6, 0, 6},
-    };
+        {PixelAspectRatio(0, 6), 0, 6, 0, 6}};
     for (const Case& c : cases)
     {
         SCOPED_TRACE(::testing::Message() << c.numerator << ":" << c.denominator);
@@ -74,8 +73,7 @@ TEST_F(PixelAspectRatioTest, EqualityComparesValuesNotSpellings)
         {kPixelAspectRatio_Any, kPixelAspectRatio_Square, false},
         {PixelAspectRatio(0, 1), PixelAspectRatio(0, 2), false},
         {PixelAspectRatio(0, 1), kPixelAspectRatio_Any, false},
-        {PixelAspectRatio(3, 0), PixelAspectRatio(3, 0), true},
-    };
+        {PixelAspectRatio(3, 0), PixelAspectRatio(3, 0), true}};
     for (std::size_t index = 0; index < std::size(cases); ++index)
     {
         EXPECT_EQ(cases[index].left == cases[index].right, cases[index].equal) << "case " << index;

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <set>
 #include <string>
+#include <tuple>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -12,19 +13,12 @@ namespace mvxmediatypes
 namespace
 {
 
-// What a catalogue format physically is, written down by hand.
-enum Trait : unsigned
-{
-    kRender = 1, // (word & 0xC0000) == 0x40000 && (word & 0xC00) == 0
-    kFields = 2, // (word & 0xC0000) == 0x40000 && (word & 0x3C000) != 0
-    kHalved = 4, // bit 0, bits 14-17 in 9..12, bits 10-11 == 3
-    kYuv = 8,    // bit 0
-    kAlpha = 16,
-    kPremul = 32,
-    kFloat = 64,
-    kLinear = 128,
-    kCompressed = 256,
-};
+// What a catalogue format physically is, written down by hand. The renderer's
+// raw-word tests: render format (word & 0xC0000) == 0x40000 && (word & 0xC00) == 0;
+// field by field (word & 0xC0000) == 0x40000 && (word & 0x3C000) != 0; halved:
+// bit 0, bits 14-17 in 9..12 and bits 10-11 == 3; YUV: bit 0.
+constexpr unsigned kRender = 1, kFields = 2, kHalved = 4, kYuv = 8, kAlpha = 16, kPremul = 32,
+                   kFloat = 64, kLinear = 128, kCompressed = 256;
 
 struct Expected
 {
@@ -50,8 +44,7 @@ const Expected kCatalogue[] = {
     {kPixelFormat_YUYV_422_8u_HalfWidthFields, "YUYV_422_8u_HalfWidthFields", "YUFh", 2, 3, 8, 0,
      kFields | kHalved | kYuv},
     {kPixelFormat_MJPG_422_Compressed, "MJPG_422_Compressed", "MJPG", 0, 3, 8, 1,
-     kYuv | kCompressed},
-};
+     kYuv | kCompressed}};
 
 const PixelFormat kBgra8 = kPixelFormat_BGRA_4444_8u;
 const PixelFormat kBgra16 = kPixelFormat_BGRA_4444_16u;
@@ -77,7 +70,7 @@ TEST_F(PixelFormatTest, EveryCatalogueFormatAnswersTheRendererBitTests)
     {
         SCOPED_TRACE(e.name);
         const std::uint32_t word = Word(e.format);
-        const auto has = [&](Trait inTrait) { return (e.traits & inTrait) != 0; };
+        const auto has = [&](unsigned inTrait) { return (e.traits & inTrait) != 0; };
         // The tests exactly as the renderer writes them on the raw word.
         EXPECT_EQ((word & 0xC0000) == 0x40000 && (word & 0xC00) == 0, has(kRender));
         EXPECT_EQ((word & 0xC0000) == 0x40000 && (word & 0x3C000) != 0, has(kFields));
@@ -87,21 +80,16 @@ TEST_F(PixelFormatTest, EveryCatalogueFormatAnswersTheRendererBitTests)
         EXPECT_EQ((word & 1) != 0, has(kYuv)) << "bit 0 is the colour model";
         EXPECT_EQ((word >> 1) & 7, e.sampleKind) << "bits 1-3 are the sample kind";
 
-        EXPECT_EQ(e.format.IsRenderFormat(), has(kRender));
-        EXPECT_EQ(e.format.IsFieldByField(), has(kFields));
-        EXPECT_EQ(e.format.IsHorizontallyHalved(), has(kHalved));
-        EXPECT_EQ(e.format.IsYUV(), has(kYuv));
-        EXPECT_EQ(e.format.IsRGB(), !has(kYuv));
-        EXPECT_EQ(e.format.HasAlpha(), has(kAlpha));
-        EXPECT_EQ(e.format.IsPremultiplied(), has(kPremul));
-        EXPECT_EQ(e.format.IsFloat(), has(kFloat));
-        EXPECT_EQ(e.format.IsLinear(), has(kLinear));
-        EXPECT_EQ(e.format.IsCompressed(), has(kCompressed));
-        EXPECT_EQ(e.format.IsRaster(), !has(kCompressed));
-        EXPECT_EQ(e.format.GetBytesPerPixel(), e.bytesPerPixel);
-        EXPECT_EQ(e.format.GetChannelCount(), e.channels);
-        EXPECT_EQ(e.format.GetBitDepth(), e.bitDepth);
-        EXPECT_TRUE(e.format.IsValid());
+        const PixelFormat f = e.format;
+        const unsigned traits = kRender * f.IsRenderFormat() | kFields * f.IsFieldByField() |
+                                kHalved * f.IsHorizontallyHalved() | kYuv * f.IsYUV() |
+                                kAlpha * f.HasAlpha() | kPremul * f.IsPremultiplied() |
+                                kFloat * f.IsFloat() | kLinear * f.IsLinear() |
+                                kCompressed * f.IsCompressed();
+        EXPECT_EQ(traits, e.traits);
+        EXPECT_TRUE(f.IsRGB() != f.IsYUV() && f.IsRaster() != f.IsCompressed() && f.IsValid());
+        EXPECT_EQ(std::tuple(f.GetBytesPerPixel(), f.GetChannelCount(), f.GetBitDepth()),
+                  std::tuple(e.bytesPerPixel, e.channels, e.bitDepth));
         const std::uint32_t code = e.format.GetCode();
         EXPECT_EQ(std::string({char(code), char(code >> 8), char(code >> 16), char(code >> 24)}),
                   e.code);
@@ -197,8 +185,7 @@ TEST_F(PixelFormatTest, SelectNearestFollowsItsPreferenceOrder)
         {"Any in the list takes the request", kYuyv, {kBgra8, kAny}, 5, kYuyv},
         {"Any requested: first concrete", kAny, {kAny, kVuya8, kBgra8}, 5, kVuya8},
         {"only wildcards", kBgra8, {kInvalid}, 5, kInvalid},
-        {"only Any for Any", kAny, {kAny}, 5, kInvalid},
-    };
+        {"only Any for Any", kAny, {kAny}, 5, kInvalid}};
     for (const Case& c : cases)
         EXPECT_EQ(SelectNearestPixelFormat(c.requested, c.list, c.quality), c.expected) << c.why;
     // The two-argument form decides as at kRenderQuality_Max.
@@ -233,7 +220,6 @@ TEST_F(PixelFormatTest, SelectFromRankedRequestsFollowsTheDocumentedSteps)
 {
     struct Case
     {
-        const char* why;
         std::vector<PixelFormat> requested;
         PixelFormat fallback;
         std::vector<PixelFormat> available;
@@ -241,33 +227,40 @@ TEST_F(PixelFormatTest, SelectFromRankedRequestsFollowsTheDocumentedSteps)
         bool allowNearest;
         PixelFormat expected;
     };
-    const Case cases[] = {
-        {"1. ranking wins among exact matches",
-         {kBgra32, kBgra8},
-         kYuyv,
-         {kBgra8, kBgra32},
-         5,
-         true,
-         kBgra32},
-        {"1. exact match without nearest", {kBgra16, kBgra8}, kInvalid, {kBgra8}, 5, false, kBgra8},
-        {"3. no nearest: the fallback", {kBgra16}, kInvalid, {kVuya8, kBgra32}, 5, false, kInvalid},
-        {"4. the format in hand", {kBgra8}, kYuyv, {kVuya8, kYuyv}, 5, true, kYuyv},
-        {"5. nearest at Max", {kBgra16}, kYuyv, {kBgra8, kBgra32}, 5, true, kBgra32},
-        {"5. nearest at Draft", {kBgra16}, kYuyv, {kBgra8, kBgra32}, 0, true, kBgra8},
-        {"2. Any offered keeps the format in hand", {kBgra8}, kYuyv, {kAny}, 5, true, kYuyv},
-        {"2. Any offered, no nearest: first choice", {kBgra8}, kYuyv, {kAny}, 5, false, kBgra8},
-        {"2. Any offered, nothing in hand", {kBgra8}, kInvalid, {kAny}, 5, true, kBgra8},
-        {"Any requested: the format in hand", {kAny}, kYuyv, {kBgra8, kYuyv}, 5, true, kYuyv},
-        {"Any requested: first available", {kAny}, kBgra32, {kVuya8, kBgra8}, 5, true, kVuya8},
-        {"6. nothing available", {kBgra8}, kYuyv, {}, 5, true, kYuyv},
-        {"6. nothing requested", {}, kYuyv, {kBgra8}, 5, true, kYuyv},
-        {"6. only invalid requested", {kInvalid}, kInvalid, {kBgra8}, 5, true, kInvalid},
-    };
+    const Case cases[] = {// 1. ranking wins among exact matches
+                          {{kBgra32, kBgra8}, kYuyv, {kBgra8, kBgra32}, 5, true, kBgra32},
+                          // 1. exact match without nearest
+                          {{kBgra16, kBgra8}, kInvalid, {kBgra8}, 5, false, kBgra8},
+                          // 3. no nearest: the fallback
+                          {{kBgra16}, kInvalid, {kVuya8, kBgra32}, 5, false, kInvalid},
+                          // 4. the format in hand
+                          {{kBgra8}, kYuyv, {kVuya8, kYuyv}, 5, true, kYuyv},
+                          // 5. nearest at Max
+                          {{kBgra16}, kYuyv, {kBgra8, kBgra32}, 5, true, kBgra32},
+                          // 5. nearest at Draft
+                          {{kBgra16}, kYuyv, {kBgra8, kBgra32}, 0, true, kBgra8},
+                          // 2. Any offered keeps the format in hand
+                          {{kBgra8}, kYuyv, {kAny}, 5, true, kYuyv},
+                          // 2. Any offered, no nearest: first choice
+                          {{kBgra8}, kYuyv, {kAny}, 5, false, kBgra8},
+                          // 2. Any offered, nothing in hand
+                          {{kBgra8}, kInvalid, {kAny}, 5, true, kBgra8},
+                          // Any requested: the format in hand
+                          {{kAny}, kYuyv, {kBgra8, kYuyv}, 5, true, kYuyv},
+                          // Any requested: first available
+                          {{kAny}, kBgra32, {kVuya8, kBgra8}, 5, true, kVuya8},
+                          // 6. nothing available
+                          {{kBgra8}, kYuyv, {}, 5, true, kYuyv},
+                          // 6. nothing requested
+                          {{}, kYuyv, {kBgra8}, 5, true, kYuyv},
+                          // 6. only invalid requested
+                          {{kInvalid}, kInvalid, {kBgra8}, 5, true, kInvalid}};
     for (const Case& c : cases)
         EXPECT_EQ(SelectNearestPixelFormat(c.requested, c.fallback, c.available, c.quality,
                                            c.allowNearest),
                   c.expected)
-            << c.why;
+            << "requested " << GetPixelFormatName(c.requested.empty() ? kInvalid : c.requested[0])
+            << " fallback " << GetPixelFormatName(c.fallback);
 }
 
 } // namespace
