@@ -13,6 +13,7 @@ namespace
 {
 
 using namespace betest;
+using namespace mvxmediatypes;
 
 // Writes a solid-colour JPEG of inWidth x inHeight at quality 100.
 void WriteSolidJpeg(const std::string& inPath, int inWidth, int inHeight, int inRed, int inGreen,
@@ -53,8 +54,8 @@ protected:
 
 TEST_F(ImageFileSourceTest, PngStillReadsBackExactlyAtEveryTime)
 {
-    FrameRef picture = VF::CreateVideoFrame(mvxmediatypes::kPixelFormat_BGRA_4444_8u, 3, 2,
-                                            mvxmediatypes::kPixelAspectRatio_Square, true, false);
+    FrameRef picture = VF::CreateVideoFrame(kPixelFormat_BGRA_4444_8u, 3, 2,
+                                            kPixelAspectRatio_Square, true, false);
     ASSERT_TRUE(picture);
     auto* base = static_cast<std::uint8_t*>(picture->GetWritableBaseAddress());
     const std::uint8_t pixels[2][12] = {{10, 20, 30, 255, 40, 50, 60, 128, 0, 0, 255, 0},
@@ -67,9 +68,9 @@ TEST_F(ImageFileSourceTest, PngStillReadsBackExactlyAtEveryTime)
     const BE::VideoSourceRef source = OpenOrFail(path);
     EXPECT_TRUE(source->IsStill() && source->IsImage());
     EXPECT_TRUE(source->IsPrefetchWanted(TickTime::FromSeconds(100)));
-    EXPECT_EQ(source->GetFrameRate(), mvxmediatypes::kFrameRate_Video1000);
+    EXPECT_EQ(source->GetFrameRate(), kFrameRate_Video1000);
     EXPECT_EQ(source->GetBounds(), QRT::ParamRect(0, 0, 3, 2));
-    EXPECT_EQ(source->GetAlphaChannel(), mvxmediatypes::kAlphaChannel_Straight);
+    EXPECT_EQ(source->GetAlphaChannel(), kAlphaChannel_Straight);
     const FrameRef frame = ReadFrameOrFail(source, TickTime::FromSeconds(3));
     for (int y = 0; y < 2; ++y)
         for (int x = 0; x < 3; ++x)
@@ -92,7 +93,7 @@ TEST_F(ImageFileSourceTest, JpegStillReadsBackScalesAndKeysByContent)
     WriteSolidJpeg(path, 16, 8, 200, 100, 50);
     const BE::VideoSourceRef source = OpenOrFail(path);
     EXPECT_EQ(source->GetBounds(), QRT::ParamRect(0, 0, 16, 8));
-    EXPECT_EQ(source->GetAlphaChannel(), mvxmediatypes::kAlphaChannel_None);
+    EXPECT_EQ(source->GetAlphaChannel(), kAlphaChannel_None);
     const FrameRef frame = ReadFrameOrFail(source, TickTime());
     BE::VideoFrameRequest request;
     request.mWidth = 4;
@@ -134,8 +135,8 @@ TEST_F(ImageFileSourceTest, DamagedFilesAreRefusedAtOpeningOrFailTheRead)
               BE::kResult_MediaCannotOpen);
 
     // Truncated files open (the header is intact) and fail the read, not the process.
-    FrameRef picture = VF::CreateVideoFrame(mvxmediatypes::kPixelFormat_BGRA_4444_8u, 64, 64,
-                                            mvxmediatypes::kPixelAspectRatio_Square, true, false);
+    FrameRef picture = VF::CreateVideoFrame(kPixelFormat_BGRA_4444_8u, 64, 64,
+                                            kPixelAspectRatio_Square, true, false);
     const std::string pngPath = mDirectory.File("cut.png");
     ASSERT_TRUE(VF::WritePngFile(pngPath, picture).Succeeded());
     WriteBytes(pngPath, ReadBytes(pngPath).substr(0, 40));

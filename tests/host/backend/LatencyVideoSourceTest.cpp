@@ -12,13 +12,14 @@ namespace
 {
 
 using namespace betest;
+using namespace mvxmediatypes;
 using namespace std::chrono_literals;
 using BE::Deprecated::IAsyncVideoSource;
 using BE::Deprecated::kFrameRequestFlag_NoBlock;
 
 TickTime Frame(std::int64_t inIndex)
 {
-    return TickTime::FromFrame(inIndex, mvxmediatypes::kFrameRate_Video25);
+    return TickTime::FromFrame(inIndex, kFrameRate_Video25);
 }
 
 // A latency no test could sit out: reaching the end of a test proves that

@@ -12,11 +12,12 @@ namespace
 {
 
 using namespace betest;
+using namespace mvxmediatypes;
 using BE::Deprecated::kFrameRequestFlag_NoBlock;
 
 TickTime FrameTime(std::int64_t inFrame)
 {
-    return TickTime::FromFrame(inFrame, mvxmediatypes::kFrameRate_Video25);
+    return TickTime::FromFrame(inFrame, kFrameRate_Video25);
 }
 
 BE::VideoFrameRequest Sized(int inWidth, int inHeight)
@@ -87,8 +88,8 @@ TEST_F(PatternSourceTest, BarsAndSolidColourAreExactEverywhere)
     for (int y = 0; y < 4; ++y)
         for (int x = 0; x < 70; ++x)
             ASSERT_EQ(Pixel(bars, x, y), colours[x / 10]) << x << "," << y;
-    EXPECT_EQ(bars->GetPixelFormat(), mvxmediatypes::kPixelFormat_BGRA_4444_8u);
-    EXPECT_EQ(bars->GetAlphaChannel(), mvxmediatypes::kAlphaChannel_None);
+    EXPECT_EQ(bars->GetPixelFormat(), kPixelFormat_BGRA_4444_8u);
+    EXPECT_EQ(bars->GetAlphaChannel(), kAlphaChannel_None);
     EXPECT_TRUE(bars->IsShared());
     const FrameRef solid =
         ReadFrameOrFail(OpenOrFail("pattern:solid?size=9x5&color=12ab7F"), TickTime());
@@ -130,13 +131,13 @@ TEST_F(PatternSourceTest, InterlacedPatternDrawsEachFieldAtItsOwnTime)
     // Frame 2: the earlier field at phase 4 (box at 8), the later at phase 5 (box at 10).
     const FrameRef upper =
         ReadFrameOrFail(OpenOrFail("pattern:moving?size=64x32&field=upper"), FrameTime(2));
-    EXPECT_EQ(upper->GetFieldType(), mvxmediatypes::kFieldType_UpperFirst);
+    EXPECT_EQ(upper->GetFieldType(), kFieldType_UpperFirst);
     EXPECT_EQ(
         std::tuple(BoxLeft(upper, 28), BoxLeft(upper, 30), BoxLeft(upper, 29), BoxLeft(upper, 31)),
         std::tuple(8, 8, 10, 10));
     const FrameRef lower =
         ReadFrameOrFail(OpenOrFail("pattern:moving?size=64x32&field=lower"), FrameTime(2));
-    EXPECT_EQ(lower->GetFieldType(), mvxmediatypes::kFieldType_LowerFirst);
+    EXPECT_EQ(lower->GetFieldType(), kFieldType_LowerFirst);
     EXPECT_EQ(std::tuple(BoxLeft(lower, 31), BoxLeft(lower, 30)), std::tuple(8, 10));
     const FrameRef progressive =
         ReadFrameOrFail(OpenOrFail("pattern:moving?size=64x32"), FrameTime(2));
@@ -152,15 +153,15 @@ TEST_F(PatternSourceTest, DescriptionFollowsThePattern)
 {
     const BE::VideoSourceRef moving =
         OpenOrFail("pattern:moving?size=720x486&rate=29.97&field=lower&par=10:11");
-    EXPECT_EQ(moving->GetFrameRate(), mvxmediatypes::kFrameRate_Video2997);
-    EXPECT_EQ(moving->GetFieldType(), mvxmediatypes::kFieldType_LowerFirst);
+    EXPECT_EQ(moving->GetFrameRate(), kFrameRate_Video2997);
+    EXPECT_EQ(moving->GetFieldType(), kFieldType_LowerFirst);
     EXPECT_EQ(moving->GetBounds(), QRT::ParamRect(0, 0, 720, 486));
-    EXPECT_EQ(moving->GetPixelAspectRatio(), mvxmediatypes::PixelAspectRatio(10, 11));
+    EXPECT_EQ(moving->GetPixelAspectRatio(), PixelAspectRatio(10, 11));
     EXPECT_FALSE(moving->IsStill() || moving->IsImage());
     const auto movingInfo = QRT::QueryRef<BE::Deprecated::IMediaInfo>(moving);
     ASSERT_TRUE(movingInfo);
     EXPECT_EQ(movingInfo->GetKind(), BE::Deprecated::kMediaInfoKind_Clip);
-    EXPECT_EQ(movingInfo->GetDuration(), mvxmediatypes::kTime_Max);
+    EXPECT_EQ(movingInfo->GetDuration(), kTime_Max);
     const BE::VideoSourceRef bars = OpenOrFail("pattern:bars");
     EXPECT_TRUE(bars->IsStill());
     EXPECT_EQ(QRT::QueryRef<BE::Deprecated::IMediaInfo>(bars)->GetKind(),
@@ -171,15 +172,14 @@ TEST_F(PatternSourceTest, DescriptionFollowsThePattern)
         OpenOrFail("pattern:solid?size=64x32&color=336699&par=10:11&alpha=straight");
     const FrameRef frame = ReadFrameOrFail(solid, TickTime(), Sized(16, 8));
     EXPECT_EQ(frame->GetBounds(), QRT::ParamRect(0, 0, 16, 8));
-    EXPECT_EQ(frame->GetPixelAspectRatio(), mvxmediatypes::PixelAspectRatio(10, 11));
-    EXPECT_EQ(frame->GetAlphaChannel(), mvxmediatypes::kAlphaChannel_Straight);
-    EXPECT_EQ(solid->GetAlphaChannel(), mvxmediatypes::kAlphaChannel_Straight);
+    EXPECT_EQ(frame->GetPixelAspectRatio(), PixelAspectRatio(10, 11));
+    EXPECT_EQ(frame->GetAlphaChannel(), kAlphaChannel_Straight);
+    EXPECT_EQ(solid->GetAlphaChannel(), kAlphaChannel_Straight);
     EXPECT_EQ(solid->GetMatteColor().GetValue(), 0u);
     const BE::VideoSourceRef matte = OpenOrFail(
         "pattern:solid?size=4x4&color=204060&alpha=premultiplied&opacity=100&matte=FFFFFF");
     EXPECT_EQ(matte->GetMatteColor().GetRGB24(), 0xFFFFFFu);
-    EXPECT_EQ(ReadFrameOrFail(matte, TickTime())->GetAlphaChannel(),
-              mvxmediatypes::kAlphaChannel_Premultiplied);
+    EXPECT_EQ(ReadFrameOrFail(matte, TickTime())->GetAlphaChannel(), kAlphaChannel_Premultiplied);
 }
 
 TEST_F(PatternSourceTest, NoBlockRequestsAnswerOnlyHeldFrames)
@@ -233,16 +233,14 @@ TEST_F(PatternSourceTest, FrameKeysAreStableAndTellFramesApart)
 TEST_F(PatternSourceTest, DrawIntoFrameConvertsToAnUnsharedDestination)
 {
     const BE::VideoSourceRef source = OpenOrFail("pattern:solid?size=32x16&color=FF0000");
-    FrameRef destination =
-        VF::CreateVideoFrame(mvxmediatypes::kPixelFormat_BGRA_4444_8u, 8, 4,
-                             mvxmediatypes::kPixelAspectRatio_Square, true, false);
+    FrameRef destination = VF::CreateVideoFrame(kPixelFormat_BGRA_4444_8u, 8, 4,
+                                                kPixelAspectRatio_Square, true, false);
     ASSERT_TRUE(destination);
     const auto draw = [&]
     {
         return source->DrawVideoFrame(TickTime(), MF::BinaryData(), TickTime(), TickTime(),
-                                      destination, mvxmediatypes::kRenderQuality_Max,
-                                      mvxmediatypes::kFieldType_Progressive, true, false, false,
-                                      false, 0.0);
+                                      destination, kRenderQuality_Max, kFieldType_Progressive, true,
+                                      false, false, false, 0.0);
     };
     EXPECT_EQ(draw(), QRT::kResult_Success);
     EXPECT_EQ(Pixel(destination, 7, 3), Bgra(0, 0, 255));
@@ -286,13 +284,13 @@ TEST_F(PatternSettingsTest, DefaultsAndCanonicalText)
     const BE::PatternParseResult full = BE::ParsePatternSettings(
         "pattern:moving?size=1920x1080&rate=25&field=upper&par=10:11&alpha=straight");
     ASSERT_TRUE(full.Succeeded()) << full.mMessage;
-    EXPECT_EQ(full.mSettings.mFieldType, mvxmediatypes::kFieldType_UpperFirst);
-    EXPECT_EQ(full.mSettings.mPixelAspectRatio, mvxmediatypes::PixelAspectRatio(10, 11));
-    EXPECT_EQ(full.mSettings.mAlpha, mvxmediatypes::kAlphaChannel_Straight);
+    EXPECT_EQ(full.mSettings.mFieldType, kFieldType_UpperFirst);
+    EXPECT_EQ(full.mSettings.mPixelAspectRatio, PixelAspectRatio(10, 11));
+    EXPECT_EQ(full.mSettings.mAlpha, kAlphaChannel_Straight);
     EXPECT_EQ(BE::ParsePatternSettings("pattern:bars?rate=30000/1001").mSettings.mFrameRate,
-              mvxmediatypes::kFrameRate_Video2997);
+              kFrameRate_Video2997);
     EXPECT_EQ(BE::ParsePatternSettings("pattern:bars?rate=59.94").mSettings.mFrameRate,
-              mvxmediatypes::kFrameRate_Video5994);
+              kFrameRate_Video5994);
 }
 
 TEST_F(PatternSettingsTest, BadPatternsNameTheirProblem)

@@ -11,8 +11,7 @@ namespace
 {
 
 using namespace betest;
-using mvxmediatypes::FieldType;
-using mvxmediatypes::PixelAspectRatio;
+using namespace mvxmediatypes;
 
 struct Yuv
 {
@@ -89,7 +88,7 @@ struct Variant
     int width, height, chromaWidth, chromaHeight;
     std::vector<Yuv> frames;
     const char* profile;
-    mvxmediatypes::FrameRate rate;
+    FrameRate rate;
     FieldType field;
     PixelAspectRatio par;
 };
@@ -114,7 +113,7 @@ TEST_P(Y4MVariantTest, HeaderIsDescribedAndEveryFrameReadsAsBgra)
     {
         const FrameRef frame = ReadFrameOrFail(source, TickTime::FromFrame(index, v.rate));
         ASSERT_TRUE(frame);
-        EXPECT_EQ(frame->GetPixelFormat(), mvxmediatypes::kPixelFormat_BGRA_4444_8u);
+        EXPECT_EQ(frame->GetPixelFormat(), kPixelFormat_BGRA_4444_8u);
         EXPECT_EQ(frame->GetFieldType(), v.field);
         EXPECT_EQ(frame->GetPixelAspectRatio(), v.par);
         const auto expected = ExpectedBgra(v.frames[index], std::string(v.profile) == "BT.601");
@@ -132,9 +131,9 @@ INSTANTIATE_TEST_SUITE_P(
                               3,
                               {kReddish, kGreenish, kBluish},
                               "BT.601",
-                              mvxmediatypes::kFrameRate_Video25,
-                              mvxmediatypes::kFieldType_Progressive,
-                              mvxmediatypes::kPixelAspectRatio_Square},
+                              kFrameRate_Video25,
+                              kFieldType_Progressive,
+                              kPixelAspectRatio_Square},
                       Variant{"YUV4MPEG2 W6 H4 F30:1 C422",
                               6,
                               4,
@@ -142,9 +141,9 @@ INSTANTIATE_TEST_SUITE_P(
                               4,
                               {kGreenish},
                               "BT.601",
-                              mvxmediatypes::kFrameRate_Video30,
-                              mvxmediatypes::kFieldType_Progressive,
-                              mvxmediatypes::kPixelAspectRatio_Square},
+                              kFrameRate_Video30,
+                              kFieldType_Progressive,
+                              kPixelAspectRatio_Square},
                       Variant{"YUV4MPEG2 W5 H3 F30:1 C444",
                               5,
                               3,
@@ -152,9 +151,9 @@ INSTANTIATE_TEST_SUITE_P(
                               3,
                               {kBluish, kReddish},
                               "BT.601",
-                              mvxmediatypes::kFrameRate_Video30,
-                              mvxmediatypes::kFieldType_Progressive,
-                              mvxmediatypes::kPixelAspectRatio_Square},
+                              kFrameRate_Video30,
+                              kFieldType_Progressive,
+                              kPixelAspectRatio_Square},
                       // Tall pictures use BT.709.
                       Variant{"YUV4MPEG2 W4 H720 F50:1 C420",
                               4,
@@ -163,9 +162,9 @@ INSTANTIATE_TEST_SUITE_P(
                               360,
                               {kReddish},
                               "BT.709",
-                              mvxmediatypes::kFrameRate_Video50,
-                              mvxmediatypes::kFieldType_Progressive,
-                              mvxmediatypes::kPixelAspectRatio_Square},
+                              kFrameRate_Video50,
+                              kFieldType_Progressive,
+                              kPixelAspectRatio_Square},
                       Variant{"YUV4MPEG2 W4 H4 F30000:1001 It A10:11 C444 XYSCSS=444",
                               4,
                               4,
@@ -173,8 +172,8 @@ INSTANTIATE_TEST_SUITE_P(
                               4,
                               {kReddish},
                               "BT.601",
-                              mvxmediatypes::kFrameRate_Video2997,
-                              mvxmediatypes::kFieldType_UpperFirst,
+                              kFrameRate_Video2997,
+                              kFieldType_UpperFirst,
                               PixelAspectRatio(10, 11)},
                       // No C: 4:2:0; A0:0 (unknown): square.
                       Variant{"YUV4MPEG2 W4 H4 F25:1 Ib A0:0",
@@ -184,13 +183,13 @@ INSTANTIATE_TEST_SUITE_P(
                               2,
                               {kGreenish, kReddish},
                               "BT.601",
-                              mvxmediatypes::kFrameRate_Video25,
-                              mvxmediatypes::kFieldType_LowerFirst,
-                              mvxmediatypes::kPixelAspectRatio_Square}));
+                              kFrameRate_Video25,
+                              kFieldType_LowerFirst,
+                              kPixelAspectRatio_Square}));
 
 TEST_F(Y4MSourceTest, FramesBeyondTheFileAreOutOfRange)
 {
-    const auto rate = mvxmediatypes::kFrameRate_Video25;
+    const auto rate = kFrameRate_Video25;
     const BE::VideoSourceRef source =
         Write(MakeY4M("YUV4MPEG2 W4 H2 F25:1 C422", 4, 2, 2, 2, {kGreenish, kReddish, kBluish}));
     FrameRef frame;
@@ -204,15 +203,15 @@ TEST_F(Y4MSourceTest, FramesBeyondTheFileAreOutOfRange)
     // YUV formats are delivered when asked for.
     const auto formats = source->GetPixelFormats();
     ASSERT_EQ(formats.size(), 3u);
-    EXPECT_EQ(formats[0], mvxmediatypes::kPixelFormat_BGRA_4444_8u);
+    EXPECT_EQ(formats[0], kPixelFormat_BGRA_4444_8u);
     BE::VideoFrameRequest request;
-    request.mPixelFormat = mvxmediatypes::kPixelFormat_VUYA_4444_8u;
+    request.mPixelFormat = kPixelFormat_VUYA_4444_8u;
     const FrameRef vuya = ReadFrameOrFail(source, TickTime(), request);
-    EXPECT_EQ(vuya->GetPixelFormat(), mvxmediatypes::kPixelFormat_VUYA_4444_8u);
+    EXPECT_EQ(vuya->GetPixelFormat(), kPixelFormat_VUYA_4444_8u);
     EXPECT_EQ(Pixel(vuya, 3, 1), (std::array<int, 4>{34, 54, 145, 255}));
-    request.mPixelFormat = mvxmediatypes::kPixelFormat_YUYV_422_8u;
+    request.mPixelFormat = kPixelFormat_YUYV_422_8u;
     const FrameRef yuyv = ReadFrameOrFail(source, TickTime(), request);
-    EXPECT_EQ(yuyv->GetPixelFormat(), mvxmediatypes::kPixelFormat_YUYV_422_8u);
+    EXPECT_EQ(yuyv->GetPixelFormat(), kPixelFormat_YUYV_422_8u);
     EXPECT_EQ(Pixel(yuyv, 1, 1), (std::array<int, 4>{145, 54, 145, 34}));
 }
 
@@ -221,7 +220,7 @@ TEST_F(Y4MSourceTest, FrameKeysFollowTheFile)
     const std::string bytes = MakeY4M("YUV4MPEG2 W4 H4 F25:1", 4, 4, 2, 2, {kReddish, kBluish});
     const BE::VideoSourceRef first = Write(bytes);
     const BE::VideoSourceRef again = OpenOrFail(mPath);
-    const auto frame1 = TickTime::FromFrame(1, mvxmediatypes::kFrameRate_Video25);
+    const auto frame1 = TickTime::FromFrame(1, kFrameRate_Video25);
     const auto key = first->GetFrameKey(frame1, {}, {}, {});
     EXPECT_EQ(key, again->GetFrameKey(frame1, {}, {}, {}));
     EXPECT_NE(key, first->GetFrameKey(TickTime(), {}, {}, {}));
@@ -267,7 +266,7 @@ TEST_F(Y4MSourceTest, DamagedFilesAreRefusedWithTheirReason)
     const BE::VideoSourceRef cut = Write(bytes);
     WriteBytes(mPath, bytes.substr(0, bytes.size() - 5));
     FrameRef frame;
-    EXPECT_EQ(ReadFrame(cut, TickTime::FromFrame(1, mvxmediatypes::kFrameRate_Video25), frame),
+    EXPECT_EQ(ReadFrame(cut, TickTime::FromFrame(1, kFrameRate_Video25), frame),
               BE::kResult_MediaMalformed);
     EXPECT_FALSE(frame);
     EXPECT_EQ(ReadFrame(cut, TickTime(), frame), QRT::kResult_Success);

@@ -9,10 +9,7 @@
 namespace
 {
 
-using mvxmediatypes::kFieldType_LowerFirst;
-using mvxmediatypes::kFieldType_Progressive;
-using mvxmediatypes::kFieldType_UpperFirst;
-using mvxmediatypes::TickTime;
+using namespace mvxmediatypes;
 
 constexpr auto Ticks = &TickTime::TicksToTime;
 
@@ -20,13 +17,13 @@ using FrameTimeTest = ::testing::Test;
 
 TEST_F(FrameTimeTest, FieldOrderFollowsWhichFieldIsEarlierAndTheEarlierIsTheFrameTime)
 {
-    const std::tuple<MF::FrameTime, mvxmediatypes::FieldType, std::int64_t, std::int64_t> cases[] =
-        {{MF::FrameTime(Ticks(1000), Ticks(1500)), kFieldType_UpperFirst, 1000, 1500},
-         {MF::FrameTime(Ticks(1500), Ticks(1000)), kFieldType_LowerFirst, 1000, 1500},
-         {MF::FrameTime(Ticks(-10), Ticks(-20)), kFieldType_LowerFirst, -20, -10},
-         {MF::FrameTime(Ticks(-700), Ticks(-700)), kFieldType_Progressive, -700, -700},
-         {MF::FrameTime(Ticks(-700)), kFieldType_Progressive, -700, -700},
-         {MF::FrameTime(), kFieldType_Progressive, 0, 0}};
+    const std::tuple<MF::FrameTime, FieldType, std::int64_t, std::int64_t> cases[] = {
+        {MF::FrameTime(Ticks(1000), Ticks(1500)), kFieldType_UpperFirst, 1000, 1500},
+        {MF::FrameTime(Ticks(1500), Ticks(1000)), kFieldType_LowerFirst, 1000, 1500},
+        {MF::FrameTime(Ticks(-10), Ticks(-20)), kFieldType_LowerFirst, -20, -10},
+        {MF::FrameTime(Ticks(-700), Ticks(-700)), kFieldType_Progressive, -700, -700},
+        {MF::FrameTime(Ticks(-700)), kFieldType_Progressive, -700, -700},
+        {MF::FrameTime(), kFieldType_Progressive, 0, 0}};
     for (const auto& [time, order, earlier, later] : cases)
     {
         SCOPED_TRACE(::testing::Message() << earlier << ", " << later);
@@ -78,11 +75,11 @@ TEST_F(FrameTimeTest, BadArgumentsBreakContracts)
     EXPECT_INPUT_CONTRACT(time.GetFieldTime(0), "inField == 1 || inField == 2");
     EXPECT_INPUT_CONTRACT(time.GetFieldTime(3), "inField == 1 || inField == 2");
     EXPECT_INPUT_CONTRACT(
-        MF::FrameTime::Make(Ticks(0), mvxmediatypes::kFieldType_AsSource, Ticks(1)),
+        MF::FrameTime::Make(Ticks(0), kFieldType_AsSource, Ticks(1)),
         "inOrder == mvxmediatypes::kFieldType_Progressive || mvxmediatypes::IsInterlaced(inOrder)");
     EXPECT_INPUT_CONTRACT(MF::FrameTime::Make(Ticks(0), kFieldType_UpperFirst, Ticks(0)),
                           "inFieldDuration > mvxmediatypes::kTime_Zero");
-    EXPECT_FALSE(MF::FrameTime(mvxmediatypes::kTime_Invalid, Ticks(0)).IsValid());
+    EXPECT_FALSE(MF::FrameTime(kTime_Invalid, Ticks(0)).IsValid());
 }
 
 } // namespace

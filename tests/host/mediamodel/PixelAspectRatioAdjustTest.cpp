@@ -12,7 +12,7 @@
 namespace
 {
 
-using mvxmediatypes::PixelAspectRatio;
+using namespace mvxmediatypes;
 
 std::tuple<std::uint32_t, std::uint32_t> Terms(const PixelAspectRatio& inRatio)
 {
@@ -28,15 +28,15 @@ TEST_F(PixelAspectRatioAdjustTest, RatioFollowsTheColumnAndRowFactorsInLowestTer
     // (ratio, requested width and height, delivered width and height, exact terms)
     const std::tuple<PixelAspectRatio, int, int, int, int, std::uint32_t, std::uint32_t> cases[] = {
         // Half the columns doubles the ratio, half the rows halves it.
-        {mvxmediatypes::kPixelAspectRatio_D1NTSC, 720, 480, 360, 480, 20, 11},
-        {mvxmediatypes::kPixelAspectRatio_D1NTSC, 720, 480, 720, 240, 5, 11},
-        {mvxmediatypes::kPixelAspectRatio_D1NTSC, 720, 480, 360, 240, 10, 11},
+        {kPixelAspectRatio_D1NTSC, 720, 480, 360, 480, 20, 11},
+        {kPixelAspectRatio_D1NTSC, 720, 480, 720, 240, 5, 11},
+        {kPixelAspectRatio_D1NTSC, 720, 480, 360, 240, 10, 11},
         {PixelAspectRatio(20, 22), 1920, 1080, 1920, 1080, 10, 11},
         // 1440x1080 anamorphic HD (4:3 pixels) delivered at 1920x1080: square.
-        {mvxmediatypes::kPixelAspectRatio_HD1440, 1440, 1080, 1920, 1080, 1, 1},
+        {kPixelAspectRatio_HD1440, 1440, 1080, 1920, 1080, 1, 1},
         // 59 * 720 * 573 / (54 * 704 * 576) = 24,341,040 / 21,897,216 = 56,345 / 50,688.
-        {mvxmediatypes::kPixelAspectRatio_D1PAL, 720, 576, 704, 573, 56345, 50688},
-        {mvxmediatypes::kPixelAspectRatio_Any, 720, 480, 360, 480, 0, 0},
+        {kPixelAspectRatio_D1PAL, 720, 576, 704, 573, 56345, 50688},
+        {kPixelAspectRatio_Any, 720, 480, 360, 480, 0, 0},
         // big * maxSize does not fit: the nearest fitting fraction is the largest there is.
         {PixelAspectRatio(big, 1), maxSize, 1, 1, 1, std::numeric_limits<std::uint32_t>::max(), 1}};
     for (const auto& [ratio, requestedWidth, requestedHeight, width, height, numerator,
@@ -60,10 +60,10 @@ TEST_F(PixelAspectRatioAdjustTest, RatioFollowsTheColumnAndRowFactorsInLowestTer
 TEST_F(PixelAspectRatioAdjustTest, BadSizesAndRatiosBreakContracts)
 {
     EXPECT_INPUT_CONTRACT(MF::AdjustPixelAspectRatioForNonUniformDownsample(
-                              mvxmediatypes::kPixelAspectRatio_Square, 0, 480, 720, 480),
+                              kPixelAspectRatio_Square, 0, 480, 720, 480),
                           "inRequestedWidth > 0 && inRequestedHeight > 0");
     EXPECT_INPUT_CONTRACT(MF::AdjustPixelAspectRatioForNonUniformDownsample(
-                              mvxmediatypes::kPixelAspectRatio_Square, 720, 480, 720, -1),
+                              kPixelAspectRatio_Square, 720, 480, 720, -1),
                           "inFrameWidth > 0 && inFrameHeight > 0");
     EXPECT_INPUT_CONTRACT(MF::AdjustPixelAspectRatioForNonUniformDownsample(PixelAspectRatio(1, 0),
                                                                             720, 480, 720, 480),

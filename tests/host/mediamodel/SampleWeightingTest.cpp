@@ -11,15 +11,15 @@
 namespace
 {
 
-using mvxmediatypes::FrameRate;
-using mvxmediatypes::TickTime;
+using namespace mvxmediatypes;
+
 using Weighted = MF::WeightedSample;
 
 // Interlaced 29.97 material: 23,543,520 ticks per frame, P = 11,771,760 per field.
 constexpr std::int64_t kFrame = 23'543'520;
 constexpr std::int64_t kField = kFrame / 2;
-const FrameRate kFieldRate = mvxmediatypes::kFrameRate_Video5994;
-const FrameRate kSequenceRate = mvxmediatypes::kFrameRate_Video2997;
+const FrameRate kFieldRate = kFrameRate_Video5994;
+const FrameRate kSequenceRate = kFrameRate_Video2997;
 constexpr auto Ticks = &TickTime::TicksToTime;
 
 // inHalves half fields: HalfFields(5) is 2.5 P.
@@ -157,7 +157,7 @@ TEST_F(SampleWeightingTest, NormalisingSharesOutTheWeights)
 
     // Speed 7.3 over a progressive 23.976 upstream: one 29.97 output frame
     // covers 7.3 * 0.8 = 5.84 upstream frames, starting off the grid.
-    const FrameRate upstream = mvxmediatypes::kFrameRate_Video2398;
+    const FrameRate upstream = kFrameRate_Video2398;
     const TickTime whole =
         std::get<2>(Durations(upstream, kSequenceRate, MF::FrameTime(Ticks(12345)), 7.3));
     samples = Range(Ticks(12345), Ticks(12345) + whole, upstream, 2);
@@ -181,17 +181,16 @@ TEST_F(SampleWeightingTest, BadArgumentsBreakContracts)
     EXPECT_INPUT_CONTRACT(
         MF::GetWeightedSamplesForRange(Fields(1), Fields(2), kFieldRate, 3, samples),
         "inFieldNumber == 1 || inFieldNumber == 2");
-    EXPECT_INPUT_CONTRACT(MF::GetWeightedSamplesForRange(
-                              Fields(1), Fields(2), mvxmediatypes::kFrameRate_Zero, 1, samples),
-                          "inUpstreamFieldRate.GetTicksPerFrame() > 0");
+    EXPECT_INPUT_CONTRACT(
+        MF::GetWeightedSamplesForRange(Fields(1), Fields(2), kFrameRate_Zero, 1, samples),
+        "inUpstreamFieldRate.GetTicksPerFrame() > 0");
     // A range of the whole time line would be 10^12 samples: refused.
-    EXPECT_INPUT_CONTRACT(MF::GetWeightedSamplesForRange(mvxmediatypes::kTime_Min,
-                                                         mvxmediatypes::kTime_Max, kFieldRate, 1,
-                                                         samples),
-                          "count <= static_cast<Int128>(kMaxSamplesPerRange)");
-    EXPECT_INPUT_CONTRACT(MF::GetWeightedSamplesForRange(mvxmediatypes::kTime_Invalid, Fields(1),
-                                                         kFieldRate, 1, samples),
-                          "inStart.IsValid()");
+    EXPECT_INPUT_CONTRACT(
+        MF::GetWeightedSamplesForRange(kTime_Min, kTime_Max, kFieldRate, 1, samples),
+        "count <= static_cast<Int128>(kMaxSamplesPerRange)");
+    EXPECT_INPUT_CONTRACT(
+        MF::GetWeightedSamplesForRange(kTime_Invalid, Fields(1), kFieldRate, 1, samples),
+        "inStart.IsValid()");
     MF::WeightedSampleList negative{{{Fields(1), 1}, -0.5}};
     EXPECT_INPUT_CONTRACT(MF::NormalizeSampleWeights(negative),
                           "std::isfinite(sample.second) && sample.second >= 0.0");
@@ -199,15 +198,13 @@ TEST_F(SampleWeightingTest, BadArgumentsBreakContracts)
     EXPECT_INPUT_CONTRACT(Durations(kFieldRate, kSequenceRate, MF::FrameTime(),
                                     std::numeric_limits<double>::quiet_NaN()),
                           "std::isfinite(inRate)");
-    EXPECT_INPUT_CONTRACT(
-        Durations(mvxmediatypes::kFrameRate_Zero, kSequenceRate, MF::FrameTime(), 1.0),
-        "inUpstreamFieldRate.GetTicksPerFrame() > 0");
+    EXPECT_INPUT_CONTRACT(Durations(kFrameRate_Zero, kSequenceRate, MF::FrameTime(), 1.0),
+                          "inUpstreamFieldRate.GetTicksPerFrame() > 0");
     TickTime a, b;
-    EXPECT_INPUT_CONTRACT(MF::GetSamplesAroundTime(MF::FrameTime(mvxmediatypes::kTime_Invalid),
-                                                   kFieldRate, a, b, a, b),
-                          "inFrameTime.IsValid()");
-    EXPECT_INPUT_CONTRACT(MF::CalculateSampleWeight(mvxmediatypes::kTime_Invalid, a, b),
-                          "inFieldTime.IsValid()");
+    EXPECT_INPUT_CONTRACT(
+        MF::GetSamplesAroundTime(MF::FrameTime(kTime_Invalid), kFieldRate, a, b, a, b),
+        "inFrameTime.IsValid()");
+    EXPECT_INPUT_CONTRACT(MF::CalculateSampleWeight(kTime_Invalid, a, b), "inFieldTime.IsValid()");
 }
 
 } // namespace

@@ -12,10 +12,8 @@
 namespace
 {
 
-using mvxmediatypes::kTime_Invalid;
-using mvxmediatypes::kTime_Max;
-using mvxmediatypes::kTime_Min;
-using mvxmediatypes::TickTime;
+using namespace mvxmediatypes;
+
 using TransformRef = QRT::InterfaceRef<MF::ITimeTransform>;
 
 constexpr auto Ticks = &TickTime::TicksToTime;
