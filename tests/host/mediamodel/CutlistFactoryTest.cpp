@@ -13,8 +13,12 @@
 namespace
 {
 
-using MF::HostObjectRef;
-using MF::RenderableCutlistRef;
+using Object = MF::HostObjectRef;
+using Cutlist = MF::RenderableCutlistRef;
+using Name = QRT::ImmutableString;
+using Ranges = MF::TickTimeRangeList;
+using FactoryRef = QRT::InterfaceRef<MF::IRenderableCutlistFactory>;
+constexpr QRT::Result kNo = QRT::kResult_NotFound;
 
 std::atomic<int> sLiveFactories{0};
 
@@ -30,60 +34,48 @@ public:
     }
     ~TaggedFactory() { --sLiveFactories; }
 
-    QRT::Result CreateSequenceCutlist(const HostObjectRef&, const QRT::ImmutableString&,
-                                      RenderableCutlistRef&) override
+    QRT::Result CreateSequenceCutlist(const Object&, const Name&, Cutlist&) override { return kNo; }
+    QRT::Result CreateSequenceCutlistForRanges(const Object&, const Ranges&, const Name&,
+                                               Cutlist&) override
     {
-        return QRT::kResult_NotFound;
+        return kNo;
     }
-    QRT::Result CreateSequenceCutlistForRanges(const HostObjectRef&, const MF::TickTimeRangeList&,
-                                               const QRT::ImmutableString&,
-                                               RenderableCutlistRef&) override
+    QRT::Result CreateTrackGroupCutlist(const Object&, const Name&, Cutlist&) override
     {
-        return QRT::kResult_NotFound;
+        return kNo;
     }
-    QRT::Result CreateTrackGroupCutlist(const HostObjectRef&, const QRT::ImmutableString&,
-                                        RenderableCutlistRef&) override
+    QRT::Result CreateTrackGroupCutlistForRanges(const Object&, const Ranges&, const Name&,
+                                                 Cutlist&) override
     {
-        return QRT::kResult_NotFound;
+        return kNo;
     }
-    QRT::Result CreateTrackGroupCutlistForRanges(const HostObjectRef&, const MF::TickTimeRangeList&,
-                                                 const QRT::ImmutableString&,
-                                                 RenderableCutlistRef&) override
-    {
-        return QRT::kResult_NotFound;
-    }
-    QRT::Result CreateTrackItemCutlist(const HostObjectRef&, RenderableCutlistRef&) override
-    {
-        return QRT::kResult_NotFound;
-    }
-    QRT::Result CreateMediaCutlist(const HostObjectRef&, RenderableCutlistRef& outCutlist) override
+    QRT::Result CreateTrackItemCutlist(const Object&, Cutlist&) override { return kNo; }
+    QRT::Result CreateMediaCutlist(const Object&, Cutlist& outCutlist) override
     {
         outCutlist.Reset();
         return mTag;
     }
-    QRT::Result CreatePreviewCutlist(const HostObjectRef&, RenderableCutlistRef&) override
+    QRT::Result CreatePreviewCutlist(const Object&, Cutlist&) override { return kNo; }
+    QRT::Result CreatePreviewSourceCutlist(const Object&, Cutlist&) override { return kNo; }
+    QRT::Result CreateMergedCutlist(const std::vector<Cutlist>&, const Name&, Cutlist&) override
     {
-        return QRT::kResult_NotFound;
+        return kNo;
     }
-    QRT::Result CreatePreviewSourceCutlist(const HostObjectRef&, RenderableCutlistRef&) override
+    QRT::Result CreateSequenceCutlistWithObject(const Object&, const Object&, const Name&,
+                                                Cutlist&) override
     {
-        return QRT::kResult_NotFound;
-    }
-    QRT::Result CreateMergedCutlist(const std::vector<RenderableCutlistRef>&,
-                                    const QRT::ImmutableString&, RenderableCutlistRef&) override
-    {
-        return QRT::kResult_NotFound;
-    }
-    QRT::Result CreateSequenceCutlistWithObject(const HostObjectRef&, const HostObjectRef&,
-                                                const QRT::ImmutableString&,
-                                                RenderableCutlistRef&) override
-    {
-        return QRT::kResult_NotFound;
+        return kNo;
     }
 
 private:
     const QRT::Result mTag;
 };
+
+QRT::Result TagOf(const FactoryRef& inFactory)
+{
+    Cutlist cutlist;
+    return inFactory->CreateMediaCutlist({}, cutlist);
+}
 
 // A factory whose destruction asks for the published factory, as a module
 // tearing down might.
@@ -95,21 +87,14 @@ public:
     using TaggedFactory::TaggedFactory;
     ~CuriousFactory()
     {
-        RenderableCutlistRef cutlist;
         const auto published = MF::GetCutlistFactory();
-        sTagSeenAtDestruction = published ? published->CreateMediaCutlist({}, cutlist) : 0;
+        sTagSeenAtDestruction = published ? TagOf(published) : 0;
     }
 };
 
-QRT::InterfaceRef<MF::IRenderableCutlistFactory> MakeFactory(QRT::Result inTag)
+FactoryRef MakeFactory(QRT::Result inTag)
 {
     return QRT::Allocated<TaggedFactory>::Create<MF::IRenderableCutlistFactory>(inTag);
-}
-
-QRT::Result TagOf(const QRT::InterfaceRef<MF::IRenderableCutlistFactory>& inFactory)
-{
-    RenderableCutlistRef cutlist;
-    return inFactory->CreateMediaCutlist({}, cutlist);
 }
 
 class CutlistFactoryTest : public ::testing::Test
@@ -123,44 +108,24 @@ protected:
     }
 };
 
-TEST_F(CutlistFactoryTest, NothingIsPublishedAtFirst)
+TEST_F(CutlistFactoryTest, PublicationAnswersTheLatestFactoryAndReleasesTheOneBefore)
 {
     EXPECT_FALSE(MF::GetCutlistFactory());
-}
-
-TEST_F(CutlistFactoryTest, PublishedFactoryIsAnswered)
-{
-    MF::SetCutlistFactory(MakeFactory(11));
-    const auto published = MF::GetCutlistFactory();
-    ASSERT_TRUE(published);
-    EXPECT_EQ(TagOf(published), 11);
-    EXPECT_EQ(MF::GetCutlistFactory(), published);
-}
-
-TEST_F(CutlistFactoryTest, ReplacementReleasesThePreviousFactory)
-{
     MF::SetCutlistFactory(MakeFactory(1));
-    EXPECT_EQ(sLiveFactories.load(), 1);
+    const auto held = MF::GetCutlistFactory();
+    ASSERT_TRUE(held);
+    EXPECT_EQ(TagOf(held), 1);
+    EXPECT_EQ(MF::GetCutlistFactory(), held);
     MF::SetCutlistFactory(MakeFactory(2));
-    EXPECT_EQ(sLiveFactories.load(), 1);
     EXPECT_EQ(TagOf(MF::GetCutlistFactory()), 2);
-}
-
-TEST_F(CutlistFactoryTest, WithdrawingReleasesAndAnswersEmpty)
-{
+    // The caller keeps its factory across the replacement; nobody else does.
+    EXPECT_EQ(TagOf(held), 1);
+    EXPECT_EQ(sLiveFactories.load(), 2);
     MF::SetCutlistFactory(MakeFactory(3));
+    EXPECT_EQ(sLiveFactories.load(), 2);
     MF::SetCutlistFactory({});
     EXPECT_FALSE(MF::GetCutlistFactory());
-    EXPECT_EQ(sLiveFactories.load(), 0);
-}
-
-TEST_F(CutlistFactoryTest, CallerKeepsItsFactoryAcrossReplacement)
-{
-    MF::SetCutlistFactory(MakeFactory(4));
-    const auto held = MF::GetCutlistFactory();
-    MF::SetCutlistFactory(MakeFactory(5));
-    EXPECT_EQ(sLiveFactories.load(), 2);
-    EXPECT_EQ(TagOf(held), 4);
+    EXPECT_EQ(sLiveFactories.load(), 1);
 }
 
 TEST_F(CutlistFactoryTest, PreviousFactoryIsReleasedOutsideThePublicationLock)
@@ -180,24 +145,19 @@ TEST_F(CutlistFactoryTest, ConcurrentReadersSeeOnlyPublishedFactories)
     std::atomic<bool> writing{true};
     std::atomic<int> badTags{0};
     std::atomic<long> reads{0};
-
     std::vector<std::thread> readers;
     for (int reader = 0; reader < kReaders; ++reader)
         readers.emplace_back(
             [&]
             {
                 while (writing.load())
-                {
-                    const auto factory = MF::GetCutlistFactory();
-                    if (!factory)
-                        continue;
-                    const QRT::Result tag = TagOf(factory);
-                    if (tag < 100 || tag >= 100 + kReplacements)
-                        ++badTags;
-                    ++reads;
-                }
+                    if (const auto factory = MF::GetCutlistFactory())
+                    {
+                        const QRT::Result tag = TagOf(factory);
+                        badTags += tag < 100 || tag >= 100 + kReplacements;
+                        ++reads;
+                    }
             });
-
     for (int index = 0; index < kReplacements; ++index)
         MF::SetCutlistFactory(MakeFactory(100 + index));
     // Let every reader finish at least a few reads of the last factory.
@@ -206,26 +166,19 @@ TEST_F(CutlistFactoryTest, ConcurrentReadersSeeOnlyPublishedFactories)
     writing = false;
     for (std::thread& thread : readers)
         thread.join();
-
     EXPECT_EQ(badTags.load(), 0);
     EXPECT_EQ(TagOf(MF::GetCutlistFactory()), 100 + kReplacements - 1);
     EXPECT_EQ(sLiveFactories.load(), 1);
 }
 
-class InterfaceIdentifierTest : public ::testing::Test
-{
-};
+using InterfaceIdentifierTest = ::testing::Test;
 
-TEST_F(InterfaceIdentifierTest, FixedIdentifiersCrossTheBoundaryUnchanged)
+TEST_F(InterfaceIdentifierTest, FixedIdentifiersCrossTheBoundaryUnchangedAndAreDistinct)
 {
     EXPECT_EQ(MF::IRenderableNode::kIID, QRT::Guid("{d8f24158-f4f3-4749-8ab1-3b96d99b5d0d}"));
     EXPECT_EQ(MF::IRenderableCutlist::kIID, QRT::Guid("{36644276-d282-49eb-b213-cc82f80d62e1}"));
     EXPECT_EQ(MF::IRenderableCutlistProviderProperties::kIID,
               QRT::Guid("{dd0d9eea-2665-4332-af1b-8c9e56ece56d}"));
-}
-
-TEST_F(InterfaceIdentifierTest, EveryInterfaceHasItsOwnIdentifier)
-{
     const std::set<QRT::Guid> identifiers{MF::IRenderableNode::kIID,
                                           MF::IRenderableCutlist::kIID,
                                           MF::IRenderableExtendedStillInfo::kIID,

@@ -2,66 +2,46 @@
 
 #include "ContractExpect.h"
 
+#include <tuple>
+
 #include <gtest/gtest.h>
 
 namespace
 {
 
-using mvxmediatypes::kFieldType_LowerFirst;
-using mvxmediatypes::kFieldType_Progressive;
-using mvxmediatypes::kFieldType_UpperFirst;
-using mvxmediatypes::TickTime;
+using namespace mvxmediatypes;
 
-TickTime Ticks(std::int64_t inTicks)
+constexpr auto Ticks = &TickTime::TicksToTime;
+
+using FrameTimeTest = ::testing::Test;
+
+TEST_F(FrameTimeTest, FieldOrderFollowsWhichFieldIsEarlierAndTheEarlierIsTheFrameTime)
 {
-    return TickTime::TicksToTime(inTicks);
+    const std::tuple<MF::FrameTime, FieldType, std::int64_t, std::int64_t> cases[] = {
+        {MF::FrameTime(Ticks(1000), Ticks(1500)), kFieldType_UpperFirst, 1000, 1500},
+        {MF::FrameTime(Ticks(1500), Ticks(1000)), kFieldType_LowerFirst, 1000, 1500},
+        {MF::FrameTime(Ticks(-10), Ticks(-20)), kFieldType_LowerFirst, -20, -10},
+        {MF::FrameTime(Ticks(-700), Ticks(-700)), kFieldType_Progressive, -700, -700},
+        {MF::FrameTime(Ticks(-700)), kFieldType_Progressive, -700, -700},
+        {MF::FrameTime(), kFieldType_Progressive, 0, 0}};
+    for (const auto& [time, order, earlier, later] : cases)
+    {
+        SCOPED_TRACE(::testing::Message() << earlier << ", " << later);
+        EXPECT_EQ(time.GetFieldOrder(), order);
+        EXPECT_EQ(time.GetTime(), Ticks(earlier));
+        EXPECT_EQ(time.GetLaterTime(), Ticks(later));
+        EXPECT_EQ(time.IsProgressive(), order == kFieldType_Progressive);
+        EXPECT_EQ(time.IsInterlaced(), order != kFieldType_Progressive);
+        EXPECT_EQ(time.GetFieldTime(1), time.GetFirstFieldTime());
+        EXPECT_EQ(time.GetFieldTime(2), time.GetSecondFieldTime());
+    }
+    EXPECT_EQ(MF::FrameTime(Ticks(-700)), MF::FrameTime(Ticks(-700), Ticks(-700)));
+    const MF::FrameTime lower(Ticks(1500), Ticks(1000));
+    EXPECT_EQ(std::tuple(lower.GetFirstFieldTime(), lower.GetSecondFieldTime()),
+              std::tuple(Ticks(1500), Ticks(1000)));
 }
 
-class FrameTimeTest : public ::testing::Test
-{
-};
-
-TEST_F(FrameTimeTest, FirstEarlierIsUpperFirstAndEarlierIsFrameTime)
-{
-    const MF::FrameTime time(Ticks(1000), Ticks(1500));
-    EXPECT_EQ(time.GetFieldOrder(), kFieldType_UpperFirst);
-    EXPECT_EQ(time.GetTime(), Ticks(1000));
-    EXPECT_EQ(time.GetLaterTime(), Ticks(1500));
-    EXPECT_EQ(time.GetFirstFieldTime(), Ticks(1000));
-    EXPECT_EQ(time.GetSecondFieldTime(), Ticks(1500));
-    EXPECT_FALSE(time.IsProgressive());
-    EXPECT_TRUE(time.IsInterlaced());
-}
-
-TEST_F(FrameTimeTest, FirstLaterIsLowerFirstAndSecondIsFrameTime)
-{
-    const MF::FrameTime time(Ticks(1500), Ticks(1000));
-    EXPECT_EQ(time.GetFieldOrder(), kFieldType_LowerFirst);
-    EXPECT_EQ(time.GetTime(), Ticks(1000));
-    EXPECT_EQ(time.GetLaterTime(), Ticks(1500));
-    EXPECT_EQ(time.GetFieldTime(1), Ticks(1500));
-    EXPECT_EQ(time.GetFieldTime(2), Ticks(1000));
-}
-
-TEST_F(FrameTimeTest, EqualTimesAreProgressive)
-{
-    const MF::FrameTime single(Ticks(-700));
-    const MF::FrameTime pair(Ticks(-700), Ticks(-700));
-    EXPECT_EQ(single, pair);
-    EXPECT_EQ(single.GetFieldOrder(), kFieldType_Progressive);
-    EXPECT_TRUE(single.IsProgressive());
-    EXPECT_EQ(single.GetTime(), Ticks(-700));
-    EXPECT_EQ(MF::FrameTime().GetTime(), mvxmediatypes::kTime_Zero);
-}
-
-TEST_F(FrameTimeTest, NegativeTimesKeepTheOrderRule)
-{
-    const MF::FrameTime time(Ticks(-10), Ticks(-20));
-    EXPECT_EQ(time.GetFieldOrder(), kFieldType_LowerFirst);
-    EXPECT_EQ(time.GetTime(), Ticks(-20));
-}
-
-TEST_F(FrameTimeTest, SwappedExchangesOrderButNotFrameTime)
+TEST_F(FrameTimeTest, SwappedMakeAndSettersChangeTheOrder)
 {
     const MF::FrameTime time(Ticks(100), Ticks(150));
     const MF::FrameTime swapped = time.Swapped();
@@ -69,10 +49,7 @@ TEST_F(FrameTimeTest, SwappedExchangesOrderButNotFrameTime)
     EXPECT_EQ(swapped.GetTime(), time.GetTime());
     EXPECT_NE(swapped, time);
     EXPECT_EQ(swapped.Swapped(), time);
-}
 
-TEST_F(FrameTimeTest, MakeBuildsEachOrder)
-{
     const TickTime field = Ticks(11'771'760);
     EXPECT_EQ(MF::FrameTime::Make(Ticks(0), kFieldType_UpperFirst, field),
               MF::FrameTime(Ticks(0), field));
@@ -80,19 +57,16 @@ TEST_F(FrameTimeTest, MakeBuildsEachOrder)
               MF::FrameTime(field, Ticks(0)));
     EXPECT_EQ(MF::FrameTime::Make(Ticks(5), kFieldType_Progressive, field),
               MF::FrameTime(Ticks(5)));
-}
 
-TEST_F(FrameTimeTest, SettersChangeOrder)
-{
-    MF::FrameTime time(Ticks(10));
-    time.SetSecondFieldTime(Ticks(20));
-    EXPECT_EQ(time.GetFieldOrder(), kFieldType_UpperFirst);
-    time.SetFirstFieldTime(Ticks(30));
-    EXPECT_EQ(time.GetFieldOrder(), kFieldType_LowerFirst);
-    EXPECT_EQ(time.GetTime(), Ticks(20));
-    time.SetTime(Ticks(40));
-    EXPECT_TRUE(time.IsProgressive());
-    EXPECT_EQ(time.GetTime(), Ticks(40));
+    MF::FrameTime changed(Ticks(10));
+    changed.SetSecondFieldTime(Ticks(20));
+    EXPECT_EQ(changed.GetFieldOrder(), kFieldType_UpperFirst);
+    changed.SetFirstFieldTime(Ticks(30));
+    EXPECT_EQ(changed.GetFieldOrder(), kFieldType_LowerFirst);
+    EXPECT_EQ(changed.GetTime(), Ticks(20));
+    changed.SetTime(Ticks(40));
+    EXPECT_TRUE(changed.IsProgressive());
+    EXPECT_EQ(changed.GetTime(), Ticks(40));
 }
 
 TEST_F(FrameTimeTest, BadArgumentsBreakContracts)
@@ -101,11 +75,11 @@ TEST_F(FrameTimeTest, BadArgumentsBreakContracts)
     EXPECT_INPUT_CONTRACT(time.GetFieldTime(0), "inField == 1 || inField == 2");
     EXPECT_INPUT_CONTRACT(time.GetFieldTime(3), "inField == 1 || inField == 2");
     EXPECT_INPUT_CONTRACT(
-        MF::FrameTime::Make(Ticks(0), mvxmediatypes::kFieldType_AsSource, Ticks(1)),
+        MF::FrameTime::Make(Ticks(0), kFieldType_AsSource, Ticks(1)),
         "inOrder == mvxmediatypes::kFieldType_Progressive || mvxmediatypes::IsInterlaced(inOrder)");
     EXPECT_INPUT_CONTRACT(MF::FrameTime::Make(Ticks(0), kFieldType_UpperFirst, Ticks(0)),
                           "inFieldDuration > mvxmediatypes::kTime_Zero");
-    EXPECT_FALSE(MF::FrameTime(mvxmediatypes::kTime_Invalid, Ticks(0)).IsValid());
+    EXPECT_FALSE(MF::FrameTime(kTime_Invalid, Ticks(0)).IsValid());
 }
 
 } // namespace

@@ -1,5 +1,7 @@
 #include "MF/Keyframe.h"
 
+#include <iterator>
+
 #include <gtest/gtest.h>
 
 namespace
@@ -7,28 +9,29 @@ namespace
 
 using mvxmediatypes::TickTime;
 
-class KeyframeTest : public ::testing::Test
-{
-};
+using KeyframeTest = ::testing::Test;
 
 TEST_F(KeyframeTest, ValueKindsUseThePluginNumbers)
 {
     EXPECT_EQ(MF::GetKeyframeValueKind(MF::KeyframeValue{}), MF::kKeyframeValueKind_None);
-    EXPECT_EQ(MF::GetKeyframeValueKind(std::int8_t{-1}), 2);
-    EXPECT_EQ(MF::GetKeyframeValueKind(std::uint8_t{1}), 3);
-    EXPECT_EQ(MF::GetKeyframeValueKind(std::int16_t{1}), 4);
-    EXPECT_EQ(MF::GetKeyframeValueKind(std::uint16_t{1}), 5);
-    EXPECT_EQ(MF::GetKeyframeValueKind(std::int32_t{1}), 6);
-    EXPECT_EQ(MF::GetKeyframeValueKind(std::uint32_t{1}), 7);
-    EXPECT_EQ(MF::GetKeyframeValueKind(std::int64_t{1}), 8);
-    EXPECT_EQ(MF::GetKeyframeValueKind(std::uint64_t{1}), 9);
-    EXPECT_EQ(MF::GetKeyframeValueKind(1.0f), 10);
-    EXPECT_EQ(MF::GetKeyframeValueKind(1.0), 11);
-    EXPECT_EQ(MF::GetKeyframeValueKind(std::u16string(u"text")), 12);
-    EXPECT_EQ(MF::GetKeyframeValueKind(true), 13);
-    EXPECT_EQ(MF::GetKeyframeValueKind(QRT::Guid::CreateUnique()), 14);
-    EXPECT_EQ(MF::GetKeyframeValueKind(MF::BinaryData::FromText("x")), 15);
-    EXPECT_EQ(MF::GetKeyframeValueKind(MF::KeyframePoint{1.0, 2.0}), 16);
+    // The plug-in numbers run from 2 in this order.
+    const MF::KeyframeValue values[] = {std::int8_t{-1},
+                                        std::uint8_t{1},
+                                        std::int16_t{1},
+                                        std::uint16_t{1},
+                                        std::int32_t{1},
+                                        std::uint32_t{1},
+                                        std::int64_t{1},
+                                        std::uint64_t{1},
+                                        1.0f,
+                                        1.0,
+                                        std::u16string(u"text"),
+                                        true,
+                                        QRT::Guid::CreateUnique(),
+                                        MF::BinaryData::FromText("x"),
+                                        MF::KeyframePoint{1.0, 2.0}};
+    for (std::size_t index = 0; index < std::size(values); ++index)
+        EXPECT_EQ(MF::GetKeyframeValueKind(values[index]), int(index) + 2);
 }
 
 TEST_F(KeyframeTest, KeyframeKeepsTimeInterpolationAndValue)

@@ -5,82 +5,50 @@
 #include <cmath>
 #include <cstdint>
 #include <limits>
+#include <tuple>
 
 #include <gtest/gtest.h>
 
 namespace
 {
 
-using mvxmediatypes::PixelAspectRatio;
+using namespace mvxmediatypes;
 
-// Exact terms, not just an equal value.
-void ExpectTerms(const PixelAspectRatio& inRatio, std::uint32_t inNumerator,
-                 std::uint32_t inDenominator)
+std::tuple<std::uint32_t, std::uint32_t> Terms(const PixelAspectRatio& inRatio)
 {
-    EXPECT_EQ(inRatio.GetNumerator(), inNumerator);
-    EXPECT_EQ(inRatio.GetDenominator(), inDenominator);
+    return {inRatio.GetNumerator(), inRatio.GetDenominator()};
 }
 
-class PixelAspectRatioAdjustTest : public ::testing::Test
-{
-};
+using PixelAspectRatioAdjustTest = ::testing::Test;
 
-TEST_F(PixelAspectRatioAdjustTest, HalfTheColumnsDoublesTheRatio)
+TEST_F(PixelAspectRatioAdjustTest, RatioFollowsTheColumnAndRowFactorsInLowestTerms)
 {
-    ExpectTerms(MF::AdjustPixelAspectRatioForNonUniformDownsample(
-                    mvxmediatypes::kPixelAspectRatio_D1NTSC, 720, 480, 360, 480),
-                20, 11);
-}
-
-TEST_F(PixelAspectRatioAdjustTest, HalfTheRowsHalvesTheRatio)
-{
-    ExpectTerms(MF::AdjustPixelAspectRatioForNonUniformDownsample(
-                    mvxmediatypes::kPixelAspectRatio_D1NTSC, 720, 480, 720, 240),
-                5, 11);
-}
-
-TEST_F(PixelAspectRatioAdjustTest, UniformReductionKeepsTheRatioInLowestTerms)
-{
-    ExpectTerms(MF::AdjustPixelAspectRatioForNonUniformDownsample(
-                    mvxmediatypes::kPixelAspectRatio_D1NTSC, 720, 480, 360, 240),
-                10, 11);
-    ExpectTerms(MF::AdjustPixelAspectRatioForNonUniformDownsample(PixelAspectRatio(20, 22), 1920,
-                                                                  1080, 1920, 1080),
-                10, 11);
-}
-
-TEST_F(PixelAspectRatioAdjustTest, UnevenFactorsReduceExactly)
-{
-    // 1440x1080 anamorphic HD (4:3 pixels) delivered at 1920x1080: square.
-    ExpectTerms(MF::AdjustPixelAspectRatioForNonUniformDownsample(
-                    mvxmediatypes::kPixelAspectRatio_HD1440, 1440, 1080, 1920, 1080),
-                1, 1);
-    // 59:54 asked at 720x576, delivered at 704x573:
-    // 59 * 720 * 573 / (54 * 704 * 576) = 24,341,040 / 21,897,216 = 56,345 / 50,688.
-    const PixelAspectRatio ratio = MF::AdjustPixelAspectRatioForNonUniformDownsample(
-        mvxmediatypes::kPixelAspectRatio_D1PAL, 720, 576, 704, 573);
-    ExpectTerms(ratio, 56345, 50688);
-}
-
-TEST_F(PixelAspectRatioAdjustTest, AnyStaysAny)
-{
-    EXPECT_TRUE(MF::AdjustPixelAspectRatioForNonUniformDownsample(
-                    mvxmediatypes::kPixelAspectRatio_Any, 720, 480, 360, 480)
-                    .IsAny());
-}
-
-TEST_F(PixelAspectRatioAdjustTest, TermsBeyondThirtyTwoBitsGiveTheNearestFittingFraction)
-{
-    // Odd, and big - 2 is a prime that is not a multiple of 3.
     const std::uint32_t big = std::numeric_limits<std::uint32_t>::max() - 2;
     const std::int32_t maxSize = std::numeric_limits<std::int32_t>::max();
-    // big * maxSize / (1 * 1) does not fit; the nearest fitting fraction is
-    // the largest ratio there is.
-    ExpectTerms(MF::AdjustPixelAspectRatioForNonUniformDownsample(PixelAspectRatio(big, 1), maxSize,
-                                                                  1, 1, 1),
-                std::numeric_limits<std::uint32_t>::max(), 1);
-    // (big / (big - 2)) * (3 / 2): lowest terms 3 * big / (2 * (big - 2))
-    // overflow; the answer is within 1 / denominator^2 of the exact value.
+    // (ratio, requested width and height, delivered width and height, exact terms)
+    const std::tuple<PixelAspectRatio, int, int, int, int, std::uint32_t, std::uint32_t> cases[] = {
+        // Half the columns doubles the ratio, half the rows halves it.
+        {kPixelAspectRatio_D1NTSC, 720, 480, 360, 480, 20, 11},
+        {kPixelAspectRatio_D1NTSC, 720, 480, 720, 240, 5, 11},
+        {kPixelAspectRatio_D1NTSC, 720, 480, 360, 240, 10, 11},
+        {PixelAspectRatio(20, 22), 1920, 1080, 1920, 1080, 10, 11},
+        // 1440x1080 anamorphic HD (4:3 pixels) delivered at 1920x1080: square.
+        {kPixelAspectRatio_HD1440, 1440, 1080, 1920, 1080, 1, 1},
+        // 59 * 720 * 573 / (54 * 704 * 576) = 24,341,040 / 21,897,216 = 56,345 / 50,688.
+        {kPixelAspectRatio_D1PAL, 720, 576, 704, 573, 56345, 50688},
+        {kPixelAspectRatio_Any, 720, 480, 360, 480, 0, 0},
+        // big * maxSize does not fit: the nearest fitting fraction is the largest there is.
+        {PixelAspectRatio(big, 1), maxSize, 1, 1, 1, std::numeric_limits<std::uint32_t>::max(), 1}};
+    for (const auto& [ratio, requestedWidth, requestedHeight, width, height, numerator,
+                      denominator] : cases)
+        EXPECT_EQ(Terms(MF::AdjustPixelAspectRatioForNonUniformDownsample(
+                      ratio, requestedWidth, requestedHeight, width, height)),
+                  std::tuple(numerator, denominator))
+            << requestedWidth << "x" << requestedHeight << " to " << width << "x" << height;
+
+    // (big / (big - 2)) * (3 / 2) in lowest terms overflows (big is odd and
+    // big - 2 a prime that is no multiple of 3); the answer is within
+    // 1 / denominator^2 of the exact value.
     const PixelAspectRatio ratio = MF::AdjustPixelAspectRatioForNonUniformDownsample(
         PixelAspectRatio(big, big - 2), 3, 2, 1, 1);
     const long double exact = 3.0L * big / (2.0L * (big - 2));
@@ -92,10 +60,10 @@ TEST_F(PixelAspectRatioAdjustTest, TermsBeyondThirtyTwoBitsGiveTheNearestFitting
 TEST_F(PixelAspectRatioAdjustTest, BadSizesAndRatiosBreakContracts)
 {
     EXPECT_INPUT_CONTRACT(MF::AdjustPixelAspectRatioForNonUniformDownsample(
-                              mvxmediatypes::kPixelAspectRatio_Square, 0, 480, 720, 480),
+                              kPixelAspectRatio_Square, 0, 480, 720, 480),
                           "inRequestedWidth > 0 && inRequestedHeight > 0");
     EXPECT_INPUT_CONTRACT(MF::AdjustPixelAspectRatioForNonUniformDownsample(
-                              mvxmediatypes::kPixelAspectRatio_Square, 720, 480, 720, -1),
+                              kPixelAspectRatio_Square, 720, 480, 720, -1),
                           "inFrameWidth > 0 && inFrameHeight > 0");
     EXPECT_INPUT_CONTRACT(MF::AdjustPixelAspectRatioForNonUniformDownsample(PixelAspectRatio(1, 0),
                                                                             720, 480, 720, 480),

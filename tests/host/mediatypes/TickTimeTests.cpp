@@ -1,9 +1,12 @@
 #include "ContractExpect.h"
 #include "mvxmediatypes/TickTime.h"
 
+#include <algorithm>
 #include <cmath>
 #include <cstdint>
+#include <functional>
 #include <limits>
+#include <tuple>
 
 #include <gtest/gtest.h>
 
@@ -12,177 +15,122 @@ namespace mvxmediatypes
 namespace
 {
 
-using vrtest::ExpectInputContract;
-
 constexpr std::int64_t kInt64Max = std::numeric_limits<std::int64_t>::max();
 constexpr std::int64_t kInt64Min = std::numeric_limits<std::int64_t>::min();
+constexpr std::int64_t k25 = 28'224'000;   // ticks per frame at 25 fps
+constexpr std::int64_t k2997 = 23'543'520; // ticks per frame at 29.97 fps
+constexpr auto Ticks = &TickTime::TicksToTime;
 
-class TickTimeTest : public ::testing::Test
-{
-protected:
-    static TickTime Ticks(std::int64_t inTicks) { return TickTime::TicksToTime(inTicks); }
-
-    // Ticks of frame inFrame at inNumerator / inDenominator fps, computed from the
-    // tick rate alone (not through FrameRate).
-    static std::int64_t ExactFrameTicks(std::int64_t inFrame, std::int64_t inNumerator,
-                                        std::int64_t inDenominator)
-    {
-        const std::int64_t perFrameTimesNumerator = 705'600'000LL * inDenominator;
-        EXPECT_EQ(perFrameTimesNumerator % inNumerator, 0) << "rate not a whole number of ticks";
-        return inFrame * (perFrameTimesNumerator / inNumerator);
-    }
-};
+using TickTimeTest = ::testing::Test;
 
 TEST_F(TickTimeTest, ConstantsHaveTheirDocumentedTickCounts)
 {
     EXPECT_EQ(kTicksPerSecond, 705'600'000);
-    EXPECT_EQ(kTime_Zero.GetTicks(), 0);
-    EXPECT_EQ(kTime_Max.GetTicks(), kInt64Max);
-    EXPECT_EQ(kTime_Min.GetTicks(), -kInt64Max);
-    EXPECT_EQ(kTime_Invalid.GetTicks(), kInt64Min);
-    EXPECT_EQ(TickTime().GetTicks(), 0);
-    EXPECT_LT(kTime_Invalid, kTime_Min);
-    EXPECT_LT(kTime_Min, kTime_Zero);
-    EXPECT_LT(kTime_Zero, kTime_Max);
-    EXPECT_FALSE(kTime_Invalid.IsValid());
-    EXPECT_TRUE(kTime_Min.IsValid());
+    EXPECT_EQ(std::tuple(kTime_Zero.GetTicks(), TickTime().GetTicks(), kTime_Max.GetTicks()),
+              std::tuple(0, 0, kInt64Max));
+    EXPECT_EQ(std::tuple(kTime_Min.GetTicks(), kTime_Invalid.GetTicks()),
+              std::tuple(-kInt64Max, kInt64Min));
+    EXPECT_TRUE(kTime_Min.IsValid() && kTime_Invalid < kTime_Min && !kTime_Invalid.IsValid());
     EXPECT_EQ(sizeof(TickTime), 8u);
+}
+
+TEST_F(TickTimeTest, FrameOperationsFloorCeilAndSaturate)
+{
+    // Times belong to the frame that starts at or before them, also below zero.
+    const std::int64_t lastStart = kInt64Max - kInt64Max % k25;
+    ASSERT_NE(kInt64Max % k25, 0);
+    const std::tuple<FrameRate, std::int64_t, std::int64_t, std::int64_t, std::int64_t> cases[] = {
+        {kFrameRate_Video25, -1, -1, -k25, 0},
+        {kFrameRate_Video25, -k25, -1, -k25, -k25},
+        {kFrameRate_Video25, -k25 - 1, -2, -2 * k25, -k25},
+        {kFrameRate_Video25, k25 - 1, 0, 0, k25},
+        {kFrameRate_Video2997, 0, 0, 0, 0},
+        {kFrameRate_Video2997, 1, 0, 0, k2997},
+        {kFrameRate_Video2997, k2997, 1, k2997, k2997},
+        {kFrameRate_Video2997, k2997 + 1, 1, k2997, 2 * k2997},
+        // The frame starts beyond the ends are not representable: they saturate.
+        {kFrameRate_Video25, kInt64Max, kInt64Max / k25, lastStart, kInt64Max},
+        {kFrameRate_Video25, -kInt64Max, -(kInt64Max / k25) - 1, -kInt64Max, -lastStart}};
+    for (const auto& [rate, ticks, frame, floor, ceil] : cases)
+    {
+        SCOPED_TRACE(::testing::Message() << ticks << " at " << rate.GetTicksPerFrame());
+        EXPECT_EQ(Ticks(ticks).ToFrame64(rate), frame);
+        EXPECT_EQ(Ticks(ticks).ToFrame32(rate),
+                  std::clamp<std::int64_t>(frame, std::numeric_limits<std::int32_t>::min(),
+                                           std::numeric_limits<std::int32_t>::max()));
+        EXPECT_EQ(Ticks(ticks).AlignToFrame(rate).GetTicks(), floor);
+        EXPECT_EQ(Ticks(ticks).AlignToFrameCeil(rate).GetTicks(), ceil);
+    }
 }
 
 TEST_F(TickTimeTest, NtscFrameNumbersRoundTripExactlyOverLongSpans)
 {
-    struct Case
-    {
-        FrameRate rate;
-        std::int64_t numerator;
-        std::int64_t denominator;
-    };
-    const Case cases[] = {
+    const std::tuple<FrameRate, std::int64_t, std::int64_t> rates[] = {
         {kFrameRate_Video2997, 30000, 1001},
         {kFrameRate_Video2398, 24000, 1001},
-        {kFrameRate_Video5994, 60000, 1001},
-    };
-    for (const Case& c : cases)
-    {
-        for (const std::int64_t frame :
-             {std::int64_t{1'000'000}, std::int64_t{-1'000'000}, std::int64_t{123'456'789}})
+        {kFrameRate_Video5994, 60000, 1001}};
+    for (const auto& [rate, numerator, denominator] : rates)
+        for (const std::int64_t frame : {1'000'000LL, -1'000'000LL, 123'456'789LL})
         {
-            const std::int64_t ticks = ExactFrameTicks(frame, c.numerator, c.denominator);
-            const TickTime time = TickTime::FromFrame(frame, c.rate);
-            EXPECT_EQ(time.GetTicks(), ticks) << c.numerator << " frame " << frame;
-            EXPECT_EQ(c.rate.FrameToTime(frame), time);
-            EXPECT_EQ(time.ToFrame64(c.rate), frame);
-            EXPECT_EQ(Ticks(ticks - 1).ToFrame64(c.rate), frame - 1);
-            EXPECT_EQ(Ticks(ticks + 1).AlignToFrame(c.rate), time);
-            EXPECT_EQ(time.AlignToFrame(c.rate), time);
+            SCOPED_TRACE(::testing::Message() << numerator << " frame " << frame);
+            ASSERT_EQ(705'600'000LL * denominator % numerator, 0);
+            const std::int64_t ticks = frame * (705'600'000LL * denominator / numerator);
+            const TickTime time = TickTime::FromFrame(frame, rate);
+            EXPECT_EQ(time.GetTicks(), ticks);
+            EXPECT_EQ(rate.FrameToTime(frame), time);
+            EXPECT_EQ(time.ToFrame64(rate), frame);
+            EXPECT_EQ(Ticks(ticks - 1).ToFrame64(rate), frame - 1);
+            EXPECT_EQ(Ticks(ticks + 1).AlignToFrame(rate), time);
         }
-    }
     // Ten hours of 29.97 material: 36000 s x 30000 / 1001 = 1078921.08 frames.
     const TickTime tenHours = TickTime::FromSeconds(36000.0);
     EXPECT_EQ(tenHours.GetTicks(), 36000LL * 705'600'000LL);
     EXPECT_EQ(tenHours.ToFrame64(kFrameRate_Video2997), 36000LL * 30000 / 1001);
 }
 
-TEST_F(TickTimeTest, NegativeTimesBelongToTheEarlierFrame)
-{
-    const FrameRate rate = kFrameRate_Video25;
-    const std::int64_t frame = 28'224'000;
-    EXPECT_EQ(Ticks(-1).ToFrame64(rate), -1);
-    EXPECT_EQ(Ticks(-1).ToFrame32(rate), -1);
-    EXPECT_EQ(Ticks(-1).AlignToFrame(rate).GetTicks(), -frame);
-    EXPECT_EQ(Ticks(-frame).ToFrame64(rate), -1);
-    EXPECT_EQ(Ticks(-frame).AlignToFrame(rate).GetTicks(), -frame);
-    EXPECT_EQ(Ticks(-frame - 1).ToFrame64(rate), -2);
-    EXPECT_EQ(Ticks(-frame - 1).AlignToFrame(rate).GetTicks(), -2 * frame);
-    EXPECT_EQ(Ticks(frame - 1).ToFrame64(rate), 0);
-    EXPECT_EQ(Ticks(frame - 1).AlignToFrame(rate), kTime_Zero);
-}
-
-TEST_F(TickTimeTest, AlignToFrameCeilRoundsUpToTheNextFrameStart)
-{
-    const FrameRate rate = kFrameRate_Video2997;
-    const std::int64_t frame = 23'543'520;
-    EXPECT_EQ(kTime_Zero.AlignToFrameCeil(rate), kTime_Zero);
-    EXPECT_EQ(Ticks(1).AlignToFrameCeil(rate).GetTicks(), frame);
-    EXPECT_EQ(Ticks(frame).AlignToFrameCeil(rate).GetTicks(), frame);
-    EXPECT_EQ(Ticks(frame + 1).AlignToFrameCeil(rate).GetTicks(), 2 * frame);
-    EXPECT_EQ(Ticks(-1).AlignToFrameCeil(rate), kTime_Zero);
-    EXPECT_EQ(Ticks(-frame - 1).AlignToFrameCeil(rate).GetTicks(), -frame);
-}
-
-TEST_F(TickTimeTest, AlignmentSaturatesAtTheEndsOfTheRange)
-{
-    const FrameRate rate = kFrameRate_Video25;
-    ASSERT_NE(kInt64Max % 28'224'000, 0);
-    // The frame start below kTime_Min is not representable.
-    EXPECT_EQ(kTime_Min.AlignToFrame(rate), kTime_Min);
-    EXPECT_EQ(kTime_Max.AlignToFrameCeil(rate), kTime_Max);
-    EXPECT_EQ(kTime_Max.AlignToFrame(rate).GetTicks(), kInt64Max - kInt64Max % 28'224'000);
-    EXPECT_EQ(kTime_Max.ToFrame32(rate), std::numeric_limits<std::int32_t>::max());
-    EXPECT_EQ(kTime_Min.ToFrame32(rate), std::numeric_limits<std::int32_t>::min());
-    EXPECT_EQ(kTime_Max.ToFrame64(rate), kInt64Max / 28'224'000);
-}
-
-TEST_F(TickTimeTest, AddFramesMovesByWholeFramesAndSaturates)
-{
-    const FrameRate rate = kFrameRate_Video2997;
-    EXPECT_EQ(kTime_Zero.AddFrames(3, rate).GetTicks(), 3 * 23'543'520);
-    EXPECT_EQ(Ticks(5).AddFrames(-2, rate).GetTicks(), 5 - 2 * 23'543'520);
-    EXPECT_EQ(Ticks(7).AddFrames(0, rate).GetTicks(), 7);
-    EXPECT_EQ(kTime_Max.AddFrames(1, rate), kTime_Max);
-    EXPECT_EQ(kTime_Min.AddFrames(-1, rate), kTime_Min);
-    EXPECT_EQ(kTime_Zero.AddFrames(kInt64Max, rate), kTime_Max);
-    EXPECT_EQ(kTime_Zero.AddFrames(kInt64Min, rate), kTime_Min);
-    EXPECT_EQ(kTime_Invalid.AddFrames(1, rate), kTime_Invalid);
-}
-
 TEST_F(TickTimeTest, ArithmeticSaturatesAndKeepsInvalid)
 {
-    EXPECT_EQ((Ticks(5) + Ticks(7)).GetTicks(), 12);
-    EXPECT_EQ((Ticks(5) - Ticks(7)).GetTicks(), -2);
-    EXPECT_EQ((-Ticks(5)).GetTicks(), -5);
-    EXPECT_EQ((Ticks(5) * 3).GetTicks(), 15);
-    EXPECT_EQ((3 * Ticks(-5)).GetTicks(), -15);
-    EXPECT_EQ((Ticks(-7) / 2).GetTicks(), -3);
-
-    EXPECT_EQ(kTime_Max + Ticks(1), kTime_Max);
-    EXPECT_EQ(kTime_Min - Ticks(1), kTime_Min);
-    EXPECT_EQ(kTime_Min + kTime_Min, kTime_Min);
-    EXPECT_EQ(kTime_Max - kTime_Min, kTime_Max);
-    EXPECT_EQ(kTime_Max - kTime_Max, kTime_Zero);
-    EXPECT_EQ((kTime_Max - Ticks(1)).GetTicks(), kInt64Max - 1);
-    EXPECT_EQ(-kTime_Max, kTime_Min);
-    EXPECT_EQ(-kTime_Min, kTime_Max);
-    EXPECT_EQ(kTime_Max * 2, kTime_Max);
-    EXPECT_EQ(kTime_Max * -2, kTime_Min);
-    EXPECT_EQ(kTime_Min / -1, kTime_Max);
-    // -kTime_Max - 1 would be the invalid value; it must not appear as a sum.
-    EXPECT_EQ(kTime_Min + Ticks(-1), kTime_Min);
-    EXPECT_TRUE((kTime_Min - Ticks(1)).IsValid());
-
-    EXPECT_EQ(kTime_Invalid + Ticks(1), kTime_Invalid);
-    EXPECT_EQ(Ticks(1) - kTime_Invalid, kTime_Invalid);
-    EXPECT_EQ(-kTime_Invalid, kTime_Invalid);
-    EXPECT_EQ(kTime_Invalid * 2, kTime_Invalid);
-    EXPECT_EQ(kTime_Invalid / 2, kTime_Invalid);
-
     TickTime accumulated = Ticks(10);
     accumulated += Ticks(5);
     accumulated -= Ticks(3);
     accumulated *= 2;
     accumulated /= 4;
-    EXPECT_EQ(accumulated.GetTicks(), 6);
+    EXPECT_EQ(accumulated, Ticks(6));
+    EXPECT_EQ(std::tuple(Ticks(5) + Ticks(7), Ticks(5) - Ticks(7), -Ticks(5), Ticks(-7) / 2),
+              std::tuple(Ticks(12), Ticks(-2), Ticks(-5), Ticks(-3)));
+    EXPECT_EQ(std::tuple(Ticks(5) * 3, 3 * Ticks(-5)), std::tuple(Ticks(15), Ticks(-15)));
+    const FrameRate ntsc = kFrameRate_Video2997;
+    for (const TickTime max :
+         {kTime_Max + Ticks(1), kTime_Max - kTime_Min, -kTime_Min, kTime_Max * 2, kTime_Min / -1,
+          kTime_Max.AddFrames(1, ntsc), kTime_Zero.AddFrames(kInt64Max, ntsc)})
+        EXPECT_EQ(max.GetTicks(), kInt64Max);
+    // Never the invalid value -kTime_Max - 1.
+    for (const TickTime min :
+         {kTime_Min - Ticks(1), kTime_Min + Ticks(-1), -kTime_Max, kTime_Max * -2,
+          kTime_Min.AddFrames(-1, ntsc), kTime_Zero.AddFrames(kInt64Min, ntsc)})
+        EXPECT_EQ(min.GetTicks(), -kInt64Max);
+    EXPECT_EQ(kTime_Max - Ticks(1), Ticks(kInt64Max - 1));
+    EXPECT_EQ(kTime_Zero.AddFrames(3, ntsc), Ticks(3 * k2997));
+    EXPECT_EQ(Ticks(5).AddFrames(-2, ntsc), Ticks(5 - 2 * k2997));
+    const TickTime invalid = kTime_Invalid;
+    for (const TickTime result : {invalid + Ticks(1), Ticks(1) - invalid, -invalid, invalid * 2,
+                                  invalid / 2, invalid.AddFrames(1, ntsc)})
+        EXPECT_EQ(result.GetTicks(), kInt64Min);
 }
 
 TEST_F(TickTimeTest, SecondsConvertToTheNearestTick)
 {
-    EXPECT_EQ(TickTime::FromSeconds(1.0).GetTicks(), 705'600'000);
-    EXPECT_EQ(TickTime::FromSeconds(-0.5).GetTicks(), -352'800'000);
-    EXPECT_EQ(TickTime::FromSeconds(1001.0 / 30000.0).GetTicks(), 23'543'520);
-    EXPECT_EQ(TickTime::FromSeconds(1.0 / 48000.0).GetTicks(), 14'700);
-    EXPECT_EQ(TickTime::FromSeconds(1e300), kTime_Max);
-    EXPECT_EQ(TickTime::FromSeconds(-1e300), kTime_Min);
-    EXPECT_EQ(TickTime::FromSeconds(std::nan("")), kTime_Invalid);
+    const std::pair<double, TickTime> cases[] = {
+        {1.0, Ticks(705'600'000)},
+        {-0.5, Ticks(-352'800'000)},
+        {1001.0 / 30000.0, Ticks(k2997)},
+        {1.0 / 48000.0, Ticks(14'700)},
+        {1e300, kTime_Max},
+        {-1e300, kTime_Min},
+        {std::nan(""), kTime_Invalid},
+    };
+    for (const auto& [seconds, time] : cases)
+        EXPECT_EQ(TickTime::FromSeconds(seconds), time) << seconds;
     EXPECT_DOUBLE_EQ(Ticks(352'800'000).ToSeconds(), 0.5);
     EXPECT_DOUBLE_EQ(Ticks(-705'600'000 * 3LL).ToSeconds(), -3.0);
     EXPECT_TRUE(std::isnan(kTime_Invalid.ToSeconds()));
@@ -191,21 +139,17 @@ TEST_F(TickTimeTest, SecondsConvertToTheNearestTick)
 
 TEST_F(TickTimeTest, FrameOperationsRejectZeroRatesAndInvalidTimes)
 {
-    ExpectInputContract([] { (void)Ticks(1).ToFrame64(kFrameRate_Zero); },
-                        "inRate.GetTicksPerFrame() > 0");
-    ExpectInputContract([] { (void)Ticks(1).ToFrame32(kFrameRate_Zero); },
-                        "inRate.GetTicksPerFrame() > 0");
-    ExpectInputContract([] { (void)Ticks(1).AlignToFrame(kFrameRate_Zero); },
-                        "inRate.GetTicksPerFrame() > 0");
-    ExpectInputContract([] { (void)Ticks(1).AlignToFrameCeil(kFrameRate_Zero); },
-                        "inRate.GetTicksPerFrame() > 0");
-    ExpectInputContract([] { (void)Ticks(1).AddFrames(1, kFrameRate_Zero); },
-                        "inRate.GetTicksPerFrame() > 0");
-    ExpectInputContract([] { (void)TickTime::FromFrame(1, kFrameRate_Zero); },
-                        "inRate.GetTicksPerFrame() > 0");
-    ExpectInputContract([] { (void)kTime_Invalid.ToFrame64(kFrameRate_Video25); }, "IsValid()");
-    ExpectInputContract([] { (void)kTime_Invalid.AlignToFrame(kFrameRate_Video25); }, "IsValid()");
-    ExpectInputContract([] { (void)(Ticks(1) / 0); }, "inDivisor != 0");
+    const FrameRate zero = kFrameRate_Zero;
+    const std::function<void()> zeroRateCalls[] = {
+        [&] { (void)Ticks(1).ToFrame64(zero); },        [&] { (void)Ticks(1).ToFrame32(zero); },
+        [&] { (void)Ticks(1).AlignToFrame(zero); },     [&] { (void)Ticks(1).AddFrames(1, zero); },
+        [&] { (void)Ticks(1).AlignToFrameCeil(zero); }, [&] { (void)TickTime::FromFrame(1, zero); },
+    };
+    for (const auto& call : zeroRateCalls)
+        vrtest::ExpectInputContract(call, "inRate.GetTicksPerFrame() > 0");
+    EXPECT_INPUT_CONTRACT((void)kTime_Invalid.ToFrame64(kFrameRate_Video25), "IsValid()");
+    EXPECT_INPUT_CONTRACT((void)kTime_Invalid.AlignToFrame(kFrameRate_Video25), "IsValid()");
+    EXPECT_INPUT_CONTRACT((void)(Ticks(1) / 0), "inDivisor != 0");
 }
 
 } // namespace

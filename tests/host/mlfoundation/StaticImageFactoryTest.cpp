@@ -36,11 +36,7 @@ bool EveryPixelIs(const Frame& inFrame, uint32_t inColor)
     return true;
 }
 
-class StaticImageFactoryTest : public ::testing::Test
-{
-};
-
-TEST_F(StaticImageFactoryTest, ColorBarsAtAnOddSize)
+TEST(StaticImageFactoryTest, ColorBarsAtAnOddSize)
 {
     const Frame bars = Load(ML::kStaticImage_ColorBars, 71, 9);
     ASSERT_TRUE(bars);
@@ -56,14 +52,16 @@ TEST_F(StaticImageFactoryTest, ColorBarsAtAnOddSize)
     }
 }
 
-TEST_F(StaticImageFactoryTest, PlainPicturesAreExact)
+TEST(StaticImageFactoryTest, PlainPicturesAndTinySlatesAreOneExactColour)
 {
     EXPECT_TRUE(EveryPixelIs(Load(ML::kStaticImage_Black, 13, 7), 0xFF000000));
     EXPECT_TRUE(EveryPixelIs(Load(ML::kStaticImage_White, 13, 7), 0xFFFFFFFF));
     EXPECT_TRUE(EveryPixelIs(Load(ML::kStaticImage_MidGrey, 1, 1), 0xFF808080));
+    // A slate too small for its text shows the background only.
+    EXPECT_TRUE(EveryPixelIs(Load(ML::kStaticImage_MediaPending, 9, 5), 0xFF102A6E));
 }
 
-TEST_F(StaticImageFactoryTest, SlatesShowTheirBackgroundAndText)
+TEST(StaticImageFactoryTest, SlatesShowTheirBackgroundAndText)
 {
     const Frame offline = Load(ML::kStaticImage_MediaOffline, 320, 180);
     const Frame pending = Load(ML::kStaticImage_MediaPending, 320, 180);
@@ -86,12 +84,7 @@ TEST_F(StaticImageFactoryTest, SlatesShowTheirBackgroundAndText)
     EXPECT_EQ(ColorAt(pending, seventhLeft, 79), 0xFFFFFFFFu);
 }
 
-TEST_F(StaticImageFactoryTest, TinySlateIsBackgroundOnly)
-{
-    EXPECT_TRUE(EveryPixelIs(Load(ML::kStaticImage_MediaPending, 9, 5), 0xFF102A6E));
-}
-
-TEST_F(StaticImageFactoryTest, OtherFormatsAreConverted)
+TEST(StaticImageFactoryTest, OtherFormatsAreConverted)
 {
     const Frame grey = Load(ML::kStaticImage_MidGrey, 3, 3, mt::kPixelFormat_BGRA_4444_32f);
     ASSERT_TRUE(grey);
@@ -110,7 +103,7 @@ TEST_F(StaticImageFactoryTest, OtherFormatsAreConverted)
     EXPECT_EQ(withRatio->GetPixelAspectRatio(), mt::kPixelAspectRatio_D1PAL);
 }
 
-TEST_F(StaticImageFactoryTest, BadRequestsAnswerNothing)
+TEST(StaticImageFactoryTest, BadRequestsAnswerNothing)
 {
     EXPECT_FALSE(Load(0, 8, 8));
     EXPECT_FALSE(Load(7, 8, 8));

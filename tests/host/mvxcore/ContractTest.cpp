@@ -2,6 +2,8 @@
 
 #include "mvxcore/config/Error.h"
 
+#include <functional>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -43,24 +45,17 @@ int AssertThenContinue(int inValue)
 
 bool EndsWith(const std::string& inText, const std::string& inEnd)
 {
-    return inText.size() >= inEnd.size() &&
-           inText.compare(inText.size() - inEnd.size(), inEnd.size(), inEnd) == 0;
+    return inText.ends_with(inEnd);
 }
 
 // Records every contract dialog and assertion report with copies of their texts.
 class ContractTest : public ::testing::Test
 {
 protected:
-    struct SeenContract
+    struct Seen
     {
         ContractKind kind;
         std::string expression;
-        std::string file;
-        int line;
-    };
-    struct SeenAssert
-    {
-        std::string condition;
         std::string message;
         std::string file;
         int line;
@@ -71,14 +66,14 @@ protected:
         mvxcore::debug::SetContractDialogHook(
             [this](const ContractFailure& inFailure)
             {
-                mContracts.push_back({inFailure.kind, std::string(inFailure.expression),
+                mContracts.push_back({inFailure.kind, std::string(inFailure.expression), "",
                                       std::string(inFailure.file), inFailure.line});
                 return mAnswerBreak;
             });
         mvxcore::debug::SetAssertHook(
             [this](const AssertFailure& inFailure)
             {
-                mAsserts.push_back({std::string(inFailure.condition),
+                mAsserts.push_back({ContractKind::kInput, std::string(inFailure.condition),
                                     std::string(inFailure.message), std::string(inFailure.file),
                                     inFailure.line});
             });
@@ -91,72 +86,73 @@ protected:
     }
 
     bool mAnswerBreak = false;
-    std::vector<SeenContract> mContracts;
-    std::vector<SeenAssert> mAsserts;
+    std::vector<Seen> mContracts;
+    std::vector<Seen> mAsserts;
 };
 
-TEST_F(ContractTest, InputViolationThrowsLevelZeroError105Of25WithExpressionAndPlace)
+TEST_F(ContractTest, ViolationThrowsLevelZeroError105WithItsTextsAndPlaceAndCallsTheDialogOnce)
 {
-    try
+    const struct
     {
-        RequirePositive(-3);
-        FAIL() << "the input contract let -3 through";
-    }
-    catch (const Error& inError)
+        std::function<void()> violate;
+        ContractKind kind;
+        int minor;
+        const char* message;
+        const char* expression;
+        const int* line;
+    } cases[] = {
+        {[] { RequirePositive(-3); }, ContractKind::kInput, 25,
+         "$$$/mvxcore/utility/Error/Contract/InputContractViolation=An input contract violation "
+         "has occurred!",
+         "inValue > 0", &sInputCheckLine},
+        {[] { ProduceEven(4); }, ContractKind::kOutput, 26,
+         "$$$/mvxcore/utility/Error/Contract/OutputContractViolation=An output contract "
+         "violation has occurred!",
+         "result % 2 == 0", &sOutputCheckLine},
+    };
+    for (const auto& c : cases)
     {
-        EXPECT_EQ(inError.GetLevel(), 0);
-        EXPECT_EQ(inError.GetMajor(), 105);
-        EXPECT_EQ(inError.GetMinor(), 25);
-        EXPECT_EQ(inError.GetMessage(), "$$$/mvxcore/utility/Error/Contract/"
-                                        "InputContractViolation=An input contract violation has "
-                                        "occurred!");
-        EXPECT_EQ(inError.GetExpression(), "inValue > 0");
-        EXPECT_TRUE(EndsWith(inError.GetFile(), "ContractTest.cpp")) << inError.GetFile();
-        EXPECT_EQ(inError.GetLine(), sInputCheckLine);
-        EXPECT_NE(std::string(inError.what()).find("inValue > 0"), std::string::npos);
+        SCOPED_TRACE(c.expression);
+        mContracts.clear();
+        std::optional<Error> error;
+        try
+        {
+            c.violate();
+        }
+        catch (const Error& inError)
+        {
+            error = inError;
+        }
+        ASSERT_TRUE(error) << "the contract let the value through";
+        EXPECT_EQ(error->GetLevel(), 0);
+        EXPECT_EQ(error->GetMajor(), 105);
+        EXPECT_EQ(error->GetMinor(), c.minor);
+        EXPECT_EQ(error->GetMessage(), c.message);
+        EXPECT_EQ(error->GetExpression(), c.expression);
+        EXPECT_TRUE(EndsWith(error->GetFile(), "ContractTest.cpp")) << error->GetFile();
+        EXPECT_EQ(error->GetLine(), *c.line);
+        EXPECT_NE(std::string(error->what()).find(c.expression), std::string::npos);
+        ASSERT_EQ(mContracts.size(), 1u);
+        EXPECT_EQ(mContracts[0].kind, c.kind);
+        EXPECT_EQ(mContracts[0].expression, c.expression);
+        EXPECT_TRUE(EndsWith(mContracts[0].file, "ContractTest.cpp"));
+        EXPECT_EQ(mContracts[0].line, *c.line);
     }
+    EXPECT_TRUE(mAsserts.empty());
 }
 
-TEST_F(ContractTest, OutputViolationThrowsLevelZeroError105Of26WithExpressionAndPlace)
-{
-    try
-    {
-        ProduceEven(4);
-        FAIL() << "the output contract let an odd result through";
-    }
-    catch (const Error& inError)
-    {
-        EXPECT_EQ(inError.GetLevel(), 0);
-        EXPECT_EQ(inError.GetMajor(), 105);
-        EXPECT_EQ(inError.GetMinor(), 26);
-        EXPECT_EQ(inError.GetMessage(), "$$$/mvxcore/utility/Error/Contract/"
-                                        "OutputContractViolation=An output contract violation has "
-                                        "occurred!");
-        EXPECT_EQ(inError.GetExpression(), "result % 2 == 0");
-        EXPECT_EQ(inError.GetLine(), sOutputCheckLine);
-    }
-}
-
-TEST_F(ContractTest, DialogHookReceivesEachFailureOnce)
-{
-    EXPECT_THROW(RequirePositive(0), Error);
-    EXPECT_THROW(ProduceEven(1), Error);
-    ASSERT_EQ(mContracts.size(), 2u);
-    EXPECT_EQ(mContracts[0].kind, ContractKind::kInput);
-    EXPECT_EQ(mContracts[0].expression, "inValue > 0");
-    EXPECT_TRUE(EndsWith(mContracts[0].file, "ContractTest.cpp"));
-    EXPECT_EQ(mContracts[0].line, sInputCheckLine);
-    EXPECT_EQ(mContracts[1].kind, ContractKind::kOutput);
-    EXPECT_EQ(mContracts[1].expression, "result % 2 == 0");
-    EXPECT_EQ(mContracts[1].line, sOutputCheckLine);
-}
-
-TEST_F(ContractTest, PassingChecksCallNoHook)
+TEST_F(ContractTest, AssertionReportsThroughTheHookAndContinuesAndPassingChecksCallNoHook)
 {
     EXPECT_EQ(RequirePositive(7), 7);
     EXPECT_EQ(AssertThenContinue(3), 4);
-    EXPECT_TRUE(mContracts.empty());
     EXPECT_TRUE(mAsserts.empty());
+    EXPECT_EQ(AssertThenContinue(12), 13);
+    ASSERT_EQ(mAsserts.size(), 1u);
+    EXPECT_EQ(mAsserts[0].expression, "inValue < 10");
+    EXPECT_EQ(mAsserts[0].message, "values stay below ten");
+    EXPECT_TRUE(EndsWith(mAsserts[0].file, "ContractTest.cpp"));
+    EXPECT_EQ(mAsserts[0].line, sAssertLine);
+    EXPECT_TRUE(mContracts.empty());
 }
 
 TEST_F(ContractTest, DialogAskingToBreakDoesNotTrapWithoutDebugger)
@@ -170,26 +166,11 @@ TEST_F(ContractTest, DialogAskingToBreakDoesNotTrapWithoutDebugger)
     EXPECT_EQ(mContracts.size(), 1u);
 }
 
-TEST_F(ContractTest, AssertionReportsThroughTheHookAndContinues)
-{
-    EXPECT_EQ(AssertThenContinue(12), 13);
-    ASSERT_EQ(mAsserts.size(), 1u);
-    EXPECT_EQ(mAsserts[0].condition, "inValue < 10");
-    EXPECT_EQ(mAsserts[0].message, "values stay below ten");
-    EXPECT_TRUE(EndsWith(mAsserts[0].file, "ContractTest.cpp"));
-    EXPECT_EQ(mAsserts[0].line, sAssertLine);
-    EXPECT_TRUE(mContracts.empty());
-}
-
 TEST_F(ContractTest, ReplacingAHookAnswersThePreviousOne)
 {
     int calls = 0;
-    const auto previous = mvxcore::debug::SetContractDialogHook(
-        [&](const ContractFailure&)
-        {
-            ++calls;
-            return false;
-        });
+    const auto previous =
+        mvxcore::debug::SetContractDialogHook([&](const ContractFailure&) { return ++calls < 0; });
     ASSERT_TRUE(previous);
     EXPECT_THROW(RequirePositive(-1), Error);
     EXPECT_EQ(calls, 1);

@@ -1,6 +1,6 @@
 #include "mvxcore/debug/DebugDatabase.h"
 
-#include "mvxcore/config/Error.h"
+#include "ContractExpect.h"
 
 #include <atomic>
 #include <cstdlib>
@@ -26,29 +26,26 @@ protected:
     }
 };
 
-TEST_F(DebugDatabaseTest, SwitchIsOnOnlyForExactlyTrue)
+TEST_F(DebugDatabaseTest, SwitchIsOnOnlyForExactlyTrueAndClearRemovesOnlyThatSwitch)
 {
     EXPECT_FALSE(DebugDatabase::GetBool("CompareMediaNodeRenderers"));
     EXPECT_EQ(DebugDatabase::GetValue("CompareMediaNodeRenderers"), std::nullopt);
-    DebugDatabase::SetValue("CompareMediaNodeRenderers", "true");
-    EXPECT_TRUE(DebugDatabase::GetBool("CompareMediaNodeRenderers"));
     for (const char* text : {"TRUE", "True", "1", "yes", "true ", "", "false"})
     {
         DebugDatabase::SetValue("CompareMediaNodeRenderers", text);
         EXPECT_FALSE(DebugDatabase::GetBool("CompareMediaNodeRenderers")) << '"' << text << '"';
         EXPECT_EQ(DebugDatabase::GetValue("CompareMediaNodeRenderers"), std::string(text));
     }
-}
-
-TEST_F(DebugDatabaseTest, ClearRemovesOnlyThatSwitch)
-{
     DebugDatabase::SetValue("CompareMediaNodeRenderers", "true");
     DebugDatabase::SetValue("DisableNewMediaNodeRenderer", "true");
+    EXPECT_TRUE(DebugDatabase::GetBool("CompareMediaNodeRenderers"));
     DebugDatabase::Clear("CompareMediaNodeRenderers");
     DebugDatabase::Clear("NeverSet");
     EXPECT_FALSE(DebugDatabase::GetBool("CompareMediaNodeRenderers"));
     EXPECT_EQ(DebugDatabase::GetValue("CompareMediaNodeRenderers"), std::nullopt);
     EXPECT_TRUE(DebugDatabase::GetBool("DisableNewMediaNodeRenderer"));
+    EXPECT_INPUT_CONTRACT(DebugDatabase::SetValue("", "true"), "!inName.empty()");
+    EXPECT_EQ(DebugDatabase::GetValue(""), std::nullopt);
 }
 
 TEST_F(DebugDatabaseTest, ListEntriesAreTrimmedAndMalformedOnesSkipped)
@@ -69,27 +66,11 @@ TEST_F(DebugDatabaseTest, EnvironmentReplacesEveryValue)
            "CompareMediaNodeRenderers=true,DisableNewMediaNodeRenderer=false,broken", 1);
     EXPECT_EQ(DebugDatabase::LoadFromEnvironment(), 1u);
     EXPECT_TRUE(DebugDatabase::GetBool("CompareMediaNodeRenderers"));
-    EXPECT_FALSE(DebugDatabase::GetBool("DisableNewMediaNodeRenderer"));
     EXPECT_EQ(DebugDatabase::GetValue("DisableNewMediaNodeRenderer"), "false");
     EXPECT_EQ(DebugDatabase::GetValue("Stale"), std::nullopt);
-
     unsetenv(mvxcore::debug::kDebugEnvironmentVariable);
     EXPECT_EQ(DebugDatabase::LoadFromEnvironment(), 0u);
     EXPECT_FALSE(DebugDatabase::GetBool("CompareMediaNodeRenderers"));
-}
-
-TEST_F(DebugDatabaseTest, EmptyNameIsAnInputContractError)
-{
-    try
-    {
-        DebugDatabase::SetValue("", "true");
-        FAIL() << "a switch without a name was stored";
-    }
-    catch (const mvxcore::config::Error& inError)
-    {
-        EXPECT_EQ(inError.GetExpression(), "!inName.empty()");
-    }
-    EXPECT_EQ(DebugDatabase::GetValue(""), std::nullopt);
 }
 
 TEST_F(DebugDatabaseTest, ReadersOnOtherThreadsSeeOnlyWholeValues)

@@ -1,10 +1,8 @@
 #pragma once
 
-// Helpers for the executor suites: a counting signal to wait for tasks, a
-// gate that holds tasks back, and an object that counts its live copies so
-// the suites can see when a task's captures are destroyed. Waits have a long
-// deadline only so that a broken executor fails the suite instead of hanging
-// it; no assertion depends on how fast anything runs.
+// Helpers for the executor suites. Waits have a long deadline only so that a
+// broken executor fails the suite instead of hanging it; no assertion depends
+// on how fast anything runs.
 
 #include <atomic>
 #include <chrono>
@@ -17,7 +15,9 @@ namespace mvxcore::testing
 
 inline constexpr std::chrono::seconds kHangGuard{30};
 
-// Counts notifications; waiters block until the count reaches a value.
+// Counts notifications; waiters block until the count reaches a value. With
+// one Notify it is a gate that tasks wait at; n tasks that each Notify and
+// then wait for n meet only when the executor runs n of them at once.
 class CountingSignal
 {
 public:
@@ -37,10 +37,11 @@ public:
         return mCondition.wait_for(lock, kHangGuard, [&] { return mCount >= inCount; });
     }
 
-    int Count()
+    // Notify, then wait until inCount notifications arrived.
+    bool Meet(int inCount)
     {
-        std::lock_guard lock(mMutex);
-        return mCount;
+        Notify();
+        return WaitFor(inCount);
     }
 
 private:
@@ -49,75 +50,17 @@ private:
     int mCount = 0;
 };
 
-// Closed until Open; tasks that Pass wait for it.
-class Gate
+// A capture whose destruction is counted: inLive is raised now and lowered
+// when the last copy of the answer goes.
+inline std::shared_ptr<int> Tracked(std::atomic<int>& inLive)
 {
-public:
-    void Open()
-    {
-        std::lock_guard lock(mMutex);
-        mOpen = true;
-        mCondition.notify_all();
-    }
-
-    bool Pass()
-    {
-        std::unique_lock lock(mMutex);
-        return mCondition.wait_for(lock, kHangGuard, [&] { return mOpen; });
-    }
-
-private:
-    std::mutex mMutex; // guards mOpen
-    std::condition_variable mCondition;
-    bool mOpen = false;
-};
-
-// A capture whose destruction is counted: Tracked::Make() hands out a shared
-// object that lowers the live count when its last copy goes.
-class Tracked
-{
-public:
-    explicit Tracked(std::atomic<int>& inLive)
-        : mLive(inLive)
-    {
-        ++mLive;
-    }
-    ~Tracked() { --mLive; }
-    Tracked(const Tracked&) = delete;
-    Tracked& operator=(const Tracked&) = delete;
-
-    static std::shared_ptr<Tracked> Make(std::atomic<int>& inLive)
-    {
-        return std::make_shared<Tracked>(inLive);
-    }
-
-private:
-    std::atomic<int>& mLive;
-};
-
-// n tasks that each wait until all n have arrived: they can only all pass
-// when the executor runs n of them at once.
-class Rendezvous
-{
-public:
-    explicit Rendezvous(int inCount)
-        : mExpected(inCount)
-    {
-    }
-
-    bool Arrive()
-    {
-        std::unique_lock lock(mMutex);
-        ++mArrived;
-        mCondition.notify_all();
-        return mCondition.wait_for(lock, kHangGuard, [&] { return mArrived >= mExpected; });
-    }
-
-private:
-    std::mutex mMutex; // guards mArrived
-    std::condition_variable mCondition;
-    const int mExpected;
-    int mArrived = 0;
-};
+    ++inLive;
+    return std::shared_ptr<int>(new int(0),
+                                [&inLive](int* inValue)
+                                {
+                                    delete inValue;
+                                    --inLive;
+                                });
+}
 
 } // namespace mvxcore::testing

@@ -11,77 +11,74 @@ using mvxcore::utility::AsciiToUTF16;
 using mvxcore::utility::UTF16to8;
 using mvxcore::utility::UTF8to16;
 
-const std::string kReplacement8 = "\xEF\xBF\xBD";
-constexpr char16_t kReplacement16 = u'\xFFFD';
+const std::string kR8 = "\xEF\xBF\xBD";
+constexpr char16_t kR = u'\xFFFD';
 
-class StringsTest : public ::testing::Test
+TEST(StringsTest, WellFormedTextConvertsBothWays)
 {
-};
-
-TEST_F(StringsTest, ConvertsAsciiBothWaysUnchanged)
-{
-    EXPECT_EQ(UTF16to8(u"RenderFrame 42"), "RenderFrame 42");
-    EXPECT_EQ(UTF8to16("RenderFrame 42"), u"RenderFrame 42");
-    EXPECT_EQ(UTF16to8(u""), "");
-    EXPECT_EQ(UTF8to16(""), u"");
-    // An embedded zero is a character like any other.
-    EXPECT_EQ(UTF8to16(std::string("a\0b", 3)), std::u16string(u"a\0b", 3));
+    const struct
+    {
+        std::u16string utf16;
+        std::string utf8;
+    } cases[] = {
+        {u"RenderFrame 42", "RenderFrame 42"},
+        {u"", ""},
+        // An embedded zero is a character like any other.
+        {std::u16string(u"a\0b", 3), std::string("a\0b", 3)},
+        {u"\u00E9\u20AC", "\xC3\xA9\xE2\x82\xAC"},
+        {u"\u07FF\u0800\uFFFF", "\xDF\xBF\xE0\xA0\x80\xEF\xBF\xBF"},
+        {{0xD83D, 0xDE00}, "\xF0\x9F\x98\x80"},
+        {{0xDBFF, 0xDFFF}, "\xF4\x8F\xBF\xBF"},
+        {{0xD800, 0xDC00}, "\xF0\x90\x80\x80"},
+    };
+    for (const auto& c : cases)
+    {
+        EXPECT_EQ(UTF16to8(c.utf16), c.utf8);
+        EXPECT_EQ(UTF8to16(c.utf8), c.utf16) << c.utf8;
+    }
 }
 
-TEST_F(StringsTest, ConvertsTwoAndThreeByteSequences)
+TEST(StringsTest, UnpairedSurrogatesAreReplaced)
 {
-    EXPECT_EQ(UTF16to8(u"\u00E9\u20AC"), "\xC3\xA9\xE2\x82\xAC");
-    EXPECT_EQ(UTF8to16("\xC3\xA9\xE2\x82\xAC"), u"\u00E9\u20AC");
-    EXPECT_EQ(UTF16to8(u"\u07FF\u0800\uFFFF"), "\xDF\xBF\xE0\xA0\x80\xEF\xBF\xBF");
-}
-
-TEST_F(StringsTest, ConvertsSurrogatePairsToFourByteSequencesAndBack)
-{
-    const std::u16string grinning = {0xD83D, 0xDE00};
-    EXPECT_EQ(UTF16to8(grinning), "\xF0\x9F\x98\x80");
-    EXPECT_EQ(UTF8to16("\xF0\x9F\x98\x80"), grinning);
-    const std::u16string highest = {0xDBFF, 0xDFFF};
-    EXPECT_EQ(UTF16to8(highest), "\xF4\x8F\xBF\xBF");
-    EXPECT_EQ(UTF8to16("\xF4\x8F\xBF\xBF"), highest);
-    const std::u16string lowest = {0xD800, 0xDC00};
-    EXPECT_EQ(UTF8to16("\xF0\x90\x80\x80"), lowest);
-}
-
-TEST_F(StringsTest, ReplacesUnpairedSurrogates)
-{
-    EXPECT_EQ(UTF16to8(std::u16string{u'a', 0xD83D}), "a" + kReplacement8);
-    EXPECT_EQ(UTF16to8(std::u16string{0xDE00, u'b'}), kReplacement8 + "b");
-    EXPECT_EQ(UTF16to8(std::u16string{0xD83D, u'c'}), kReplacement8 + "c");
+    EXPECT_EQ(UTF16to8(std::u16string{u'a', 0xD83D}), "a" + kR8);
+    EXPECT_EQ(UTF16to8(std::u16string{0xDE00, u'b'}), kR8 + "b");
+    EXPECT_EQ(UTF16to8(std::u16string{0xD83D, u'c'}), kR8 + "c");
     // Reversed order is two lone surrogates.
-    EXPECT_EQ(UTF16to8(std::u16string{0xDE00, 0xD83D}), kReplacement8 + kReplacement8);
-    EXPECT_EQ(UTF16to8(std::u16string{0xD83D, 0xD83D, 0xDE00}), kReplacement8 + "\xF0\x9F\x98\x80");
+    EXPECT_EQ(UTF16to8(std::u16string{0xDE00, 0xD83D}), kR8 + kR8);
+    EXPECT_EQ(UTF16to8(std::u16string{0xD83D, 0xD83D, 0xDE00}), kR8 + "\xF0\x9F\x98\x80");
 }
 
-TEST_F(StringsTest, ReplacesEachMaximalIllFormedUTF8Subsequence)
+TEST(StringsTest, EachMaximalIllFormedUTF8SubsequenceIsReplacedOnce)
 {
-    const char16_t r = kReplacement16;
-    // Lone continuation bytes and bytes that never start a sequence.
-    EXPECT_EQ(UTF8to16("\x80"), std::u16string({r}));
-    EXPECT_EQ(UTF8to16("\xF5\xFF"), std::u16string({r, r}));
-    // Overlong forms.
-    EXPECT_EQ(UTF8to16("\xC0\xAF"), std::u16string({r, r}));
-    EXPECT_EQ(UTF8to16("\xE0\x80\xAF"), std::u16string({r, r, r}));
-    EXPECT_EQ(UTF8to16("\xF0\x80\x80\xAF"), std::u16string({r, r, r, r}));
-    // Encoded surrogates and values above U+10FFFF.
-    EXPECT_EQ(UTF8to16("\xED\xA0\x80"), std::u16string({r, r, r}));
-    EXPECT_EQ(UTF8to16("\xF4\x90\x80\x80"), std::u16string({r, r, r, r}));
-    // Cut-off sequences become one replacement each.
-    EXPECT_EQ(UTF8to16("\xE2\x82"), std::u16string({r}));
-    EXPECT_EQ(UTF8to16("\xE2\x82"
-                       "A"),
-              std::u16string({r, u'A'}));
-    EXPECT_EQ(UTF8to16("\xF0\x9F\x98"), std::u16string({r}));
-    // The mixed example of the Unicode standard's recommended practice.
-    EXPECT_EQ(UTF8to16("\x61\xF1\x80\x80\xE1\x80\xC2\x62\x80\x63\x80\xBF\x64"),
-              std::u16string({u'a', r, r, r, u'b', r, u'c', r, r, u'd'}));
+    const struct
+    {
+        const char* utf8;
+        std::u16string utf16;
+    } cases[] = {
+        // Lone continuation bytes and bytes that never start a sequence.
+        {"\x80", {kR}},
+        {"\xF5\xFF", {kR, kR}},
+        // Overlong forms, encoded surrogates and values above U+10FFFF.
+        {"\xC0\xAF", {kR, kR}},
+        {"\xE0\x80\xAF", {kR, kR, kR}},
+        {"\xF0\x80\x80\xAF", {kR, kR, kR, kR}},
+        {"\xED\xA0\x80", {kR, kR, kR}},
+        {"\xF4\x90\x80\x80", {kR, kR, kR, kR}},
+        // Cut-off sequences become one replacement each.
+        {"\xE2\x82", {kR}},
+        {"\xE2\x82"
+         "A",
+         {kR, u'A'}},
+        {"\xF0\x9F\x98", {kR}},
+        // The mixed example of the Unicode standard's recommended practice.
+        {"\x61\xF1\x80\x80\xE1\x80\xC2\x62\x80\x63\x80\xBF\x64",
+         {u'a', kR, kR, kR, u'b', kR, u'c', kR, kR, u'd'}},
+    };
+    for (const auto& c : cases)
+        EXPECT_EQ(UTF8to16(c.utf8), c.utf16) << testing::PrintToString(std::string(c.utf8));
 }
 
-TEST_F(StringsTest, RoundTripsEveryScalarValue)
+TEST(StringsTest, RoundTripsEveryScalarValue)
 {
     for (char32_t codePoint = 1; codePoint <= 0x10FFFF; ++codePoint)
     {
@@ -89,14 +86,10 @@ TEST_F(StringsTest, RoundTripsEveryScalarValue)
             continue;
         std::u16string utf16;
         if (codePoint < 0x10000)
-        {
             utf16.push_back(static_cast<char16_t>(codePoint));
-        }
         else
-        {
-            utf16.push_back(static_cast<char16_t>(0xD800 + ((codePoint - 0x10000) >> 10)));
-            utf16.push_back(static_cast<char16_t>(0xDC00 + ((codePoint - 0x10000) & 0x3FF)));
-        }
+            utf16 = {static_cast<char16_t>(0xD800 + ((codePoint - 0x10000) >> 10)),
+                     static_cast<char16_t>(0xDC00 + ((codePoint - 0x10000) & 0x3FF))};
         const std::string utf8 = UTF16to8(utf16);
         const size_t expectedLength = codePoint < 0x80      ? 1
                                       : codePoint < 0x800   ? 2
@@ -107,10 +100,10 @@ TEST_F(StringsTest, RoundTripsEveryScalarValue)
     }
 }
 
-TEST_F(StringsTest, AsciiWideningReplacesHighBytes)
+TEST(StringsTest, AsciiWideningReplacesHighBytes)
 {
     EXPECT_EQ(AsciiToUTF16("Still Image"), u"Still Image");
-    EXPECT_EQ(AsciiToUTF16("A\xE9Z"), std::u16string({u'A', kReplacement16, u'Z'}));
+    EXPECT_EQ(AsciiToUTF16("A\xE9Z"), std::u16string({u'A', kR, u'Z'}));
     EXPECT_EQ(AsciiToUTF16(""), u"");
 }
 

@@ -3,6 +3,7 @@
 #include <atomic>
 #include <string>
 #include <thread>
+#include <tuple>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -44,29 +45,22 @@ protected:
 
 TEST_F(BrambleSupportTest, InitializeAndShutdownAreCountedOneForOne)
 {
-    EXPECT_EQ(BrambleSupport::Initialize(), 0);
-    EXPECT_EQ(BrambleSupport::Initialize(), 0);
-    EXPECT_EQ(BrambleSupport::GetInitializeCount(), 2);
-    EXPECT_EQ(BrambleSupport::Shutdown(), 0);
-    EXPECT_EQ(BrambleSupport::GetInitializeCount(), 1);
-    EXPECT_EQ(BrambleSupport::Shutdown(), 0);
-    EXPECT_EQ(BrambleSupport::GetInitializeCount(), 0);
-}
-
-TEST_F(BrambleSupportTest, UnbalancedShutdownIsRefusedAndCountStaysZero)
-{
+    // An unbalanced shutdown is refused and leaves no debt.
     EXPECT_EQ(BrambleSupport::Shutdown(), BrambleSupport::kResult_SuiteSupportNotInitialized);
     EXPECT_EQ(BrambleSupport::GetInitializeCount(), 0);
-    // The refused call did not leave a debt: one Initialize is one user.
-    BrambleSupport::Initialize();
-    EXPECT_EQ(BrambleSupport::GetInitializeCount(), 1);
-}
-
-TEST_F(BrambleSupportTest, RegistrationNeedsAnInitializedLibrary)
-{
     EXPECT_EQ(BrambleSupport::RegisterSuite("Test Suite", 1, &kTimesThreeSuite),
               BrambleSupport::kResult_SuiteSupportNotInitialized);
     EXPECT_EQ(BrambleSupport::GetSuiteCount(), 0u);
+    for (const int count : {1, 2})
+    {
+        EXPECT_EQ(BrambleSupport::Initialize(), 0);
+        EXPECT_EQ(BrambleSupport::GetInitializeCount(), count);
+    }
+    for (const int count : {1, 0})
+    {
+        EXPECT_EQ(BrambleSupport::Shutdown(), 0);
+        EXPECT_EQ(BrambleSupport::GetInitializeCount(), count);
+    }
 }
 
 TEST_F(BrambleSupportTest, VersionsOfOneNameShareATableAndDuplicatesAreRefused)
@@ -80,15 +74,20 @@ TEST_F(BrambleSupportTest, VersionsOfOneNameShareATableAndDuplicatesAreRefused)
     EXPECT_EQ(BrambleSupport::kResult_SuiteAlreadyRegistered,
               static_cast<QRT::Result>(0xA00F0002u));
     EXPECT_EQ(BrambleSupport::GetSuiteCount(), 3u);
-
-    // The first table of (name, version) stays.
-    EXPECT_EQ(BrambleSupport_AcquireSuite("Test Suite", 3), &kTimesThreeSuite);
-    EXPECT_EQ(BrambleSupport_AcquireSuite("Test Suite", 2), &kTimesThreeSuite);
-    EXPECT_EQ(BrambleSupport_AcquireSuite("Other Suite", 2), &kPlusOneSuite);
-    // Names are compared exactly, versions too.
-    EXPECT_EQ(BrambleSupport_AcquireSuite("test suite", 2), nullptr);
-    EXPECT_EQ(BrambleSupport_AcquireSuite("Test Suite", 1), nullptr);
-    EXPECT_EQ(BrambleSupport_AcquireSuite("Test Suite", 4), nullptr);
+    // The first table of (name, version) stays; names and versions compare exactly.
+    const std::tuple<const char*, int, const void*> cases[] = {{"Test Suite", 3, &kTimesThreeSuite},
+                                                               {"Test Suite", 2, &kTimesThreeSuite},
+                                                               {"Other Suite", 2, &kPlusOneSuite},
+                                                               {"test suite", 2, nullptr},
+                                                               {"Test Suite", 1, nullptr},
+                                                               {"Test Suite", 4, nullptr},
+                                                               // Bad arguments acquire nothing.
+                                                               {nullptr, 1, nullptr},
+                                                               {"", 1, nullptr},
+                                                               {"Test Suite", 0, nullptr}};
+    for (const auto& [name, version, table] : cases)
+        EXPECT_EQ(BrambleSupport_AcquireSuite(name, version), table)
+            << (name ? name : "null") << " " << version;
 }
 
 TEST_F(BrambleSupportTest, BadArgumentsAreRefusedWithAStatus)
@@ -96,16 +95,15 @@ TEST_F(BrambleSupportTest, BadArgumentsAreRefusedWithAStatus)
     BrambleSupport::Initialize();
     const QRT::Result bad = BrambleSupport::kResult_BadSuiteArgument;
     EXPECT_LT(bad, 0);
-    EXPECT_EQ(BrambleSupport::RegisterSuite(nullptr, 1, &kTimesThreeSuite), bad);
-    EXPECT_EQ(BrambleSupport::RegisterSuite("", 1, &kTimesThreeSuite), bad);
-    EXPECT_EQ(BrambleSupport::RegisterSuite("Test Suite", 0, &kTimesThreeSuite), bad);
-    EXPECT_EQ(BrambleSupport::RegisterSuite("Test Suite", -3, &kTimesThreeSuite), bad);
-    EXPECT_EQ(BrambleSupport::RegisterSuite("Test Suite", 1, nullptr), bad);
+    const std::tuple<const char*, int, const void*> cases[] = {
+        {nullptr, 1, &kTimesThreeSuite},
+        {"", 1, &kTimesThreeSuite},
+        {"Test Suite", 0, &kTimesThreeSuite},
+        {"Test Suite", -3, &kTimesThreeSuite},
+        {"Test Suite", 1, nullptr}};
+    for (const auto& [name, version, table] : cases)
+        EXPECT_EQ(BrambleSupport::RegisterSuite(name, version, table), bad) << version;
     EXPECT_EQ(BrambleSupport::GetSuiteCount(), 0u);
-
-    EXPECT_EQ(BrambleSupport_AcquireSuite(nullptr, 1), nullptr);
-    EXPECT_EQ(BrambleSupport_AcquireSuite("", 1), nullptr);
-    EXPECT_EQ(BrambleSupport_AcquireSuite("Test Suite", 0), nullptr);
     EXPECT_EQ(BrambleSupport_ReleaseSuite(nullptr, 1), BRAMBLE_SUITE_BAD_ARGUMENT);
     EXPECT_EQ(BrambleSupport_ReleaseSuite("Test Suite", -1), BRAMBLE_SUITE_BAD_ARGUMENT);
 }

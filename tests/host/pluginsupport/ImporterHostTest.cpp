@@ -27,31 +27,28 @@ protected:
 
 TEST_F(ImporterHostTest, FirstInitializeOpensASessionAndLastShutdownClosesIt)
 {
-    EXPECT_FALSE(ImporterHost::IsSessionOpen());
-    EXPECT_EQ(ImporterHost::Initialize(), 0);
-    EXPECT_TRUE(ImporterHost::IsSessionOpen());
-    EXPECT_EQ(ImporterHost::Initialize(), 0);
-    EXPECT_EQ(ImporterHost::GetInitializeCount(), 2);
-    EXPECT_EQ(ImporterHost::GetSessionCount(), mSessions + 1);
-
-    EXPECT_EQ(ImporterHost::Shutdown(), 0);
-    EXPECT_TRUE(ImporterHost::IsSessionOpen());
-    EXPECT_EQ(ImporterHost::Shutdown(), 0);
-    EXPECT_FALSE(ImporterHost::IsSessionOpen());
-    EXPECT_EQ(ImporterHost::GetInitializeCount(), 0);
-
-    EXPECT_EQ(ImporterHost::Initialize(), 0);
-    EXPECT_EQ(ImporterHost::GetSessionCount(), mSessions + 2);
-    EXPECT_EQ(ImporterHost::Shutdown(), 0);
-}
-
-TEST_F(ImporterHostTest, UnbalancedShutdownIsRefusedAndCountStaysZero)
-{
+    // An unbalanced shutdown is refused and opens nothing.
     EXPECT_EQ(ImporterHost::Shutdown(), ImporterHost::kResult_ImporterHostNotInitialized);
     EXPECT_LT(ImporterHost::kResult_ImporterHostNotInitialized, 0);
     EXPECT_EQ(ImporterHost::GetInitializeCount(), 0);
     EXPECT_FALSE(ImporterHost::IsSessionOpen());
     EXPECT_EQ(ImporterHost::GetSessionCount(), mSessions);
+    for (const int count : {1, 2})
+    {
+        EXPECT_EQ(ImporterHost::Initialize(), 0);
+        EXPECT_TRUE(ImporterHost::IsSessionOpen());
+        EXPECT_EQ(ImporterHost::GetInitializeCount(), count);
+        EXPECT_EQ(ImporterHost::GetSessionCount(), mSessions + 1);
+    }
+    for (const bool open : {true, false})
+    {
+        EXPECT_EQ(ImporterHost::Shutdown(), 0);
+        EXPECT_EQ(ImporterHost::IsSessionOpen(), open);
+    }
+    EXPECT_EQ(ImporterHost::GetInitializeCount(), 0);
+    EXPECT_EQ(ImporterHost::Initialize(), 0);
+    EXPECT_EQ(ImporterHost::GetSessionCount(), mSessions + 2) << "a new session";
+    EXPECT_EQ(ImporterHost::Shutdown(), 0);
 }
 
 TEST_F(ImporterHostTest, ConcurrentBalancedCallsEndClosed)

@@ -13,6 +13,8 @@
 namespace
 {
 
+using QRT::ClassFactory;
+
 class IGreeter : public QRT::QRTUnknown
 {
 public:
@@ -63,6 +65,20 @@ QRT::ImmutableString Text(const char* inText)
     return QRT::ImmutableString::CreateStatic(inText);
 }
 
+QRT::Result Register(const QRT::Guid& inID, const char* inName, QRT::ClassCreateFunction inCreate,
+                     const char* inCategory = "Greeters")
+{
+    return ClassFactory::RegisterQRTClass(inID, Text(inName), Text(inCategory),
+                                          std::move(inCreate));
+}
+
+int GreetingOf(const char* inName)
+{
+    const auto greeter = QRT::CreateClassInstanceRefByName<IGreeter>(inName);
+    return greeter ? greeter->Greet() : -1;
+}
+
+// Every case unregisters its classes and must leave no allocator block behind.
 class ClassFactoryTest : public ::testing::Test
 {
 protected:
@@ -70,17 +86,15 @@ protected:
     void TearDown() override
     {
         for (const QRT::Guid& id : {kGreeterA, kGreeterB, kGreeterC})
-            QRT::ClassFactory::UnregisterQRTClass(id);
+            ClassFactory::UnregisterQRTClass(id);
         EXPECT_EQ(QRT::Allocator::GetLiveBlockCount(), mBlocksBefore);
     }
     int64_t mBlocksBefore = 0;
 };
 
-TEST_F(ClassFactoryTest, RegisteredClassIsCreatedByIdentifierAndName)
+TEST_F(ClassFactoryTest, RegisteredClassIsCreatedByIdentifierAndNameUntilUnregistered)
 {
-    ASSERT_EQ(QRT::ClassFactory::RegisterQRTClass(kGreeterA, Text("GreeterA"), Text("Greeters"),
-                                                  MakeGreeterCreator(7)),
-              QRT::kResult_Success);
+    ASSERT_EQ(Register(kGreeterA, "GreeterA", MakeGreeterCreator(7)), QRT::kResult_Success);
     const QRT::InterfaceRef<IGreeter> byID = QRT::CreateClassInstanceRef<IGreeter>(kGreeterA);
     ASSERT_TRUE(byID);
     EXPECT_EQ(byID->Greet(), 7);
@@ -89,93 +103,57 @@ TEST_F(ClassFactoryTest, RegisteredClassIsCreatedByIdentifierAndName)
     EXPECT_EQ(byName->Greet(), 7);
     // Every creation makes a new object.
     EXPECT_FALSE(byID == byName);
-
-    const std::optional<QRT::ClassInfo> info = QRT::ClassFactory::FindClassByName("GreeterA");
+    const std::optional<QRT::ClassInfo> info = ClassFactory::FindClassByName("GreeterA");
     ASSERT_TRUE(info);
     EXPECT_EQ(info->mClassID, kGreeterA);
     EXPECT_EQ(info->mCategory, "Greeters");
+
+    // A taken identifier or name is refused and the first class kept.
+    EXPECT_EQ(Register(kGreeterA, "Other", MakeGreeterCreator(2)), QRT::kResult_AlreadyExists);
+    EXPECT_EQ(Register(kGreeterB, "GreeterA", MakeGreeterCreator(3)), QRT::kResult_AlreadyExists);
+    EXPECT_EQ(GreetingOf("GreeterA"), 7);
+    EXPECT_FALSE(ClassFactory::IsClassRegistered(kGreeterB));
+    EXPECT_FALSE(ClassFactory::FindClassByName("Other"));
+
+    EXPECT_EQ(ClassFactory::UnregisterQRTClass(kGreeterA), QRT::kResult_Success);
+    EXPECT_EQ(ClassFactory::UnregisterQRTClass(kGreeterA), QRT::kResult_NotFound);
+    EXPECT_FALSE(QRT::CreateClassInstanceRef<IGreeter>(kGreeterA));
+    EXPECT_FALSE(ClassFactory::FindClassByName("GreeterA"));
+    // The name is free again.
+    EXPECT_EQ(Register(kGreeterB, "GreeterA", MakeGreeterCreator(2)), QRT::kResult_Success);
+    EXPECT_EQ(GreetingOf("GreeterA"), 2);
 }
 
-TEST_F(ClassFactoryTest, SecondRegistrationIsRefusedAndKeepsTheFirst)
-{
-    ASSERT_EQ(QRT::ClassFactory::RegisterQRTClass(kGreeterA, Text("GreeterA"), Text("Greeters"),
-                                                  MakeGreeterCreator(1)),
-              QRT::kResult_Success);
-    EXPECT_EQ(QRT::ClassFactory::RegisterQRTClass(kGreeterA, Text("Other"), Text("Greeters"),
-                                                  MakeGreeterCreator(2)),
-              QRT::kResult_AlreadyExists);
-    EXPECT_EQ(QRT::ClassFactory::RegisterQRTClass(kGreeterB, Text("GreeterA"), Text("Greeters"),
-                                                  MakeGreeterCreator(3)),
-              QRT::kResult_AlreadyExists);
-    EXPECT_EQ(QRT::CreateClassInstanceRef<IGreeter>(kGreeterA)->Greet(), 1);
-    EXPECT_FALSE(QRT::ClassFactory::IsClassRegistered(kGreeterB));
-    EXPECT_FALSE(QRT::ClassFactory::FindClassByName("Other"));
-}
-
-TEST_F(ClassFactoryTest, UnknownClassGivesEmptyReference)
+TEST_F(ClassFactoryTest, FailedCreationsAnswerEmptyOrTheirStatus)
 {
     EXPECT_FALSE(QRT::CreateClassInstanceRef<IGreeter>(kUnknown));
-    EXPECT_FALSE(QRT::CreateClassInstanceRefByName<IGreeter>("NoSuchClass"));
+    EXPECT_EQ(GreetingOf("NoSuchClass"), -1);
     QRT::InterfaceRef<QRT::QRTUnknown> out = QRT::Allocated<Greeter>::Create<QRT::QRTUnknown>(1);
-    EXPECT_EQ(QRT::ClassFactory::CreateInstance(kUnknown, out), QRT::kResult_NotFound);
+    EXPECT_EQ(ClassFactory::CreateInstance(kUnknown, out), QRT::kResult_NotFound);
     EXPECT_FALSE(out);
-}
 
-TEST_F(ClassFactoryTest, InstanceWithoutTheInterfaceGivesEmptyAndIsFreed)
-{
-    ASSERT_EQ(QRT::ClassFactory::RegisterQRTClass(kGreeterA, Text("GreeterA"), Text("Greeters"),
-                                                  MakeGreeterCreator(1)),
-              QRT::kResult_Success);
+    // An instance without the interface is released (TearDown counts it).
+    ASSERT_EQ(Register(kGreeterA, "GreeterA", MakeGreeterCreator(1)), QRT::kResult_Success);
     EXPECT_FALSE(QRT::CreateClassInstanceRef<IUnrelated>(kGreeterA));
-    // TearDown's block count proves the unwanted instance was released.
-}
 
-TEST_F(ClassFactoryTest, CreatorThatProducesNothingAnswersNoInterface)
-{
-    ASSERT_EQ(QRT::ClassFactory::RegisterQRTClass(kGreeterA, Text("GreeterA"), Text("Greeters"),
-                                                  [](QRT::InterfaceRef<QRT::QRTUnknown>&) {}),
+    ASSERT_EQ(Register(kGreeterB, "GreeterB", [](QRT::InterfaceRef<QRT::QRTUnknown>&) {}),
               QRT::kResult_Success);
-    QRT::InterfaceRef<QRT::QRTUnknown> out;
-    EXPECT_EQ(QRT::ClassFactory::CreateInstance(kGreeterA, out), QRT::kResult_NoInterface);
-    EXPECT_FALSE(QRT::CreateClassInstanceRef<IGreeter>(kGreeterA));
-}
+    EXPECT_EQ(ClassFactory::CreateInstance(kGreeterB, out), QRT::kResult_NoInterface);
+    EXPECT_FALSE(QRT::CreateClassInstanceRef<IGreeter>(kGreeterB));
 
-TEST_F(ClassFactoryTest, CreatorExceptionReachesTheCaller)
-{
-    ASSERT_EQ(QRT::ClassFactory::RegisterQRTClass(kGreeterA, Text("GreeterA"), Text("Greeters"),
-                                                  [](QRT::InterfaceRef<QRT::QRTUnknown>&)
-                                                  { throw QRT::InterfaceNotFoundException(); }),
+    ASSERT_EQ(Register(kGreeterC, "GreeterC",
+                       [](QRT::InterfaceRef<QRT::QRTUnknown>&)
+                       { throw QRT::InterfaceNotFoundException(); }),
               QRT::kResult_Success);
-    EXPECT_THROW(QRT::CreateClassInstanceRef<IGreeter>(kGreeterA), QRT::InterfaceNotFoundException);
-}
-
-TEST_F(ClassFactoryTest, UnregisterRemovesTheClassOnce)
-{
-    ASSERT_EQ(QRT::ClassFactory::RegisterQRTClass(kGreeterA, Text("GreeterA"), Text("Greeters"),
-                                                  MakeGreeterCreator(1)),
-              QRT::kResult_Success);
-    EXPECT_EQ(QRT::ClassFactory::UnregisterQRTClass(kGreeterA), QRT::kResult_Success);
-    EXPECT_EQ(QRT::ClassFactory::UnregisterQRTClass(kGreeterA), QRT::kResult_NotFound);
-    EXPECT_FALSE(QRT::CreateClassInstanceRef<IGreeter>(kGreeterA));
-    EXPECT_FALSE(QRT::ClassFactory::FindClassByName("GreeterA"));
-    // The name is free again.
-    EXPECT_EQ(QRT::ClassFactory::RegisterQRTClass(kGreeterB, Text("GreeterA"), Text("Greeters"),
-                                                  MakeGreeterCreator(2)),
-              QRT::kResult_Success);
-    EXPECT_EQ(QRT::CreateClassInstanceRefByName<IGreeter>("GreeterA")->Greet(), 2);
+    EXPECT_THROW(QRT::CreateClassInstanceRef<IGreeter>(kGreeterC), QRT::InterfaceNotFoundException);
 }
 
 TEST_F(ClassFactoryTest, CategoriesListTheirClassesInRegistrationOrder)
 {
-    ASSERT_EQ(QRT::ClassFactory::RegisterQRTClass(kGreeterC, Text("GreeterC"), Text("Zeta"),
-                                                  MakeGreeterCreator(3)),
+    ASSERT_EQ(Register(kGreeterC, "GreeterC", MakeGreeterCreator(3), "Zeta"), QRT::kResult_Success);
+    ASSERT_EQ(Register(kGreeterB, "GreeterB", MakeGreeterCreator(2), "Alpha"),
               QRT::kResult_Success);
-    ASSERT_EQ(QRT::ClassFactory::RegisterQRTClass(kGreeterB, Text("GreeterB"), Text("Alpha"),
-                                                  MakeGreeterCreator(2)),
-              QRT::kResult_Success);
-    ASSERT_EQ(QRT::ClassFactory::RegisterQRTClass(kGreeterA, Text("GreeterA"), Text("Zeta"),
-                                                  MakeGreeterCreator(1)),
-              QRT::kResult_Success);
+    ASSERT_EQ(Register(kGreeterA, "GreeterA", MakeGreeterCreator(1), "Zeta"), QRT::kResult_Success);
 
     const QRT::ClassCategoryList categories = QRT::QRTGetClassCategories();
     const auto find = [&](const char* inName)
@@ -193,21 +171,21 @@ TEST_F(ClassFactoryTest, CategoriesListTheirClassesInRegistrationOrder)
     EXPECT_EQ(zeta->mClassIDs, (std::vector<QRT::Guid>{kGreeterC, kGreeterA}));
 
     QRT::ClassCategoryList ofClass;
-    EXPECT_EQ(QRT::ClassFactory::GetClassCategories(kGreeterB, ofClass), QRT::kResult_Success);
+    EXPECT_EQ(ClassFactory::GetClassCategories(kGreeterB, ofClass), QRT::kResult_Success);
     ASSERT_EQ(ofClass.size(), 1u);
     EXPECT_EQ(ofClass[0].mCategory, "Alpha");
-    EXPECT_EQ(QRT::ClassFactory::GetClassCategories(kUnknown, ofClass), QRT::kResult_NotFound);
+    EXPECT_EQ(ClassFactory::GetClassCategories(kUnknown, ofClass), QRT::kResult_NotFound);
 }
 
 TEST_F(ClassFactoryTest, CategoriesCallbackMayForwardToTheGlobalList)
 {
-    ASSERT_EQ(QRT::ClassFactory::RegisterQRTClass(
-                  kGreeterA, Text("GreeterA"), Text("Greeters"), MakeGreeterCreator(1),
-                  [](QRT::ClassCategoryList& outCategories)
-                  { return QRT::QRTGetClassCategories(outCategories); }),
+    ASSERT_EQ(ClassFactory::RegisterQRTClass(kGreeterA, Text("GreeterA"), Text("Greeters"),
+                                             MakeGreeterCreator(1),
+                                             [](QRT::ClassCategoryList& outCategories)
+                                             { return QRT::QRTGetClassCategories(outCategories); }),
               QRT::kResult_Success);
     QRT::ClassCategoryList viaClass;
-    ASSERT_EQ(QRT::ClassFactory::GetClassCategories(kGreeterA, viaClass), QRT::kResult_Success);
+    ASSERT_EQ(ClassFactory::GetClassCategories(kGreeterA, viaClass), QRT::kResult_Success);
     const QRT::ClassCategoryList global = QRT::QRTGetClassCategories();
     ASSERT_EQ(viaClass.size(), global.size());
     for (size_t i = 0; i < global.size(); ++i)
@@ -219,44 +197,40 @@ TEST_F(ClassFactoryTest, CategoriesCallbackMayForwardToTheGlobalList)
 
 TEST_F(ClassFactoryTest, BadRegistrationsAreContractViolations)
 {
-    EXPECT_THROW(QRT::ClassFactory::RegisterQRTClass(QRT::Guid(), Text("X"), Text("C"),
-                                                     MakeGreeterCreator(1)),
-                 mvxcore::config::Error);
-    EXPECT_THROW(
-        QRT::ClassFactory::RegisterQRTClass(kGreeterA, Text(""), Text("C"), MakeGreeterCreator(1)),
-        mvxcore::config::Error);
-    EXPECT_THROW(
-        QRT::ClassFactory::RegisterQRTClass(kGreeterA, Text("X"), Text(""), MakeGreeterCreator(1)),
-        mvxcore::config::Error);
-    EXPECT_THROW(QRT::ClassFactory::RegisterQRTClass(kGreeterA, Text("X"), Text("C"), nullptr),
-                 mvxcore::config::Error);
-    EXPECT_FALSE(QRT::ClassFactory::IsClassRegistered(kGreeterA));
+    const struct
+    {
+        QRT::Guid id;
+        const char* name;
+        const char* category;
+        QRT::ClassCreateFunction create;
+    } cases[] = {{QRT::Guid(), "X", "C", MakeGreeterCreator(1)},
+                 {kGreeterA, "", "C", MakeGreeterCreator(1)},
+                 {kGreeterA, "X", "", MakeGreeterCreator(1)},
+                 {kGreeterA, "X", "C", nullptr}};
+    for (const auto& c : cases)
+        EXPECT_THROW(Register(c.id, c.name, c.create, c.category), mvxcore::config::Error)
+            << c.name << "/" << c.category;
+    EXPECT_FALSE(ClassFactory::IsClassRegistered(kGreeterA));
 }
 
 TEST_F(ClassFactoryTest, CreatorMayUseTheFactory)
 {
     // A creation callback runs outside the table's lock.
-    ASSERT_EQ(QRT::ClassFactory::RegisterQRTClass(kGreeterB, Text("GreeterB"), Text("Greeters"),
-                                                  MakeGreeterCreator(5)),
+    ASSERT_EQ(Register(kGreeterB, "GreeterB", MakeGreeterCreator(5)), QRT::kResult_Success);
+    ASSERT_EQ(Register(kGreeterA, "GreeterA",
+                       [](QRT::InterfaceRef<QRT::QRTUnknown>& outObject)
+                       {
+                           ClassFactory::CreateInstance(kGreeterB, outObject);
+                           ClassFactory::UnregisterQRTClass(kGreeterB);
+                       }),
               QRT::kResult_Success);
-    ASSERT_EQ(QRT::ClassFactory::RegisterQRTClass(
-                  kGreeterA, Text("GreeterA"), Text("Greeters"),
-                  [](QRT::InterfaceRef<QRT::QRTUnknown>& outObject)
-                  {
-                      QRT::ClassFactory::CreateInstance(kGreeterB, outObject);
-                      QRT::ClassFactory::UnregisterQRTClass(kGreeterB);
-                  }),
-              QRT::kResult_Success);
-    const auto made = QRT::CreateClassInstanceRef<IGreeter>(kGreeterA);
-    ASSERT_TRUE(made);
-    EXPECT_EQ(made->Greet(), 5);
-    EXPECT_FALSE(QRT::ClassFactory::IsClassRegistered(kGreeterB));
+    EXPECT_EQ(GreetingOf("GreeterA"), 5);
+    EXPECT_FALSE(ClassFactory::IsClassRegistered(kGreeterB));
 }
 
 TEST_F(ClassFactoryTest, ConcurrentRegistrationAndCreationStayConsistent)
 {
     std::atomic<bool> stop{false};
-    std::atomic<int> created{0};
     std::thread creator(
         [&]
         {
@@ -265,22 +239,17 @@ TEST_F(ClassFactoryTest, ConcurrentRegistrationAndCreationStayConsistent)
                 if (const auto greeter = QRT::CreateClassInstanceRef<IGreeter>(kGreeterA))
                 {
                     EXPECT_EQ(greeter->Greet(), 9);
-                    ++created;
                 }
             }
         });
-    int successes = 0;
     for (int i = 0; i < 500; ++i)
     {
-        if (QRT::ClassFactory::RegisterQRTClass(kGreeterA, Text("GreeterA"), Text("Greeters"),
-                                                MakeGreeterCreator(9)) == QRT::kResult_Success)
-            ++successes;
-        EXPECT_EQ(QRT::ClassFactory::UnregisterQRTClass(kGreeterA), QRT::kResult_Success);
+        EXPECT_EQ(Register(kGreeterA, "GreeterA", MakeGreeterCreator(9)), QRT::kResult_Success);
+        EXPECT_EQ(ClassFactory::UnregisterQRTClass(kGreeterA), QRT::kResult_Success);
     }
     stop = true;
     creator.join();
-    EXPECT_EQ(successes, 500);
-    EXPECT_FALSE(QRT::ClassFactory::IsClassRegistered(kGreeterA));
+    EXPECT_FALSE(ClassFactory::IsClassRegistered(kGreeterA));
 }
 
 } // namespace

@@ -2,9 +2,7 @@
 
 #include "mvxcore/config/Error.h"
 
-#include <atomic>
 #include <condition_variable>
-#include <cstring>
 #include <mutex>
 #include <thread>
 #include <vector>
@@ -14,11 +12,14 @@
 namespace
 {
 
-class CriticalSectionTest : public ::testing::Test
+// Runs inBody on another thread and waits for it.
+template <class Body>
+void OnOtherThread(Body inBody)
 {
-};
+    std::thread(inBody).join();
+}
 
-TEST_F(CriticalSectionTest, LockExcludesOtherThreads)
+TEST(CriticalSectionTest, LockExcludesOtherThreads)
 {
     QRT::CriticalSection section;
     int64_t counter = 0; // guarded by section
@@ -42,7 +43,7 @@ TEST_F(CriticalSectionTest, LockExcludesOtherThreads)
     EXPECT_EQ(counter, 80000);
 }
 
-TEST_F(CriticalSectionTest, LabelIsKeptWhileHeld)
+TEST(CriticalSectionTest, LabelIsKeptWhileHeldAndUnlockRelockLetOthersIn)
 {
     QRT::CriticalSection section;
     {
@@ -53,48 +54,34 @@ TEST_F(CriticalSectionTest, LabelIsKeptWhileHeld)
     }
     EXPECT_EQ(section.GetOwnerLabel(), nullptr);
     EXPECT_FALSE(section.IsLockedByCurrentThread());
-}
 
-TEST_F(CriticalSectionTest, UnlockAndRelockLetOthersIn)
-{
-    QRT::CriticalSection section;
     QRT::CriticalSectionLock lock(section, "outer");
     lock.Unlock();
     EXPECT_FALSE(lock.IsLocked());
     bool taken = false;
-    std::thread other(
+    OnOtherThread(
         [&]
         {
             taken = section.TryLock("other");
             if (taken)
                 section.Unlock();
         });
-    other.join();
     EXPECT_TRUE(taken);
     lock.Relock();
     EXPECT_TRUE(lock.IsLocked());
     EXPECT_STREQ(section.GetOwnerLabel(), "outer");
-    std::thread blocked([&] { taken = section.TryLock(); });
-    blocked.join();
+    OnOtherThread([&] { taken = section.TryLock(); });
     EXPECT_FALSE(taken);
 }
 
-TEST_F(CriticalSectionTest, RelockingOnTheHoldingThreadIsAContractViolation)
-{
-    QRT::CriticalSection section;
-    QRT::CriticalSectionLock lock(section);
-    EXPECT_THROW(section.Lock(), mvxcore::config::Error);
-    EXPECT_THROW(section.TryLock(), mvxcore::config::Error);
-    // The failed attempts left the section held by this thread.
-    EXPECT_TRUE(section.IsLockedByCurrentThread());
-}
-
-TEST_F(CriticalSectionTest, UnlockingWithoutHoldingIsAContractViolation)
+TEST(CriticalSectionTest, RelockingOrUnlockingWithoutHoldingIsAContractViolation)
 {
     QRT::CriticalSection section;
     EXPECT_THROW(section.Unlock(), mvxcore::config::Error);
     QRT::CriticalSectionLock lock(section);
-    std::thread other(
+    EXPECT_THROW(section.Lock(), mvxcore::config::Error);
+    EXPECT_THROW(section.TryLock(), mvxcore::config::Error);
+    OnOtherThread(
         [&]
         {
             try
@@ -107,20 +94,19 @@ TEST_F(CriticalSectionTest, UnlockingWithoutHoldingIsAContractViolation)
                 EXPECT_EQ(inError.GetExpression(), "IsLockedByCurrentThread()");
             }
         });
-    other.join();
+    // The failed attempts left the section held by this thread.
     EXPECT_TRUE(section.IsLockedByCurrentThread());
     lock.Unlock();
     EXPECT_THROW(lock.Unlock(), mvxcore::config::Error);
 }
 
-TEST_F(CriticalSectionTest, WorksWithStandardLockUtilities)
+TEST(CriticalSectionTest, WorksWithStandardLockUtilities)
 {
     QRT::CriticalSection first;
     QRT::CriticalSection second;
     {
         std::scoped_lock both(first, second);
-        EXPECT_TRUE(first.IsLockedByCurrentThread());
-        EXPECT_TRUE(second.IsLockedByCurrentThread());
+        EXPECT_TRUE(first.IsLockedByCurrentThread() && second.IsLockedByCurrentThread());
     }
     std::condition_variable_any condition;
     bool ready = false; // guarded by first

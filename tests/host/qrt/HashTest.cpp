@@ -3,6 +3,7 @@
 #include "mvxcore/config/Error.h"
 
 #include <cstring>
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -33,47 +34,65 @@ QRT::HashValue ReferenceMix(const QRT::HashValue& inHash, const void* inData, si
     return result;
 }
 
-class HashTest : public ::testing::Test
+TEST(HashTest, RunningLengthCountsEveryMixedByteModulo2To32)
 {
-};
-
-TEST_F(HashTest, StartsAtZero)
-{
-    const QRT::HashValue hash;
+    QRT::HashValue hash;
     EXPECT_TRUE(hash.IsZero());
     EXPECT_EQ(hash.GetRunningLength(), 0u);
     EXPECT_EQ(QRT::HashValueToGuid(hash), QRT::Guid());
-}
-
-TEST_F(HashTest, RunningLengthCountsEveryMixedByte)
-{
-    QRT::HashValue hash;
-    QRT::MixHash::MixInString(hash, "ab");
-    EXPECT_EQ(hash.GetRunningLength(), 2u);
-    EXPECT_EQ(hash.mBytes[12], 2u);
-    EXPECT_EQ(hash.mBytes[13], 0u);
-    QRT::MixHash::MixInString(hash, "c");
-    EXPECT_EQ(hash.GetRunningLength(), 3u);
-    QRT::MixHash::MixInGuid(hash, QRT::Guid("{6593E8B4-4082-48a4-A816-D02043C80893}"));
-    EXPECT_EQ(hash.GetRunningLength(), 19u);
-    QRT::MixHash::MixInValue(hash, uint64_t{7});
-    EXPECT_EQ(hash.GetRunningLength(), 27u);
-    EXPECT_FALSE(hash.IsZero());
-}
-
-TEST_F(HashTest, RunningLengthWrapsModulo2To32)
-{
-    QRT::HashValue hash;
+    const struct
+    {
+        std::function<void(QRT::HashValue&)> mix;
+        uint32_t length;
+    } steps[] = {
+        // An empty run still changes the value.
+        {[](QRT::HashValue& ioHash) { QRT::MixHash::MixInString(ioHash, ""); }, 0},
+        {[](QRT::HashValue& ioHash) { QRT::MixHash::MixInString(ioHash, "ab"); }, 2},
+        {[](QRT::HashValue& ioHash) { QRT::MixHash::MixInString(ioHash, "c"); }, 3},
+        {[](QRT::HashValue& ioHash)
+         { QRT::MixHash::MixInGuid(ioHash, QRT::Guid("{6593E8B4-4082-48a4-A816-D02043C80893}")); },
+         19},
+        {[](QRT::HashValue& ioHash) { QRT::MixHash::MixInValue(ioHash, uint64_t{7}); }, 27},
+    };
+    for (const auto& step : steps)
+    {
+        step.mix(hash);
+        EXPECT_FALSE(hash.IsZero());
+        EXPECT_EQ(hash.GetRunningLength(), step.length);
+        EXPECT_EQ(hash.mBytes[12], step.length);
+        EXPECT_EQ(hash.mBytes[13], 0u);
+    }
     hash.mBytes[12] = 0xFE;
-    hash.mBytes[13] = 0xFF;
-    hash.mBytes[14] = 0xFF;
-    hash.mBytes[15] = 0xFF;
+    hash.mBytes[13] = hash.mBytes[14] = hash.mBytes[15] = 0xFF;
     QRT::MixHash::MixInString(hash, "abc");
     EXPECT_EQ(hash.GetRunningLength(), 1u);
 }
 
-TEST_F(HashTest, SplitRunsDifferFromOneRun)
+TEST(HashTest, EveryRunFollowsTheChainingRule)
 {
+    QRT::HashValue expected;
+    expected = ReferenceMix(expected, "ML::RenderableNodeCommonImpl", 28);
+    const uint32_t quality = 5;
+    expected = ReferenceMix(expected, &quality, sizeof(quality));
+    QRT::HashValue hash;
+    QRT::MixHash::MixInString(hash,
+                              QRT::ImmutableString::CreateStatic("ML::RenderableNodeCommonImpl"));
+    QRT::MixHash::MixInValue(hash, quality);
+    EXPECT_EQ(hash, expected);
+    EXPECT_EQ(hash.GetRunningLength(), 32u);
+
+    // Above the one-shot buffer the streaming path must give the same digest.
+    for (size_t size : {size_t{240}, size_t{2048}, size_t{2049}, size_t{10000}})
+    {
+        std::vector<uint8_t> data(size);
+        for (size_t i = 0; i < size; ++i)
+            data[i] = static_cast<uint8_t>(i * 31 + 7);
+        QRT::HashValue extended = hash;
+        QRT::MixHash::MixInData(extended, data.data(), data.size());
+        EXPECT_EQ(extended, ReferenceMix(hash, data.data(), data.size())) << size;
+    }
+
+    // Split runs differ from one run of the same bytes.
     QRT::HashValue split;
     QRT::MixHash::MixInString(split, "ab");
     QRT::MixHash::MixInString(split, "c");
@@ -82,72 +101,22 @@ TEST_F(HashTest, SplitRunsDifferFromOneRun)
     EXPECT_EQ(split.GetRunningLength(), whole.GetRunningLength());
     EXPECT_NE(split, whole);
     EXPECT_NE(QRT::HashValueToGuid(split), QRT::HashValueToGuid(whole));
-}
 
-TEST_F(HashTest, EmptyRunStillChangesTheValue)
-{
-    QRT::HashValue hash;
-    QRT::MixHash::MixInString(hash, "");
-    EXPECT_FALSE(hash.IsZero());
-    EXPECT_EQ(hash.GetRunningLength(), 0u);
-}
-
-TEST_F(HashTest, MatchesTheDocumentedChainingRule)
-{
-    QRT::HashValue expected;
-    const std::string first = "ML::RenderableNodeCommonImpl";
-    expected = ReferenceMix(expected, first.data(), first.size());
-    const uint32_t quality = 5;
-    expected = ReferenceMix(expected, &quality, sizeof(quality));
-
-    QRT::HashValue hash;
-    QRT::MixHash::MixInString(hash,
-                              QRT::ImmutableString::CreateStatic("ML::RenderableNodeCommonImpl"));
-    QRT::MixHash::MixInValue(hash, quality);
-    EXPECT_EQ(hash, expected);
-    EXPECT_EQ(hash.GetRunningLength(), 32u);
-}
-
-TEST_F(HashTest, LongRunsUseTheSameRuleAsShortOnes)
-{
-    // Above the one-shot buffer the streaming path must give the same digest.
-    for (size_t size : {size_t{240}, size_t{2048}, size_t{2049}, size_t{10000}})
-    {
-        std::vector<uint8_t> data(size);
-        for (size_t i = 0; i < size; ++i)
-            data[i] = static_cast<uint8_t>(i * 31 + 7);
-        QRT::HashValue start;
-        QRT::MixHash::MixInString(start, "seed");
-        QRT::HashValue hash = start;
-        QRT::MixHash::MixInData(hash, data.data(), data.size());
-        EXPECT_EQ(hash, ReferenceMix(start, data.data(), data.size())) << size;
-    }
-}
-
-TEST_F(HashTest, KnownInputGivesAPinnedKey)
-{
     // Keys are stored by the frame cache and compared between runs: a change
-    // of chaining, byte order or length handling must show up here. The
-    // running length 3 is visible as the key's last four bytes.
-    QRT::HashValue hash;
-    QRT::MixHash::MixInString(hash, "abc");
-    EXPECT_EQ(hash, ReferenceMix(QRT::HashValue(), "abc", 3));
-    EXPECT_EQ(QRT::HashValueToGuid(hash).ToString(), "{80b88241-fce6-a9d5-7a48-03b700000003}");
+    // of chaining, byte order or length handling must show up here.
+    EXPECT_EQ(whole, ReferenceMix(QRT::HashValue(), "abc", 3));
+    EXPECT_EQ(QRT::HashValueToGuid(whole).ToString(), "{80b88241-fce6-a9d5-7a48-03b700000003}");
 }
 
-TEST_F(HashTest, GuidIsMixedAsItsSixteenMemoryBytes)
+TEST(HashTest, GuidsMixAsTheirMemoryBytesAndKeysConvertWordByWord)
 {
-    const QRT::Guid guid("{01020304-0506-0708-090a-0b0c0d0e0f10}");
     QRT::HashValue viaGuid;
-    QRT::MixHash::MixInGuid(viaGuid, guid);
+    QRT::MixHash::MixInGuid(viaGuid, QRT::Guid("{01020304-0506-0708-090a-0b0c0d0e0f10}"));
     const uint8_t bytes[16] = {4, 3, 2, 1, 6, 5, 8, 7, 9, 10, 11, 12, 13, 14, 15, 16};
     QRT::HashValue viaBytes;
     QRT::MixHash::MixInData(viaBytes, bytes, sizeof(bytes));
     EXPECT_EQ(viaGuid, viaBytes);
-}
 
-TEST_F(HashTest, GuidConversionPlacesEveryByte)
-{
     QRT::HashValue hash;
     for (uint8_t i = 0; i < 16; ++i)
         hash.mBytes[i] = static_cast<uint8_t>(0x10 + i);
@@ -161,7 +130,7 @@ TEST_F(HashTest, GuidConversionPlacesEveryByte)
     EXPECT_EQ(guid.ToString(), "{13121110-1716-1514-1b1a-19181f1e1d1c}");
 }
 
-TEST_F(HashTest, NullDataWithASizeIsAContractViolation)
+TEST(HashTest, NullDataWithASizeIsAContractViolation)
 {
     QRT::HashValue hash;
     EXPECT_THROW(QRT::MixHash::MixInData(hash, nullptr, 4), mvxcore::config::Error);

@@ -4,6 +4,7 @@
 
 #include <atomic>
 #include <barrier>
+#include <string>
 #include <thread>
 #include <vector>
 
@@ -40,7 +41,7 @@ public:
     QRT_INTERFACE_ID("{0a1b2c3d-0000-4000-8000-000000000004}");
 };
 
-std::atomic<int> sLiveSquares{0};
+std::atomic<int> sLiveObjects{0};
 
 class Square : public QRT::Implements<ISquare, INamed>
 {
@@ -48,9 +49,9 @@ public:
     explicit Square(int inSide)
         : mSide(inSide)
     {
-        ++sLiveSquares;
+        ++sLiveObjects;
     }
-    ~Square() { --sLiveSquares; }
+    ~Square() { --sLiveObjects; }
     int Area() const override { return mSide * mSide; }
     int Side() const override { return mSide; }
     const char* Name() const override { return "square"; }
@@ -69,104 +70,10 @@ public:
 class Client : public QRT::Implements<INamed, QRT::IWeakReferenceCapable>
 {
 public:
-    Client() { ++sLiveSquares; }
-    ~Client() { --sLiveSquares; }
+    Client() { ++sLiveObjects; }
+    ~Client() { --sLiveObjects; }
     const char* Name() const override { return "client"; }
 };
-
-class ObjectModelTest : public ::testing::Test
-{
-protected:
-    void SetUp() override { mBlocksBefore = QRT::Allocator::GetLiveBlockCount(); }
-    void TearDown() override
-    {
-        EXPECT_EQ(sLiveSquares.load(), 0);
-        EXPECT_EQ(QRT::Allocator::GetLiveBlockCount(), mBlocksBefore);
-    }
-    int64_t mBlocksBefore = 0;
-};
-
-TEST_F(ObjectModelTest, QueryAnswersOwnInterfacesParentsAndRootOnly)
-{
-    QRT::InterfaceRef<ISquare> square = QRT::Allocated<Square>::Create<ISquare>(3);
-    ASSERT_TRUE(square);
-
-    void* out = reinterpret_cast<void*>(0x1);
-    EXPECT_EQ(square->QueryInterface(IUnimplemented::kIID, &out), QRT::kResult_NoInterface);
-    EXPECT_EQ(out, nullptr);
-    EXPECT_EQ(static_cast<uint32_t>(QRT::kResult_NoInterface), 0xA00A0001u);
-
-    for (const QRT::Guid& iid : {ISquare::kIID, IShape::kIID, INamed::kIID, QRT::QRTUnknown::kIID})
-    {
-        out = nullptr;
-        ASSERT_EQ(square->QueryInterface(iid, &out), QRT::kResult_Success) << iid.ToString();
-        ASSERT_NE(out, nullptr);
-        // Every successful query added a reference.
-        static_cast<QRT::QRTUnknown*>(static_cast<IShape*>(square.Get()))->Release();
-    }
-    EXPECT_EQ(QRT::InterfaceRef<INamed>(square)->Name(), std::string("square"));
-    EXPECT_EQ(QRT::InterfaceRef<IShape>(square)->Area(), 9);
-}
-
-TEST_F(ObjectModelTest, CountStartsAtZeroAndLastReleaseDestroys)
-{
-    QRT::InterfaceRef<Square> concrete = QRT::Allocated<Square>::CreateInstance(2);
-    auto* counted = static_cast<QRT::Allocated<Square>*>(concrete.Get());
-    EXPECT_EQ(counted->GetRefCountForTesting(), 1u);
-    {
-        QRT::InterfaceRef<INamed> named(concrete);
-        QRT::InterfaceRef<INamed> copy = named;
-        EXPECT_EQ(counted->GetRefCountForTesting(), 3u);
-    }
-    EXPECT_EQ(counted->GetRefCountForTesting(), 1u);
-    EXPECT_EQ(sLiveSquares.load(), 1);
-    concrete.Reset();
-    EXPECT_EQ(sLiveSquares.load(), 0);
-}
-
-TEST_F(ObjectModelTest, CreateWithUnimplementedInterfaceGivesEmptyAndFreesObject)
-{
-    QRT::InterfaceRef<IUnimplemented> ref = QRT::Allocated<Square>::Create<IUnimplemented>(1);
-    EXPECT_FALSE(ref);
-    EXPECT_EQ(sLiveSquares.load(), 0);
-}
-
-TEST_F(ObjectModelTest, ThrowingConstructorReturnsMemory)
-{
-    EXPECT_THROW(QRT::Allocated<Thrower>::Create<IShape>(), std::runtime_error);
-}
-
-TEST_F(ObjectModelTest, ExceptionsCarryExactTexts)
-{
-    QRT::InterfaceRef<ISquare> square = QRT::Allocated<Square>::Create<ISquare>(1);
-    try
-    {
-        QRT::InterfaceRef<IUnimplemented> bad(square);
-        FAIL() << "conversion to an unimplemented interface succeeded";
-    }
-    catch (const QRT::InterfaceNotFoundException& e)
-    {
-        EXPECT_STREQ(e.what(), "The requested interface has not been registered.");
-    }
-
-    QRT::InterfaceRef<ISquare> empty;
-    try
-    {
-        (void)empty->Side();
-        FAIL() << "dereferencing an empty reference succeeded";
-    }
-    catch (const QRT::NullInterfaceException& e)
-    {
-        EXPECT_STREQ(e.what(), "A NULL interface pointer has been dereferenced.");
-    }
-    EXPECT_THROW((void)*empty, QRT::NullInterfaceException);
-
-    // An empty reference converts to an empty one instead of throwing.
-    QRT::InterfaceRef<IUnimplemented> fromEmpty(empty);
-    EXPECT_FALSE(fromEmpty);
-    EXPECT_FALSE(QRT::QueryRef<IUnimplemented>(square));
-    EXPECT_TRUE(QRT::QueryRef<INamed>(square));
-}
 
 // An object that refuses to answer its root cannot take part in comparisons.
 class Rootless : public IShape
@@ -184,59 +91,126 @@ public:
     uint32_t mCount = 0;
 };
 
+// The text of the exception inCall throws; empty when it throws none.
+template <class Exception, class Call>
+std::string WhatOf(Call inCall)
+{
+    try
+    {
+        inCall();
+    }
+    catch (const Exception& inException)
+    {
+        return inException.what();
+    }
+    return {};
+}
+
+// Every case must leave no object and no allocator block behind.
+class ObjectModelTest : public ::testing::Test
+{
+protected:
+    void SetUp() override { mBlocksBefore = QRT::Allocator::GetLiveBlockCount(); }
+    void TearDown() override
+    {
+        EXPECT_EQ(sLiveObjects.load(), 0);
+        EXPECT_EQ(QRT::Allocator::GetLiveBlockCount(), mBlocksBefore);
+    }
+    int64_t mBlocksBefore = 0;
+};
+
+TEST_F(ObjectModelTest, QueryAnswersOwnInterfacesParentsAndRootOnlyAndCountsReferences)
+{
+    QRT::InterfaceRef<Square> concrete = QRT::Allocated<Square>::CreateInstance(3);
+    auto* counted = static_cast<QRT::Allocated<Square>*>(concrete.Get());
+    EXPECT_EQ(counted->GetRefCountForTesting(), 1u);
+    void* out = reinterpret_cast<void*>(0x1);
+    EXPECT_EQ(concrete->QueryInterface(IUnimplemented::kIID, &out), QRT::kResult_NoInterface);
+    EXPECT_EQ(out, nullptr);
+    EXPECT_EQ(static_cast<uint32_t>(QRT::kResult_NoInterface), 0xA00A0001u);
+    for (const QRT::Guid& iid : {ISquare::kIID, IShape::kIID, INamed::kIID, QRT::QRTUnknown::kIID})
+    {
+        out = nullptr;
+        ASSERT_EQ(concrete->QueryInterface(iid, &out), QRT::kResult_Success) << iid.ToString();
+        ASSERT_NE(out, nullptr);
+        EXPECT_EQ(counted->GetRefCountForTesting(), 2u);
+        static_cast<QRT::QRTUnknown*>(static_cast<IShape*>(concrete.Get()))->Release();
+    }
+    {
+        const QRT::InterfaceRef<INamed> named(concrete);
+        const QRT::InterfaceRef<IShape> shape(concrete);
+        EXPECT_EQ(counted->GetRefCountForTesting(), 3u);
+        EXPECT_STREQ(named->Name(), "square");
+        EXPECT_EQ(shape->Area(), 9);
+    }
+    EXPECT_EQ(counted->GetRefCountForTesting(), 1u);
+    EXPECT_EQ(sLiveObjects.load(), 1);
+    concrete.Reset();
+    EXPECT_EQ(sLiveObjects.load(), 0);
+
+    // Creation for an unimplemented interface frees the new object; a
+    // throwing constructor returns its memory (TearDown counts both).
+    EXPECT_FALSE((QRT::Allocated<Square>::Create<IUnimplemented>(1)));
+    EXPECT_THROW(QRT::Allocated<Thrower>::Create<IShape>(), std::runtime_error);
+}
+
+TEST_F(ObjectModelTest, ExceptionsCarryExactTexts)
+{
+    const QRT::InterfaceRef<ISquare> square = QRT::Allocated<Square>::Create<ISquare>(1);
+    const QRT::InterfaceRef<ISquare> empty;
+    Rootless rootless;
+    EXPECT_EQ(
+        WhatOf<QRT::InterfaceNotFoundException>([&] { QRT::InterfaceRef<IUnimplemented>{square}; }),
+        "The requested interface has not been registered.");
+    EXPECT_EQ(WhatOf<QRT::NullInterfaceException>([&] { (void)empty->Side(); }),
+              "A NULL interface pointer has been dereferenced.");
+    EXPECT_THROW((void)*empty, QRT::NullInterfaceException);
+    EXPECT_EQ(WhatOf<QRT::IllegalComparisonException>(
+                  [&] { (void)(QRT::InterfaceRef<IShape>(&rootless) == square); }),
+              "A comparison of two refs has failed because we are unable to convert one of "
+              "them to QRTUnknown.");
+    EXPECT_EQ(rootless.mCount, 0u);
+
+    // An empty reference converts to an empty one instead of throwing.
+    EXPECT_FALSE(QRT::InterfaceRef<IUnimplemented>(empty));
+    EXPECT_FALSE(QRT::QueryRef<IUnimplemented>(square));
+    EXPECT_TRUE(QRT::QueryRef<INamed>(square));
+}
+
 TEST_F(ObjectModelTest, ComparisonGoesThroughRootInterfaces)
 {
-    QRT::InterfaceRef<ISquare> square = QRT::Allocated<Square>::Create<ISquare>(1);
-    QRT::InterfaceRef<INamed> sameObject(square);
-    QRT::InterfaceRef<ISquare> other = QRT::Allocated<Square>::Create<ISquare>(1);
-    EXPECT_TRUE(square == sameObject);
+    const QRT::InterfaceRef<ISquare> square = QRT::Allocated<Square>::Create<ISquare>(1);
+    const QRT::InterfaceRef<ISquare> other = QRT::Allocated<Square>::Create<ISquare>(1);
+    EXPECT_TRUE(square == QRT::InterfaceRef<INamed>(square));
     EXPECT_FALSE(square == other);
+    EXPECT_NE((square <=> other), std::strong_ordering::equal);
     EXPECT_TRUE(QRT::InterfaceRef<INamed>() == QRT::InterfaceRef<ISquare>());
     EXPECT_TRUE(QRT::InterfaceRef<INamed>() == nullptr);
-    EXPECT_NE((square <=> other), std::strong_ordering::equal);
-
-    Rootless rootless;
-    {
-        QRT::InterfaceRef<IShape> bad(&rootless);
-        try
-        {
-            (void)(bad == square);
-            FAIL() << "comparison with a rootless object succeeded";
-        }
-        catch (const QRT::IllegalComparisonException& e)
-        {
-            EXPECT_STREQ(e.what(), "A comparison of two refs has failed because we are unable "
-                                   "to convert one of them to QRTUnknown.");
-        }
-    }
-    EXPECT_EQ(rootless.mCount, 0u);
 }
 
 TEST_F(ObjectModelTest, WeakReferenceLocksOnlyWhileAlive)
 {
     QRT::InterfaceRef<INamed> client = QRT::Allocated<Client>::Create<INamed>();
-    QRT::WeakReference<INamed> weak(client);
+    const QRT::WeakReference<INamed> weak(client);
     {
-        QRT::InterfaceRef<INamed> locked = weak.Lock();
+        const QRT::InterfaceRef<INamed> locked = weak.Lock();
         ASSERT_TRUE(locked);
         EXPECT_STREQ(locked->Name(), "client");
     }
     client.Reset();
     EXPECT_TRUE(weak.IsExpired());
     EXPECT_FALSE(weak.Lock());
-
-    QRT::InterfaceRef<INamed> notWeakCapable = QRT::Allocated<Square>::Create<INamed>(1);
+    const QRT::InterfaceRef<INamed> notWeakCapable = QRT::Allocated<Square>::Create<INamed>(1);
     EXPECT_THROW(QRT::WeakReference<INamed>{notWeakCapable}, QRT::InterfaceNotFoundException);
 }
 
 TEST_F(ObjectModelTest, WeakLockRacingLastReleaseNeverRevives)
 {
-    constexpr int kRounds = 300;
     constexpr int kLockers = 3;
-    for (int round = 0; round < kRounds; ++round)
+    for (int round = 0; round < 300; ++round)
     {
         QRT::InterfaceRef<INamed> client = QRT::Allocated<Client>::Create<INamed>();
-        QRT::WeakReference<INamed> weak(client);
+        const QRT::WeakReference<INamed> weak(client);
         std::barrier start(kLockers + 1);
         std::atomic<int> lockedAfterDeath{0};
         std::atomic<bool> released{false};
@@ -250,12 +224,11 @@ TEST_F(ObjectModelTest, WeakLockRacingLastReleaseNeverRevives)
                     for (int n = 0; n < 50; ++n)
                     {
                         const bool wasReleased = released.load();
-                        QRT::InterfaceRef<INamed> strong = weak.Lock();
-                        if (strong)
+                        if (const QRT::InterfaceRef<INamed> strong = weak.Lock())
                         {
                             // A lock that succeeds must see a live object.
                             EXPECT_STREQ(strong->Name(), "client");
-                            if (wasReleased && sLiveSquares.load() == 0)
+                            if (wasReleased && sLiveObjects.load() == 0)
                                 ++lockedAfterDeath;
                         }
                     }
@@ -269,13 +242,13 @@ TEST_F(ObjectModelTest, WeakLockRacingLastReleaseNeverRevives)
         EXPECT_EQ(lockedAfterDeath.load(), 0);
         EXPECT_TRUE(weak.IsExpired());
         EXPECT_FALSE(weak.Lock());
-        EXPECT_EQ(sLiveSquares.load(), 0);
+        EXPECT_EQ(sLiveObjects.load(), 0);
     }
 }
 
 TEST_F(ObjectModelTest, CopiesAcrossThreadsBalanceTheCount)
 {
-    QRT::InterfaceRef<Square> square = QRT::Allocated<Square>::CreateInstance(4);
+    const QRT::InterfaceRef<Square> square = QRT::Allocated<Square>::CreateInstance(4);
     std::vector<std::thread> threads;
     for (int i = 0; i < 4; ++i)
     {
@@ -284,8 +257,8 @@ TEST_F(ObjectModelTest, CopiesAcrossThreadsBalanceTheCount)
             {
                 for (int n = 0; n < 10000; ++n)
                 {
-                    QRT::InterfaceRef<IShape> shape(square);
-                    QRT::InterfaceRef<INamed> named(square);
+                    const QRT::InterfaceRef<IShape> shape(square);
+                    const QRT::InterfaceRef<INamed> named(square);
                     ASSERT_EQ(shape->Area(), 16);
                 }
             });

@@ -22,70 +22,31 @@ protected:
     int64_t mBlocksBefore = 0;
 };
 
-TEST_F(WaitableObjectTest, StartsUnsignalled)
+TEST_F(WaitableObjectTest, StaysSignalledUntilResetAndTimedWaitsTimeOutOtherwise)
 {
     const QRT::InterfaceRef<QRT::WaitableObject> waitable = QRT::WaitableObject::Create();
     ASSERT_TRUE(waitable);
     EXPECT_FALSE(waitable->IsSignalled());
-    EXPECT_FALSE(waitable->WaitForSignal(0ms));
-}
-
-TEST_F(WaitableObjectTest, SignalBeforeWaitIsNotLost)
-{
-    const auto waitable = QRT::WaitableObject::Create();
-    std::thread signaller([&] { waitable->Signal(); });
-    signaller.join();
-    waitable->WaitForSignal();
-    EXPECT_TRUE(waitable->IsSignalled());
-    // Manual reset: later waits pass too.
-    EXPECT_TRUE(waitable->WaitForSignal(0ms));
-}
-
-TEST_F(WaitableObjectTest, WaiterIsReleasedBySignalFromAnotherThread)
-{
-    const auto waitable = QRT::WaitableObject::Create();
-    std::atomic<bool> signalled{false};
-    std::atomic<bool> released{false};
-    std::thread waiter(
-        [&]
-        {
-            waitable->WaitForSignal();
-            // The waiter must not pass before the signal was given.
-            EXPECT_TRUE(signalled.load());
-            released = true;
-        });
-    std::this_thread::sleep_for(20ms);
-    EXPECT_FALSE(released.load());
-    signalled = true;
-    waitable->Signal();
-    waiter.join();
-    EXPECT_TRUE(released.load());
-}
-
-TEST_F(WaitableObjectTest, TimedWaitTimesOutWithoutSignal)
-{
-    const auto waitable = QRT::WaitableObject::Create();
     const auto start = std::chrono::steady_clock::now();
     EXPECT_FALSE(waitable->WaitForSignal(30ms));
     EXPECT_GE(std::chrono::steady_clock::now() - start, 30ms);
+
+    // A signal given before the wait is not lost, and later waits pass too.
+    std::thread([&] { waitable->Signal(); }).join();
+    waitable->Signal();
+    waitable->WaitForSignal();
+    EXPECT_TRUE(waitable->IsSignalled());
+    EXPECT_TRUE(waitable->WaitForSignal(0ms));
+
+    waitable->Reset();
+    EXPECT_FALSE(waitable->IsSignalled());
+    EXPECT_FALSE(waitable->WaitForSignal(5ms));
 }
 
-TEST_F(WaitableObjectTest, TimedWaitAnswersTrueWhenSignalledInTime)
+TEST_F(WaitableObjectTest, OneSignalReleasesEveryWaiterAndNoneBefore)
 {
     const auto waitable = QRT::WaitableObject::Create();
-    std::thread signaller(
-        [&]
-        {
-            std::this_thread::sleep_for(10ms);
-            waitable->Signal();
-        });
-    EXPECT_TRUE(waitable->WaitForSignal(std::chrono::milliseconds(60000)));
-    signaller.join();
-}
-
-TEST_F(WaitableObjectTest, OneSignalReleasesEveryWaiter)
-{
-    const auto waitable = QRT::WaitableObject::Create();
+    std::atomic<bool> signalled{false};
     std::atomic<int> released{0};
     std::vector<std::thread> waiters;
     for (int i = 0; i < 6; ++i)
@@ -97,25 +58,17 @@ TEST_F(WaitableObjectTest, OneSignalReleasesEveryWaiter)
                     waitable->WaitForSignal();
                 else
                     EXPECT_TRUE(waitable->WaitForSignal(std::chrono::milliseconds(60000)));
+                EXPECT_TRUE(signalled.load());
                 ++released;
             });
     }
-    std::this_thread::sleep_for(10ms);
+    std::this_thread::sleep_for(20ms);
     EXPECT_EQ(released.load(), 0);
+    signalled = true;
     waitable->Signal();
     for (std::thread& waiter : waiters)
         waiter.join();
     EXPECT_EQ(released.load(), 6);
-}
-
-TEST_F(WaitableObjectTest, ResetMakesWaitsBlockAgain)
-{
-    const auto waitable = QRT::WaitableObject::Create();
-    waitable->Signal();
-    waitable->Signal();
-    waitable->Reset();
-    EXPECT_FALSE(waitable->IsSignalled());
-    EXPECT_FALSE(waitable->WaitForSignal(5ms));
 }
 
 TEST_F(WaitableObjectTest, HeldAcrossThreadsThroughReferences)
