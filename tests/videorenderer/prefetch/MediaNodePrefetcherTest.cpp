@@ -1,6 +1,5 @@
 #include "prefetch/MediaNodePrefetcher.h"
 
-#include "BE/VideoSources.h"
 #include "ML/RenderStatus.h"
 #include "PrefetchFixture.h"
 
@@ -291,49 +290,6 @@ TEST_F(MediaNodePrefetcherTest, AsyncTimeoutAssertsOnceUnlessSilencedAndFallsBac
         EXPECT_EQ(async->ReadTicks(), std::vector<std::int64_t>{ticks});
     }
     EXPECT_EQ(Asserts(), Asserted{kTimeoutAssert});
-}
-
-TEST_F(MediaNodePrefetcherTest, BackendAsyncSourceTimesOutThenIsReadThroughTheQueue)
-{
-    VideoSourceRef pattern;
-    ASSERT_TRUE(BE::OpenVideoSource("pattern:moving?size=16x8&rate=25", pattern).Succeeded());
-    // Pattern frames have the same key in every run: start from an empty cache.
-    VF::SharedVideoFrameCache::Clear();
-    const VideoSourceRef slow = BE::CreateAsyncVideoSource(pattern, std::chrono::milliseconds(300),
-                                                           std::chrono::milliseconds(10));
-    const PrefetchRef handle = Make(slow, 0);
-    ASSERT_TRUE(handle);
-    EXPECT_EQ(handle->InitiatePrefetch(), QRT::kResult_Success);
-    // Waited 1 s already, well past the source's 10 ms time-out.
-    EXPECT_TRUE(handle->ContinueWaitingForPrefetch(1.0));
-    EXPECT_EQ(Asserts(), Asserted{kTimeoutAssert});
-    Drain(mVideo);
-    EXPECT_FALSE(handle->ContinueWaitingForPrefetch(2.0));
-    const FrameRef frame = Taken(handle);
-    ASSERT_TRUE(frame);
-    EXPECT_EQ(frame->GetBounds(), QRT::ParamRect(0, 0, 16, 8));
-    EXPECT_EQ(
-        VF::SharedVideoFrameCache::RetrieveFromCache(slow->GetFrameKey(At(0), {}, {}, {})).Get(),
-        frame.Get());
-}
-
-TEST_F(MediaNodePrefetcherTest, BackendAsyncSourceDeliversWithinItsTimeout)
-{
-    VideoSourceRef pattern;
-    ASSERT_TRUE(BE::OpenVideoSource("pattern:moving?size=16x8&rate=25", pattern).Succeeded());
-    const PrefetchRef handle = Make(
-        BE::CreateAsyncVideoSource(pattern, std::chrono::milliseconds(5), std::chrono::seconds(30)),
-        0);
-    ASSERT_TRUE(handle);
-    handle->InitiatePrefetch();
-    // Each wait blocks for at most a slice of the source's; the loop ends when
-    // the frame is there.
-    double elapsed = 0.0;
-    while (handle->ContinueWaitingForPrefetch(elapsed))
-        elapsed += 0.001;
-    EXPECT_TRUE(Taken(handle));
-    EXPECT_TRUE(Asserts().empty());
-    EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 0u);
 }
 
 TEST_F(MediaNodePrefetcherTest, FlushedRegistryEndsEveryWait)

@@ -1,6 +1,5 @@
 #include "prefetch/VideoSourcePrefetcher.h"
 
-#include "BE/VideoSources.h"
 #include "ML/RenderStatus.h"
 #include "PrefetchFixture.h"
 #include "mvxcore/config/Error.h"
@@ -182,22 +181,6 @@ TEST_F(VideoSourcePrefetcherTest, EnqueueWithoutExecutorsViolatesItsInputContrac
               "sVideoSourcePrefetcherQueue != NULL && sImageSourcePrefetcherQueue != NULL");
     EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 0u);
     EXPECT_TRUE(mLog.Get().empty());
-}
-
-TEST_F(VideoSourcePrefetcherTest, ReadsThroughTheBackendLatencySource)
-{
-    VideoSourceRef pattern;
-    ASSERT_TRUE(BE::OpenVideoSource("pattern:moving?size=16x8&rate=25", pattern).Succeeded());
-    const VideoSourceRef slow = BE::CreateLatencyVideoSource(pattern, std::chrono::milliseconds(2));
-    const Guid key = slow->GetFrameKey(At(0), {}, {}, {});
-    ASSERT_FALSE(key.IsNil());
-    VF::SharedVideoFrameCache::Clear();
-    EnqueueVideoSourcePrefetch(At(0), slow, {}, {}, {}, key, mLog.Callback());
-    Drain(mVideo);
-    EXPECT_EQ(mLog.Get(), Statuses{QRT::kResult_Success});
-    const FrameRef cached = VF::SharedVideoFrameCache::RetrieveFromCache(key);
-    ASSERT_TRUE(cached);
-    EXPECT_EQ(cached->GetBounds(), QRT::ParamRect(0, 0, 16, 8));
 }
 
 // Many threads enqueue and cancel reads of a few sources while two executor

@@ -87,22 +87,6 @@ protected:
     const CutlistRenderParams m4x2 = MakeParams(4, 2);
 };
 
-TEST_F(RenderableVideoSourceTest, AnswersOnlyItsOwnInterfaceAndTheRoot)
-{
-    const SourceRef source = Make(MakeScriptedSource(), {});
-    ASSERT_TRUE(source);
-    void* found = nullptr;
-    EXPECT_EQ(source->QueryInterface(IRenderableSource::kIID, &found), QRT::kResult_Success);
-    EXPECT_EQ(found, source.Get());
-    source->Release();
-    EXPECT_EQ(source->QueryInterface(QRT::QRTUnknown::kIID, &found), QRT::kResult_Success);
-    ASSERT_NE(found, nullptr);
-    static_cast<QRT::QRTUnknown*>(found)->Release();
-    found = &found;
-    EXPECT_EQ(source->QueryInterface(MF::IVideoFrame::kIID, &found), QRT::kResult_NoInterface);
-    EXPECT_EQ(found, nullptr);
-}
-
 TEST_F(RenderableVideoSourceTest, RatesFollowTheDeclarationTheSourceAndStills)
 {
     const ScriptedSourceRef progressive = MakeScriptedSource();
