@@ -1,43 +1,32 @@
-// Scaler: pass-through of fitting frames, field-correct reduction, the
-// nearest-field choice for progressive requests, odd interlaced heights.
+// Scaler: pass-through of fitting frames, pixel aspect correction, field-correct
+// reduction, the nearest-field choice for progressive requests, odd interlaced
+// heights, and draft renders that keep a full-frame rendering whole.
 
-#include "FilterTestSources.h"
+#include "../sources/ScriptedSources.h"
 #include "ML/RenderableSourceFilters.h"
 
-#include <gtest/gtest.h>
-
+namespace ML::Test
+{
 namespace
 {
-
-using namespace FilterTest;
-using SourceRef = QRT::InterfaceRef<ML::IRenderableSource>;
 
 class ScalerTest : public ::testing::Test
 {
 protected:
-    static MF::FrameTime Conform(const SourceRef& inSource, const MF::FrameTime& inTime,
-                                 const ML::CutlistRenderParams& inParams)
+    // Params reducing 1080 rows of 16 columns to inHeight.
+    static CutlistRenderParams Reducing(std::uint32_t inHeight, std::uint32_t inQuality = 4)
     {
-        MF::FrameTime conformed;
-        inSource->ConformFrameTime(inTime, inParams, conformed);
-        return conformed;
-    }
-
-    static FrameRef Render(const SourceRef& inSource, const MF::FrameTime& inTime,
-                           const ML::CutlistRenderParams& inParams)
-    {
-        FrameRef frame;
-        inSource->RenderFrame(inTime, inParams, frame);
-        return frame;
-    }
-
-    // Params reducing 1080 rows to inHeight.
-    static ML::CutlistRenderParams Reducing(std::uint32_t inHeight)
-    {
-        ML::CutlistRenderParams params = MakeParams(16, inHeight);
+        CutlistRenderParams params = MakeParams(16, inHeight, inQuality);
         params.mVerticalScale = static_cast<double>(inHeight) / 1080.0;
         params.mFullFrameHeight = 1080;
         return params;
+    }
+
+    // Slot-1 rows hold the marker of inTime's first time, slot-2 rows of its second.
+    static ::testing::AssertionResult RowsFrom(const FrameRef& inFrame, const MF::FrameTime& inTime)
+    {
+        return RowsAre(inFrame, Marker(inTime.GetFirstFieldTime(), 1),
+                       Marker(inTime.GetSecondFieldTime(), 2));
     }
 
     const TickTime mT = Ticks(3 * kFrame);
@@ -46,109 +35,136 @@ protected:
 
 TEST_F(ScalerTest, AFrameAlreadyAtTheRequestedBoundsAndRatioPassesUnchanged)
 {
+    const CutlistRenderParams params = MakeParams(8, 6);
     auto progressive = MakeMarkedSource(Delivery::kProgressive);
-    const SourceRef scaler = ML::ScaleAndPARCorrectSource(progressive);
-    const ML::CutlistRenderParams params = MakeParams(8, 6);
-    const FrameRef frame = Render(scaler, MF::FrameTime(mT), params);
-    EXPECT_TRUE(frame == progressive->LastFrame());
-
+    EXPECT_TRUE(progressive->IsLastFrame(
+        Render(*ScaleAndPARCorrectSource(progressive), MF::FrameTime(mT), params)));
     // Interlaced in the requested order passes too.
     auto upper = MakeMarkedSource(Delivery::kUpperFirst);
-    const SourceRef upperScaler = ML::ScaleAndPARCorrectSource(upper);
-    const FrameRef interlaced = Render(upperScaler, MF::FrameTime(mT, mTField), params);
-    EXPECT_TRUE(interlaced == upper->LastFrame());
+    EXPECT_TRUE(upper->IsLastFrame(
+        Render(*ScaleAndPARCorrectSource(upper), MF::FrameTime(mT, mTField), params)));
+}
 
-    // Another pixel aspect ratio is corrected into a new frame.
-    ML::CutlistRenderParams wide = params;
-    wide.mPixelAspectRatio = mvxmediatypes::PixelAspectRatio(4, 3);
-    auto native =
-        MakeMarkedSource(Delivery::kProgressive, mvxmediatypes::kFrameRate_Video2997, 8, 6);
-    const SourceRef nativeScaler = ML::ScaleAndPARCorrectSource(native);
-    const FrameRef corrected = Render(nativeScaler, MF::FrameTime(mT), wide);
-    ASSERT_TRUE(corrected);
-    EXPECT_FALSE(corrected == native->LastFrame());
-    EXPECT_EQ(corrected->GetPixelAspectRatio(), mvxmediatypes::PixelAspectRatio(4, 3));
+TEST_F(ScalerTest, AnotherPixelAspectRatioIsCorrectedIntoANewFrameKeepingEveryRow)
+{
+    // 16 square columns become 8 of twice the width; rows stay as they were.
+    CutlistRenderParams wide = MakeParams(8, 6);
+    wide.mPixelAspectRatio = mvxmediatypes::PixelAspectRatio(2, 1);
+    for (const std::uint32_t width : {8u, 16u})
+    {
+        auto native = MakeMarkedSource(Delivery::kProgressive, width, 6);
+        const FrameRef corrected =
+            Render(*ScaleAndPARCorrectSource(native), MF::FrameTime(mT), wide);
+        ASSERT_TRUE(corrected);
+        EXPECT_FALSE(corrected == native->LastFrame());
+        EXPECT_EQ(corrected->GetPixelAspectRatio(), mvxmediatypes::PixelAspectRatio(2, 1));
+        EXPECT_EQ(corrected->GetBounds(), QRT::ParamRect(0, 0, 8, 6));
+        EXPECT_TRUE(RowsFrom(corrected, MF::FrameTime(mT))) << "from width " << width;
+    }
 }
 
 TEST_F(ScalerTest, Reducing1080iTo576iKeepsEveryFieldsRowsFromTheSameField)
 {
     for (const Delivery delivery : {Delivery::kUpperFirst, Delivery::kLowerFirst})
     {
-        auto source = MakeMarkedSource(delivery, mvxmediatypes::kFrameRate_Video2997, 16, 1080);
-        const SourceRef scaler = ML::ScaleAndPARCorrectSource(source);
-        const ML::CutlistRenderParams params = Reducing(576);
+        auto source = MakeMarkedSource(delivery, 16, 1080);
         const MF::FrameTime request = delivery == Delivery::kUpperFirst
                                           ? MF::FrameTime(mT, mTField)
                                           : MF::FrameTime(mTField, mT);
-        const FrameRef frame = Render(scaler, request, params);
+        const FrameRef frame = Render(*ScaleAndPARCorrectSource(source), request, Reducing(576));
         ASSERT_TRUE(frame);
         EXPECT_EQ(frame->GetBounds(), QRT::ParamRect(0, 0, 16, 576));
         EXPECT_EQ(frame->GetFieldType(), request.GetFieldOrder());
-        for (std::int32_t y = 0; y < 576; ++y)
-        {
-            const Pixel expected = y % 2 == 0 ? Marker(request.GetFirstFieldTime(), 1)
-                                              : Marker(request.GetSecondFieldTime(), 2);
-            for (std::int32_t x = 0; x < 16; ++x)
-                ASSERT_EQ(ReadPixel(*frame, x, y), expected) << "row " << y;
-        }
+        EXPECT_TRUE(RowsFrom(frame, request));
     }
 }
 
 TEST_F(ScalerTest, AnInterlacedRequestForAnOddHeightIsRenderedOneRowTaller)
 {
-    auto source =
-        MakeMarkedSource(Delivery::kUpperFirst, mvxmediatypes::kFrameRate_Video2997, 16, 1080);
-    const SourceRef scaler = ML::ScaleAndPARCorrectSource(source);
-    const FrameRef frame = Render(scaler, MF::FrameTime(mT, mTField), Reducing(575));
-    ASSERT_TRUE(frame);
-    EXPECT_EQ(frame->GetBounds(), QRT::ParamRect(0, 0, 16, 576));
+    const SourceRef scaler =
+        ScaleAndPARCorrectSource(MakeMarkedSource(Delivery::kUpperFirst, 16, 1080));
+    EXPECT_EQ(Render(*scaler, MF::FrameTime(mT, mTField), Reducing(575))->GetBounds(),
+              QRT::ParamRect(0, 0, 16, 576));
     // A progressive request keeps the odd height.
-    const FrameRef progressive = Render(scaler, MF::FrameTime(mTField), Reducing(575));
-    EXPECT_EQ(progressive->GetBounds(), QRT::ParamRect(0, 0, 16, 575));
+    EXPECT_EQ(Render(*scaler, MF::FrameTime(mTField), Reducing(575))->GetBounds(),
+              QRT::ParamRect(0, 0, 16, 575));
 }
 
 TEST_F(ScalerTest, AProgressiveRequestWhileReducingTakesTheNearestField)
 {
-    auto upper =
-        MakeMarkedSource(Delivery::kUpperFirst, mvxmediatypes::kFrameRate_Video2997, 16, 1080);
-    auto lower =
-        MakeMarkedSource(Delivery::kLowerFirst, mvxmediatypes::kFrameRate_Video2997, 16, 1080);
-    const SourceRef upperScaler = ML::ScaleAndPARCorrectSource(upper);
-    const SourceRef lowerScaler = ML::ScaleAndPARCorrectSource(lower);
-    const ML::CutlistRenderParams params = Reducing(540);
-
+    auto upper = MakeMarkedSource(Delivery::kUpperFirst, 16, 1080);
+    const SourceRef upperScaler = ScaleAndPARCorrectSource(upper);
+    const SourceRef lowerScaler =
+        ScaleAndPARCorrectSource(MakeMarkedSource(Delivery::kLowerFirst, 16, 1080));
+    const CutlistRenderParams params = Reducing(540);
     // Halfway between the fields: the field before the requested time when
     // it is the second one, else the first.
     const MF::FrameTime halfway(Ticks(3 * kFrame + kField / 2));
-    EXPECT_EQ(Conform(lowerScaler, halfway, params), MF::FrameTime(mT));
-    EXPECT_EQ(Conform(upperScaler, halfway, params), MF::FrameTime(mT));
+    EXPECT_EQ(Conform(*lowerScaler, halfway, params), MF::FrameTime(mT));
+    EXPECT_EQ(Conform(*upperScaler, halfway, params), MF::FrameTime(mT));
     const MF::FrameTime nearLater(mTField - Ticks(1));
-    EXPECT_EQ(Conform(upperScaler, nearLater, params), MF::FrameTime(mTField));
+    EXPECT_EQ(Conform(*upperScaler, nearLater, params), MF::FrameTime(mTField));
     // Without a vertical reduction upstream's answer stands.
-    EXPECT_EQ(Conform(upperScaler, nearLater, MakeParams(16, 1080)), MF::FrameTime(mT, mTField));
+    EXPECT_EQ(Conform(*upperScaler, nearLater, MakeParams(16, 1080)), MF::FrameTime(mT, mTField));
 
     // Every row comes from the field nearest the requested time.
     for (const auto& [scaler, slot] : {std::pair{upperScaler, 2}, std::pair{lowerScaler, 1}})
     {
-        const FrameRef frame = Render(scaler, MF::FrameTime(mTField), params);
+        const FrameRef frame = Render(*scaler, MF::FrameTime(mTField), params);
         ASSERT_TRUE(frame);
         EXPECT_EQ(frame->GetBounds(), QRT::ParamRect(0, 0, 16, 540));
-        for (std::int32_t y = 0; y < 540; ++y)
-            ASSERT_EQ(ReadPixel(*frame, 5, y), Marker(mTField, slot)) << "row " << y;
+        EXPECT_TRUE(AllPixelsAre(frame, Marker(mTField, slot)));
     }
 }
 
 TEST_F(ScalerTest, OppositeFieldOrderIsReportedSwappedWhenReducing)
 {
-    auto upper =
-        MakeMarkedSource(Delivery::kUpperFirst, mvxmediatypes::kFrameRate_Video2997, 16, 1080);
-    const SourceRef scaler = ML::ScaleAndPARCorrectSource(upper);
+    auto upper = MakeMarkedSource(Delivery::kUpperFirst, 16, 1080);
+    const SourceRef scaler = ScaleAndPARCorrectSource(upper);
     const MF::FrameTime lowerFirst(mTField, mT);
-    EXPECT_EQ(Conform(scaler, lowerFirst, Reducing(576)), MF::FrameTime(mTField, mT));
-    EXPECT_EQ(Conform(scaler, lowerFirst, MakeParams(16, 1080)), MF::FrameTime(mT, mTField));
-    ML::RenderableNodePrefetchList prefetches;
+    EXPECT_EQ(Conform(*scaler, lowerFirst, Reducing(576)), MF::FrameTime(mTField, mT));
+    EXPECT_EQ(Conform(*scaler, lowerFirst, MakeParams(16, 1080)), MF::FrameTime(mT, mTField));
+    RenderableNodePrefetchList prefetches;
     scaler->CollectPrefetches(lowerFirst, Reducing(576), prefetches);
     EXPECT_EQ(upper->Prefetched().at(0), MF::FrameTime(mT, mTField));
+    EXPECT_EQ(FieldRateOf(*scaler), mvxmediatypes::kFrameRate_Video5994);
+}
+
+// Below quality 3 a full-frame rendering delivered at exactly the requested
+// time is handed on whole, for the consumer to reduce with the rest of its
+// layer; any other case is scaled to the requested size.
+TEST_F(ScalerTest, DraftQualityKeepsAFullFrameRenderingAtTheRequestedTimeWhole)
+{
+    const struct
+    {
+        std::uint32_t mQuality;
+        Delivery mDelivery;
+        std::uint32_t mNativeHeight;
+        MF::FrameTime mRequest;
+        bool mWhole;
+    } cases[] = {
+        {2, Delivery::kProgressive, 1080, MF::FrameTime(mT), true},
+        {0, Delivery::kUpperFirst, 1080, MF::FrameTime(mT, mTField), true},
+        {3, Delivery::kProgressive, 1080, MF::FrameTime(mT), false},
+        // Not the full frame.
+        {2, Delivery::kProgressive, 720, MF::FrameTime(mT), false},
+        // Upstream delivers another time than the one requested.
+        {2, Delivery::kProgressive, 1080, MF::FrameTime(mT + Ticks(5)), false},
+        {2, Delivery::kUpperFirst, 1080, MF::FrameTime(mTField, mT), false},
+    };
+    for (const auto& c : cases)
+    {
+        SCOPED_TRACE(testing::Message()
+                     << "quality " << c.mQuality << " delivery " << int(c.mDelivery) << " height "
+                     << c.mNativeHeight << " request " << c.mRequest.GetTime().GetTicks());
+        auto source = MakeMarkedSource(c.mDelivery, 16, c.mNativeHeight);
+        const FrameRef frame =
+            Render(*ScaleAndPARCorrectSource(source), c.mRequest, Reducing(540, c.mQuality));
+        ASSERT_TRUE(frame);
+        EXPECT_EQ(frame == source->LastFrame(), c.mWhole);
+        EXPECT_EQ(frame->GetBounds().Height(), c.mWhole ? 1080 : 540);
+    }
 }
 
 } // namespace
+} // namespace ML::Test

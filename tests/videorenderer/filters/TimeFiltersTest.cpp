@@ -2,19 +2,16 @@
 // weighted sums of frame blending at speeds 0.5 and 2.5, and the cases that
 // hand the upstream frame through untouched.
 
-#include "FilterTestSources.h"
+#include "../sources/ScriptedSources.h"
 #include "MF/TimeTransform.h"
 #include "ML/RenderableSourceFilters.h"
 
 #include <cmath>
 
-#include <gtest/gtest.h>
-
+namespace ML::Test
+{
 namespace
 {
-
-using namespace FilterTest;
-using SourceRef = QRT::InterfaceRef<ML::IRenderableSource>;
 
 // (weight, marker) pairs summed channel by channel.
 Pixel WeightedSum(std::initializer_list<std::pair<double, Pixel>> inParts)
@@ -35,127 +32,111 @@ Pixel WeightedSum(std::initializer_list<std::pair<double, Pixel>> inParts)
 class TimeFiltersTest : public ::testing::Test
 {
 protected:
-    static constexpr std::uint32_t kWidth = 4;
-    static constexpr std::uint32_t kHeight = 6;
-
-    static FrameRef Render(const SourceRef& inSource, const MF::FrameTime& inTime,
-                           const ML::CutlistRenderParams& inParams)
+    // Rows alternate between the two slots' pixels, each channel within one step.
+    static ::testing::AssertionResult RowsNear(const FrameRef& inFrame, Pixel inFirst,
+                                               Pixel inSecond)
     {
-        FrameRef frame;
-        inSource->RenderFrame(inTime, inParams, frame);
-        return frame;
-    }
-
-    static MF::FrameTime Conform(const SourceRef& inSource, const MF::FrameTime& inTime,
-                                 const ML::CutlistRenderParams& inParams)
-    {
-        MF::FrameTime conformed;
-        inSource->ConformFrameTime(inTime, inParams, conformed);
-        return conformed;
-    }
-
-    static void ExpectRows(const FrameRef& inFrame, Pixel inFirstSlot, Pixel inSecondSlot,
-                           int inTolerance = 0)
-    {
-        ASSERT_TRUE(inFrame);
-        for (std::int32_t y = 0; y < static_cast<std::int32_t>(kHeight); ++y)
-            for (std::int32_t x = 0; x < static_cast<std::int32_t>(kWidth); ++x)
-            {
-                const Pixel got = ReadPixel(*inFrame, x, y);
-                const Pixel want = y % 2 == 0 ? inFirstSlot : inSecondSlot;
-                ASSERT_LE(std::abs(got.mB - want.mB), inTolerance) << "row " << y;
-                ASSERT_LE(std::abs(got.mG - want.mG), inTolerance) << "row " << y;
-                ASSERT_LE(std::abs(got.mR - want.mR), inTolerance) << "row " << y;
-                ASSERT_LE(std::abs(got.mA - want.mA), inTolerance) << "row " << y;
-            }
+        if (!inFrame)
+            return ::testing::AssertionFailure() << "no frame";
+        for (std::int32_t y = 0; y < inFrame->GetBounds().Height(); ++y)
+        {
+            const Pixel got = ReadPixel(*inFrame, 0, y);
+            const Pixel want = y % 2 == 0 ? inFirst : inSecond;
+            if (std::abs(got.mB - want.mB) > 1 || std::abs(got.mG - want.mG) > 1 ||
+                std::abs(got.mR - want.mR) > 1 || std::abs(got.mA - want.mA) > 1)
+                return ::testing::AssertionFailure()
+                       << "row " << y << " is " << got << ", expected " << want;
+        }
+        return RowsAre(inFrame, ReadPixel(*inFrame, 0, 0), ReadPixel(*inFrame, 0, 1));
     }
 
     static TickTime F(std::int64_t inFields) { return Ticks(inFields * kField); }
-
     static SourceRef Blend(const SourceRef& inUpstream, double inRate)
     {
-        return ML::TimeBlendSource(inUpstream, MF::CreateTimeTransform(inRate), inRate);
+        return TimeBlendSource(inUpstream, MF::CreateTimeTransform(inRate), inRate);
+    }
+    std::vector<MF::FrameTime> Prefetches(IRenderableSource& inFilter,
+                                          const MarkedSource& inUpstream,
+                                          const MF::FrameTime& inTime) const
+    {
+        RenderableNodePrefetchList prefetches;
+        const std::size_t before = inUpstream.Prefetched().size();
+        inFilter.CollectPrefetches(inTime, mParams, prefetches);
+        const std::vector<MF::FrameTime> all = inUpstream.Prefetched();
+        return {all.begin() + static_cast<std::ptrdiff_t>(before), all.end()};
     }
 
-    const ML::CutlistRenderParams mParams = MakeParams(kWidth, kHeight);
+    const CutlistRenderParams mParams = MakeParams(4, 6);
 };
 
 TEST_F(TimeFiltersTest, TimeMixOfARequestUpstreamDeliversReturnsTheUpstreamFrameObject)
 {
     auto upper = MakeMarkedSource(Delivery::kUpperFirst);
-    const SourceRef mix = ML::TimeMixSource(upper);
+    const SourceRef mix = TimeMixSource(upper);
     const MF::FrameTime request(F(6), F(7));
-    EXPECT_EQ(Conform(mix, request, mParams), request);
-    const FrameRef frame = Render(mix, request, mParams);
-    EXPECT_TRUE(frame == upper->LastFrame());
-    mvxmediatypes::FrameRate rate;
-    mix->GetFrameRate(rate);
-    EXPECT_EQ(rate, mvxmediatypes::kFrameRate_Video5994);
+    EXPECT_EQ(Conform(*mix, request, mParams), request);
+    EXPECT_TRUE(upper->IsLastFrame(Render(*mix, request, mParams)));
+    EXPECT_EQ(RateOf(*mix), mvxmediatypes::kFrameRate_Video5994);
 }
 
 TEST_F(TimeFiltersTest, TimeMixTakesEachFieldFromTheUpstreamFieldAtItsTimeInBothOrders)
 {
     auto upper = MakeMarkedSource(Delivery::kUpperFirst);
-    const SourceRef mix = ML::TimeMixSource(upper);
+    const SourceRef mix = TimeMixSource(upper);
     // The request straddles upstream frames 3 (fields 6, 7) and 4 (fields 8, 9).
     const MF::FrameTime upperFirst(F(7), F(8));
-    ExpectRows(Render(mix, upperFirst, mParams), Marker(F(7), 2), Marker(F(8), 1));
-    const MF::FrameTime lowerFirst(F(8), F(7));
-    ExpectRows(Render(mix, lowerFirst, mParams), Marker(F(8), 1), Marker(F(7), 2));
-
+    EXPECT_TRUE(RowsAre(Render(*mix, upperFirst, mParams), Marker(F(7), 2), Marker(F(8), 1)));
+    EXPECT_TRUE(RowsAre(Render(*mix, MF::FrameTime(F(8), F(7)), mParams), Marker(F(8), 1),
+                        Marker(F(7), 2)));
     // Prefetches: the frame for the second time, then the one for the first.
-    ML::RenderableNodePrefetchList prefetches;
-    mix->CollectPrefetches(upperFirst, mParams, prefetches);
-    ASSERT_EQ(upper->Prefetched().size(), 2u);
-    EXPECT_EQ(upper->Prefetched()[0], MF::FrameTime(F(8), F(9)));
-    EXPECT_EQ(upper->Prefetched()[1], MF::FrameTime(F(6), F(7)));
-
+    EXPECT_EQ(Prefetches(*mix, *upper, upperFirst),
+              (std::vector{MF::FrameTime(F(8), F(9)), MF::FrameTime(F(6), F(7))}));
     // Times off the field grid are aligned down to it.
-    EXPECT_EQ(Conform(mix, MF::FrameTime(F(7) + Ticks(5), F(8) + Ticks(5)), mParams), upperFirst);
+    EXPECT_EQ(Conform(*mix, MF::FrameTime(F(7) + Ticks(5), F(8) + Ticks(5)), mParams), upperFirst);
 }
 
-TEST_F(TimeFiltersTest, TimeMixOfAProgressiveRequestInsideOneInterlacedFrameKeepsTheFieldAtItsTime)
+TEST_F(TimeFiltersTest, TimeMixOfAProgressiveRequestKeepsTheFieldOrFrameAtItsTime)
 {
     auto upper = MakeMarkedSource(Delivery::kUpperFirst);
-    const SourceRef mix = ML::TimeMixSource(upper);
-    const FrameRef frame = Render(mix, MF::FrameTime(F(7)), mParams);
-    ExpectRows(frame, Marker(F(7), 2), Marker(F(7), 2));
+    const SourceRef mix = TimeMixSource(upper);
+    EXPECT_TRUE(
+        RowsAre(Render(*mix, MF::FrameTime(F(7)), mParams), Marker(F(7), 2), Marker(F(7), 2)));
     EXPECT_EQ(upper->Rendered().size(), 1u);
-    ExpectRows(Render(mix, MF::FrameTime(F(6)), mParams), Marker(F(6), 1), Marker(F(6), 1));
-}
-
-TEST_F(TimeFiltersTest, TimeMixOfProgressiveMaterialOffItsGridKeepsTheWholeFrame)
-{
+    EXPECT_TRUE(
+        RowsAre(Render(*mix, MF::FrameTime(F(6)), mParams), Marker(F(6), 1), Marker(F(6), 1)));
+    // Progressive material off its grid keeps the whole frame.
     auto progressive = MakeMarkedSource(Delivery::kProgressive);
-    const SourceRef mix = ML::TimeMixSource(progressive);
-    const FrameRef frame = Render(mix, MF::FrameTime(F(7)), mParams);
+    const FrameRef frame = Render(*TimeMixSource(progressive), MF::FrameTime(F(7)), mParams);
     EXPECT_TRUE(frame == progressive->LastFrame());
-    ExpectRows(frame, Marker(F(6), 1), Marker(F(6), 2));
+    EXPECT_TRUE(RowsAre(frame, Marker(F(6), 1), Marker(F(6), 2)));
 }
 
-TEST_F(TimeFiltersTest, TimeMixAtDraftQualityForTheSecondFieldConformsToItsProgressiveTime)
+TEST_F(TimeFiltersTest, TimeMixAtDraftQualityForOneFieldConformsToItsProgressiveTime)
 {
-    auto follow = MakeMarkedSource(Delivery::kFollowRequest);
-    const SourceRef mix = ML::TimeMixSource(follow);
-    ML::CutlistRenderParams params = mParams;
-    params.mQuality = 2;
-    params.mSingleField = 2;
-    EXPECT_EQ(Conform(mix, MF::FrameTime(F(6), F(7)), params), MF::FrameTime(F(7)));
-    params.mSingleField = 1;
-    EXPECT_EQ(Conform(mix, MF::FrameTime(F(6), F(7)), params), MF::FrameTime(F(6)));
-    params.mQuality = 3;
-    EXPECT_EQ(Conform(mix, MF::FrameTime(F(6), F(7)), params), MF::FrameTime(F(6), F(7)));
+    const SourceRef mix = TimeMixSource(MakeMarkedSource(Delivery::kFollowRequest));
+    const struct
+    {
+        std::uint32_t mQuality;
+        std::uint32_t mSingleField;
+        MF::FrameTime mConformed;
+    } cases[] = {{2, 2, MF::FrameTime(F(7))},
+                 {2, 1, MF::FrameTime(F(6))},
+                 {3, 1, MF::FrameTime(F(6), F(7))}};
+    for (const auto& c : cases)
+    {
+        CutlistRenderParams params = MakeParams(4, 6, c.mQuality);
+        params.mSingleField = c.mSingleField;
+        EXPECT_EQ(Conform(*mix, MF::FrameTime(F(6), F(7)), params), c.mConformed)
+            << "quality " << c.mQuality << " single field " << c.mSingleField;
+    }
 }
 
 TEST_F(TimeFiltersTest, TimeBlendAtSpeedOneOnTheGridReturnsTheUpstreamFrameUnblended)
 {
     auto upper = MakeMarkedSource(Delivery::kUpperFirst);
     const SourceRef blend = Blend(upper, 1.0);
-    const FrameRef frame = Render(blend, MF::FrameTime(F(6), F(7)), mParams);
-    EXPECT_TRUE(frame == upper->LastFrame());
-    mvxmediatypes::FrameRate rate;
-    blend->GetFrameRate(rate);
-    EXPECT_EQ(rate, mvxmediatypes::kFrameRate_Video1000);
+    EXPECT_TRUE(upper->IsLastFrame(Render(*blend, MF::FrameTime(F(6), F(7)), mParams)));
+    EXPECT_EQ(RateOf(*blend), mvxmediatypes::kFrameRate_Video1000);
 }
 
 TEST_F(TimeFiltersTest, TimeBlendAtHalfSpeedBlendsTheTwoFieldsAroundEachOutputField)
@@ -164,36 +145,31 @@ TEST_F(TimeFiltersTest, TimeBlendAtHalfSpeedBlendsTheTwoFieldsAroundEachOutputFi
     const SourceRef blend = Blend(upper, 0.5);
     // Output fields at 6.25 and 6.75 upstream fields: both between fields 6 and 7.
     const MF::FrameTime request(Ticks(6 * kField + kField / 4), Ticks(6 * kField + 3 * kField / 4));
-    EXPECT_EQ(Conform(blend, request, mParams), request);
-    const FrameRef frame = Render(blend, request, mParams);
+    EXPECT_EQ(Conform(*blend, request, mParams), request);
     const Pixel six = Marker(F(6), 1);
     const Pixel seven = Marker(F(7), 2);
-    ExpectRows(frame, WeightedSum({{0.75, six}, {0.25, seven}}),
-               WeightedSum({{0.25, six}, {0.75, seven}}), 1);
+    EXPECT_TRUE(RowsNear(Render(*blend, request, mParams),
+                         WeightedSum({{0.75, six}, {0.25, seven}}),
+                         WeightedSum({{0.25, six}, {0.75, seven}})));
     // Four samples, one upstream frame holds them all: rendered once.
     EXPECT_EQ(upper->Rendered().size(), 1u);
 
     // Between two upstream frames: fields 7.5 and 8.
     const MF::FrameTime straddling(Ticks(7 * kField + kField / 2), F(8));
-    ExpectRows(Render(blend, straddling, mParams),
-               WeightedSum({{0.5, seven}, {0.5, Marker(F(8), 1)}}), Marker(F(8), 1), 1);
-    ML::RenderableNodePrefetchList prefetches;
-    blend->CollectPrefetches(straddling, mParams, prefetches);
-    ASSERT_EQ(upper->Prefetched().size(), 2u);
-    EXPECT_EQ(upper->Prefetched()[0], MF::FrameTime(F(6), F(7)));
-    EXPECT_EQ(upper->Prefetched()[1], MF::FrameTime(F(8), F(9)));
+    EXPECT_TRUE(RowsNear(Render(*blend, straddling, mParams),
+                         WeightedSum({{0.5, seven}, {0.5, Marker(F(8), 1)}}), Marker(F(8), 1)));
+    EXPECT_EQ(Prefetches(*blend, *upper, straddling),
+              (std::vector{MF::FrameTime(F(6), F(7)), MF::FrameTime(F(8), F(9))}));
 }
 
 TEST_F(TimeFiltersTest, TimeBlendOfAProgressiveRequestBlendsTheFramesAroundItsSecondTime)
 {
-    auto progressive = MakeMarkedSource(Delivery::kProgressive);
-    const SourceRef blend = Blend(progressive, 0.5);
-    const MF::FrameTime request(Ticks(3 * kFrame + kFrame / 4));
-    const FrameRef frame = Render(blend, request, mParams);
+    const SourceRef blend = Blend(MakeMarkedSource(Delivery::kProgressive), 0.5);
     const TickTime three = Ticks(3 * kFrame);
     const TickTime four = Ticks(4 * kFrame);
-    ExpectRows(frame, WeightedSum({{0.75, Marker(three, 1)}, {0.25, Marker(four, 1)}}),
-               WeightedSum({{0.75, Marker(three, 2)}, {0.25, Marker(four, 2)}}), 1);
+    EXPECT_TRUE(RowsNear(Render(*blend, MF::FrameTime(Ticks(3 * kFrame + kFrame / 4)), mParams),
+                         WeightedSum({{0.75, Marker(three, 1)}, {0.25, Marker(four, 1)}}),
+                         WeightedSum({{0.75, Marker(three, 2)}, {0.25, Marker(four, 2)}})));
 }
 
 TEST_F(TimeFiltersTest, TimeBlendAtTwoAndAHalfAccumulatesEveryFieldInEachOutputFieldsSpan)
@@ -202,35 +178,29 @@ TEST_F(TimeFiltersTest, TimeBlendAtTwoAndAHalfAccumulatesEveryFieldInEachOutputF
     const SourceRef blend = Blend(upper, 2.5);
     // Fields 6 and 8.5: spans [6, 8.5) and [8.5, 11) of upstream fields.
     const MF::FrameTime request(F(6), Ticks(8 * kField + kField / 2));
-    const FrameRef frame = Render(blend, request, mParams);
-    ExpectRows(
-        frame,
+    EXPECT_TRUE(RowsNear(
+        Render(*blend, request, mParams),
         WeightedSum({{0.4, Marker(F(6), 1)}, {0.4, Marker(F(7), 2)}, {0.2, Marker(F(8), 1)}}),
-        WeightedSum({{0.2, Marker(F(8), 1)}, {0.4, Marker(F(9), 2)}, {0.4, Marker(F(10), 1)}}), 1);
-    // Upstream frames 3, 4 and 5, each once.
-    ASSERT_EQ(upper->Rendered().size(), 3u);
-    EXPECT_EQ(upper->Rendered()[0], MF::FrameTime(F(6), F(7)));
-    EXPECT_EQ(upper->Rendered()[1], MF::FrameTime(F(8), F(9)));
-    EXPECT_EQ(upper->Rendered()[2], MF::FrameTime(F(10), F(11)));
-    ML::RenderableNodePrefetchList prefetches;
-    blend->CollectPrefetches(request, mParams, prefetches);
-    EXPECT_EQ(upper->Prefetched(), upper->Rendered());
+        WeightedSum({{0.2, Marker(F(8), 1)}, {0.4, Marker(F(9), 2)}, {0.4, Marker(F(10), 1)}})));
+    // Upstream frames 3, 4 and 5, each once, and prefetched the same.
+    const std::vector frames{MF::FrameTime(F(6), F(7)), MF::FrameTime(F(8), F(9)),
+                             MF::FrameTime(F(10), F(11))};
+    EXPECT_EQ(upper->Rendered(), frames);
+    EXPECT_EQ(Prefetches(*blend, *upper, request), frames);
 }
 
 TEST_F(TimeFiltersTest, TimeBlendBelowQualityThreeBehavesAsTimeMix)
 {
     auto upper = MakeMarkedSource(Delivery::kUpperFirst);
     const SourceRef blend = Blend(upper, 0.5);
-    const SourceRef mix = ML::TimeMixSource(upper);
-    ML::CutlistRenderParams params = mParams;
-    params.mQuality = 2;
+    const SourceRef mix = TimeMixSource(upper);
+    const CutlistRenderParams params = MakeParams(4, 6, 2);
     const MF::FrameTime request(F(7) + Ticks(11), F(8) + Ticks(11));
-    EXPECT_EQ(Conform(blend, request, params), Conform(mix, request, params));
-    const MF::FrameTime onGrid(F(7), F(8));
-    const FrameRef blended = Render(blend, onGrid, params);
-    ExpectRows(blended, Marker(F(7), 2), Marker(F(8), 1));
-    const FrameRef mixed = Render(mix, onGrid, params);
-    ExpectRows(mixed, Marker(F(7), 2), Marker(F(8), 1));
+    EXPECT_EQ(Conform(*blend, request, params), Conform(*mix, request, params));
+    for (const SourceRef& filter : {blend, mix})
+        EXPECT_TRUE(RowsAre(Render(*filter, MF::FrameTime(F(7), F(8)), params), Marker(F(7), 2),
+                            Marker(F(8), 1)));
 }
 
 } // namespace
+} // namespace ML::Test

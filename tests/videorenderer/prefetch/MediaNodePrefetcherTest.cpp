@@ -1,69 +1,75 @@
 #include "prefetch/MediaNodePrefetcher.h"
 
-#include "BE/VideoSources.h"
 #include "ML/RenderStatus.h"
-#include "PrefetchTestSupport.h"
-#include "prefetch/VideoSourcePrefetcher.h"
+#include "PrefetchFixture.h"
 
-#include <atomic>
 #include <random>
-#include <thread>
-#include <vector>
 
-#include <gtest/gtest.h>
-
+namespace ML::Test
+{
 namespace
 {
 
-using namespace prefetch_test;
-using PrefetchRef = QRT::InterfaceRef<ML::IRenderableNodePrefetch>;
+using PrefetchRef = QRT::InterfaceRef<IRenderableNodePrefetch>;
+using Asserted = std::vector<std::string>;
 
-constexpr const char* kTimeoutAssert =
+const std::string kTimeoutAssert =
     "false|We have timed out on an async source. This probably shouldn't happen and will result "
     "in performance problems.";
 
-TickTime At(int64_t inTicks)
-{
-    return TickTime::TicksToTime(inTicks);
-}
-
-class MediaNodePrefetcherTest : public PrefetchExecutorFixture
+class MediaNodePrefetcherTest : public PrefetchFixture
 {
 protected:
     void SetUp() override
     {
-        PrefetchExecutorFixture::SetUp();
-        ML::SilenceMediaNodePrefetchTimeoutAssertion(false);
-        mSource = QRT::Allocated<TestVideoSource>::CreateInstance();
+        PrefetchFixture::SetUp();
+        SilenceMediaNodePrefetchTimeoutAssertion(false);
     }
-
     void TearDown() override
     {
-        PrefetchExecutorFixture::TearDown();
-        ML::SilenceMediaNodePrefetchTimeoutAssertion(false);
+        PrefetchFixture::TearDown();
+        SilenceMediaNodePrefetchTimeoutAssertion(false);
     }
 
-    PrefetchRef Make(const SourceRef& inSource, int64_t inTicks)
+    static PrefetchRef Make(const VideoSourceRef& inSource, std::int64_t inTicks)
     {
-        return ML::CreateMediaNodePrefetcher(inSource, At(inTicks), {}, {}, {});
+        return CreateMediaNodePrefetcher(inSource, At(inTicks), {}, {}, {});
     }
-    PrefetchRef Make(int64_t inTicks) { return Make(SourceRef(mSource), inTicks); }
-
-    std::shared_ptr<Gate> BlockVideoExecutor()
+    PrefetchRef Make(std::int64_t inTicks) const { return Make(VideoSourceRef(mSource), inTicks); }
+    // Two started handles for one time of inSource.
+    static std::pair<PrefetchRef, PrefetchRef> StartTwo(const ScriptedSourceRef& inSource,
+                                                        std::int64_t inTicks)
     {
-        auto gate = std::make_shared<Gate>();
-        EXPECT_TRUE(mVideo->Post([gate] { gate->Wait(); }));
-        return gate;
+        std::pair handles{Make(VideoSourceRef(inSource), inTicks),
+                          Make(VideoSourceRef(inSource), inTicks)};
+        EXPECT_EQ(handles.first->InitiatePrefetch(), QRT::kResult_Success);
+        EXPECT_EQ(handles.second->InitiatePrefetch(), QRT::kResult_Success);
+        return handles;
     }
-
-    QRT::InterfaceRef<TestVideoSource> mSource;
+    // A source with enabled asynchronous reads that wants no prefetch.
+    static ScriptedSourceRef MakeAsync()
+    {
+        const ScriptedSourceRef async = MakeScriptedSource();
+        async->mAsyncEnabled = async->mNewFrames = true;
+        return async;
+    }
+    // The frame the handle delivers (the call must succeed).
+    static FrameRef Taken(const PrefetchRef& inHandle)
+    {
+        FrameRef frame;
+        EXPECT_EQ(inHandle->GetPrefetchedFrame(frame), QRT::kResult_Success);
+        return frame;
+    }
+    static std::uint32_t Dependencies(const Guid& inKey)
+    {
+        return VF::SharedVideoFrameCache::GetInstance().GetDependencyCount(inKey);
+    }
 };
 
-TEST_F(MediaNodePrefetcherTest, NoHandleWhenTheSourceNeedsNoPrefetch)
+TEST_F(MediaNodePrefetcherTest, AHandleOnlyWhenTheSourceWantsPrefetchOrReadsAsynchronously)
 {
     mSource->mPrefetchWanted = false;
     EXPECT_FALSE(Make(1));
-
     mSource->mPrefetchWanted = true;
     const PrefetchRef handle = Make(1);
     ASSERT_TRUE(handle);
@@ -71,365 +77,235 @@ TEST_F(MediaNodePrefetcherTest, NoHandleWhenTheSourceNeedsNoPrefetch)
     handle->GetPrefetchKey(key);
     EXPECT_EQ(key, mSource->KeyFor(At(1)));
 
-    // An enabled asynchronous source gets a handle even when it wants no prefetch.
-    const auto async = QRT::Allocated<TestAsyncVideoSource>::CreateInstance();
-    EXPECT_TRUE(Make(SourceRef(async), 1));
-    async->mEnabled = false;
-    EXPECT_FALSE(Make(SourceRef(async), 1));
+    const ScriptedSourceRef async = MakeAsync();
+    EXPECT_TRUE(Make(VideoSourceRef(async), 1));
+    async->mAsyncEnabled = false;
+    EXPECT_FALSE(Make(VideoSourceRef(async), 1));
 }
 
-TEST_F(MediaNodePrefetcherTest, QueuedReadDeliversTheFrameThroughTheCache)
-{
-    const PrefetchRef handle = Make(3);
-    const Guid key = mSource->KeyFor(At(3));
-    EXPECT_EQ(handle->InitiatePrefetch(), QRT::kResult_Success);
-    EXPECT_EQ(VF::SharedVideoFrameCache::GetInstance().GetDependencyCount(key), 1u);
-    EXPECT_EQ(ML::GetMediaNodePrefetchReferenceCount(key), 1u);
-    Drain(mVideo);
-
-    EXPECT_FALSE(handle->ContinueWaitingForPrefetch(0.0));
-    FrameRef frame;
-    EXPECT_EQ(handle->GetPrefetchedFrame(frame), QRT::kResult_Success);
-    ASSERT_TRUE(frame);
-    EXPECT_EQ(frame.Get(), VF::SharedVideoFrameCache::RetrieveFromCache(key).Get());
-    EXPECT_EQ(mSource->ReadTicks(), (std::vector<int64_t>{3}));
-    EXPECT_EQ(ML::GetMediaNodePrefetchReferenceCount(key), 0u);
-
-    handle->CancelPrefetch();
-    EXPECT_EQ(VF::SharedVideoFrameCache::GetInstance().GetDependencyCount(key), 0u);
-}
-
-TEST_F(MediaNodePrefetcherTest, PendingUntilTheReadRuns)
+TEST_F(MediaNodePrefetcherTest, AQueuedReadIsPendingUntilItRunsThenDeliversThroughTheCache)
 {
     const auto gate = BlockVideoExecutor();
-    const PrefetchRef handle = Make(2);
-    handle->InitiatePrefetch();
+    const Guid key = mSource->KeyFor(At(3));
+    const PrefetchRef handle = Make(3);
+    EXPECT_EQ(handle->InitiatePrefetch(), QRT::kResult_Success);
+    EXPECT_EQ(Dependencies(key), 1u);
+    EXPECT_EQ(GetMediaNodePrefetchReferenceCount(key), 1u);
     FrameRef frame;
-    EXPECT_EQ(handle->GetPrefetchedFrame(frame), ML::kResult_PrefetchIncomplete);
+    EXPECT_EQ(handle->GetPrefetchedFrame(frame), kResult_PrefetchIncomplete);
     EXPECT_FALSE(frame);
     EXPECT_TRUE(handle->ContinueWaitingForPrefetch(1.0));
+
     gate->Open();
     Drain(mVideo);
-    EXPECT_FALSE(handle->ContinueWaitingForPrefetch(1.0));
-    EXPECT_EQ(handle->GetPrefetchedFrame(frame), QRT::kResult_Success);
-    EXPECT_TRUE(frame);
+    EXPECT_FALSE(handle->ContinueWaitingForPrefetch(0.0));
+    frame = Taken(handle);
+    ASSERT_TRUE(frame);
+    EXPECT_EQ(frame.Get(), VF::SharedVideoFrameCache::RetrieveFromCache(key).Get());
+    EXPECT_EQ(mSource->ReadTicks(), (std::vector<std::int64_t>{3}));
+    EXPECT_EQ(GetMediaNodePrefetchReferenceCount(key), 0u);
+    handle->CancelPrefetch();
+    EXPECT_EQ(Dependencies(key), 0u);
 }
 
-TEST_F(MediaNodePrefetcherTest, TwoHandlesForOneKeyShareOneRead)
+TEST_F(MediaNodePrefetcherTest, HandlesForOneKeyShareOneReadThatTheLastCancelWithdraws)
 {
-    const auto gate = BlockVideoExecutor();
-    const Guid key = mSource->KeyFor(At(5));
-    PrefetchRef first = Make(5);
-    const PrefetchRef second = Make(5);
-    first->InitiatePrefetch();
-    second->InitiatePrefetch();
-    EXPECT_EQ(ML::GetMediaNodePrefetchReferenceCount(key), 2u);
-    EXPECT_EQ(ML::GetQueuedVideoSourcePrefetchCount(), 1u);
-
-    // Cancelling the first leaves the read to the second.
-    first->CancelPrefetch();
-    first.Reset();
-    EXPECT_EQ(ML::GetMediaNodePrefetchReferenceCount(key), 1u);
-    EXPECT_EQ(ML::GetQueuedVideoSourcePrefetchCount(), 1u);
-
-    gate->Open();
-    Drain(mVideo);
-    FrameRef frame;
-    EXPECT_EQ(second->GetPrefetchedFrame(frame), QRT::kResult_Success);
-    EXPECT_TRUE(frame);
-    EXPECT_EQ(mSource->ReadTicks(), (std::vector<int64_t>{5}));
-    EXPECT_EQ(ML::GetMediaNodePrefetchReferenceCount(key), 0u);
-}
-
-TEST_F(MediaNodePrefetcherTest, CancellingTheLastHandleCancelsTheQueuedRead)
-{
-    const auto gate = BlockVideoExecutor();
-    const Guid key = mSource->KeyFor(At(6));
-    const PrefetchRef first = Make(6);
-    const PrefetchRef second = Make(6);
-    first->InitiatePrefetch();
-    second->InitiatePrefetch();
-    first->CancelPrefetch();
-    second->CancelPrefetch();
-    EXPECT_EQ(ML::GetQueuedVideoSourcePrefetchCount(), 0u);
-    EXPECT_EQ(ML::GetMediaNodePrefetchReferenceCount(key), 0u);
-    EXPECT_EQ(VF::SharedVideoFrameCache::GetInstance().GetDependencyCount(key), 0u);
-    gate->Open();
-    Drain(mVideo);
-    EXPECT_TRUE(mSource->ReadTicks().empty());
+    for (const bool cancelBoth : {false, true})
+    {
+        SCOPED_TRACE(cancelBoth ? "both cancelled" : "one cancelled");
+        const auto gate = BlockVideoExecutor();
+        const std::int64_t ticks = cancelBoth ? 6 : 5;
+        const Guid key = mSource->KeyFor(At(ticks));
+        auto [first, second] = StartTwo(mSource, ticks);
+        EXPECT_EQ(GetMediaNodePrefetchReferenceCount(key), 2u);
+        EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 1u);
+        first->CancelPrefetch();
+        first.Reset();
+        EXPECT_EQ(GetMediaNodePrefetchReferenceCount(key), 1u);
+        EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 1u);
+        if (cancelBoth)
+        {
+            second->CancelPrefetch();
+            EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 0u);
+            EXPECT_EQ(Dependencies(key), 0u);
+        }
+        gate->Open();
+        Drain(mVideo);
+        if (!cancelBoth)
+        {
+            EXPECT_TRUE(Taken(second));
+        }
+        EXPECT_EQ(mSource->ReadTicks(), (std::vector<std::int64_t>{5}));
+        EXPECT_EQ(GetMediaNodePrefetchReferenceCount(key), 0u);
+    }
 }
 
 TEST_F(MediaNodePrefetcherTest, DestroyingAStartedHandleCancelsItsRead)
 {
     const auto gate = BlockVideoExecutor();
     const Guid key = mSource->KeyFor(At(8));
-    {
-        const PrefetchRef handle = Make(8);
-        handle->InitiatePrefetch();
-        EXPECT_EQ(ML::GetQueuedVideoSourcePrefetchCount(), 1u);
-    }
-    EXPECT_EQ(ML::GetQueuedVideoSourcePrefetchCount(), 0u);
-    EXPECT_EQ(ML::GetMediaNodePrefetchReferenceCount(key), 0u);
-    EXPECT_EQ(VF::SharedVideoFrameCache::GetInstance().GetDependencyCount(key), 0u);
+    Make(8)->InitiatePrefetch();
+    EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 0u);
+    EXPECT_EQ(GetMediaNodePrefetchReferenceCount(key), 0u);
+    EXPECT_EQ(Dependencies(key), 0u);
     gate->Open();
+    Drain(mVideo);
+    EXPECT_TRUE(mSource->ReadTicks().empty());
 }
 
 TEST_F(MediaNodePrefetcherTest, CachedFrameIsTakenAtOnce)
 {
     const Guid key = mSource->KeyFor(At(9));
-    const FrameRef cached = MakeFrame(6);
+    const FrameRef cached = MakeFilledFrame(6, 2, Pixel{});
     VF::SharedVideoFrameCache::InsertIntoCache(cached, key, VF::kCachePriority_High);
-
     const PrefetchRef handle = Make(9);
     EXPECT_EQ(handle->InitiatePrefetch(), QRT::kResult_Success);
-    EXPECT_EQ(ML::GetQueuedVideoSourcePrefetchCount(), 0u);
+    EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 0u);
     EXPECT_EQ(mSource->HoldCount(), 0);
-    EXPECT_EQ(ML::GetMediaNodePrefetchReferenceCount(key), 0u);
+    EXPECT_EQ(GetMediaNodePrefetchReferenceCount(key), 0u);
     EXPECT_FALSE(handle->ContinueWaitingForPrefetch(0.0));
-    FrameRef frame;
-    EXPECT_EQ(handle->GetPrefetchedFrame(frame), QRT::kResult_Success);
-    EXPECT_EQ(frame.Get(), cached.Get());
+    EXPECT_EQ(Taken(handle).Get(), cached.Get());
     Drain(mVideo);
     EXPECT_TRUE(mSource->ReadTicks().empty());
 }
 
-TEST_F(MediaNodePrefetcherTest, FailedReadEndsTheWaitWithoutAFrame)
+TEST_F(MediaNodePrefetcherTest, FailedReadEndsEveryWaitWithoutAFrame)
 {
-    mSource->mReadStatus = static_cast<QRT::Result>(0xA0100003u);
+    mSource->mFrameStatus = static_cast<QRT::Result>(0xA0100003u);
     const Guid key = mSource->KeyFor(At(4));
-    const PrefetchRef first = Make(4);
-    const PrefetchRef second = Make(4);
-    first->InitiatePrefetch();
-    second->InitiatePrefetch();
+    const auto [first, second] = StartTwo(mSource, 4);
     Drain(mVideo);
-
     // Both handles learn of the failure, also the one that did not start the read.
-    EXPECT_FALSE(first->ContinueWaitingForPrefetch(0.5));
-    EXPECT_FALSE(second->ContinueWaitingForPrefetch(0.5));
-    FrameRef frame;
-    EXPECT_EQ(first->GetPrefetchedFrame(frame), QRT::kResult_Success);
-    EXPECT_FALSE(frame);
-    EXPECT_EQ(second->GetPrefetchedFrame(frame), QRT::kResult_Success);
-    EXPECT_FALSE(frame);
-    EXPECT_EQ(ML::GetMediaNodePrefetchReferenceCount(key), 0u);
+    for (const PrefetchRef& handle : {first, second})
+    {
+        EXPECT_FALSE(handle->ContinueWaitingForPrefetch(0.5));
+        EXPECT_FALSE(Taken(handle));
+    }
+    EXPECT_EQ(GetMediaNodePrefetchReferenceCount(key), 0u);
     EXPECT_FALSE(VF::SharedVideoFrameCache::RetrieveFromCache(key));
 }
 
-TEST_F(MediaNodePrefetcherTest, NullKeyHandleReadsForItselfWithoutCaching)
+TEST_F(MediaNodePrefetcherTest, NullKeyHandlesReadForThemselvesWithoutCaching)
 {
-    mSource->mNullKeys = true;
-    const auto insertions = [] { return VF::SharedVideoFrameCache::GetStatistics().mInsertions; };
-    const uint64_t before = insertions();
-    const auto gate = BlockVideoExecutor();
-    const PrefetchRef first = Make(11);
-    const PrefetchRef second = Make(11);
-    ASSERT_TRUE(first);
-    QRT::Guid key = MakeKey();
-    first->GetPrefetchKey(key);
-    EXPECT_TRUE(key.IsNil());
-    EXPECT_EQ(first->InitiatePrefetch(), QRT::kResult_Success);
-    EXPECT_EQ(second->InitiatePrefetch(), QRT::kResult_Success);
-    // Without a key nothing is shared: each handle queued a read of its own.
-    EXPECT_EQ(ML::GetQueuedVideoSourcePrefetchCount(), 2u);
-    EXPECT_TRUE(first->ContinueWaitingForPrefetch(0.0));
-    gate->Open();
-    Drain(mVideo);
-
-    // The source holds the frame it read; the handle takes it without the cache.
-    EXPECT_FALSE(first->ContinueWaitingForPrefetch(0.0));
-    FrameRef frame;
-    EXPECT_EQ(first->GetPrefetchedFrame(frame), QRT::kResult_Success);
-    EXPECT_TRUE(frame);
-    EXPECT_EQ(mSource->ReadTicks(), (std::vector<int64_t>{11, 11}));
-    EXPECT_EQ(insertions(), before);
+    for (const bool holds : {true, false})
+    {
+        SCOPED_TRACE(holds ? "source holds its reads" : "source keeps nothing");
+        mSource->mNullKeys = true;
+        mSource->mHoldsReadFrames = holds;
+        const std::uint64_t insertions = VF::SharedVideoFrameCache::GetStatistics().mInsertions;
+        const auto gate = BlockVideoExecutor();
+        const std::size_t readsBefore = mSource->ReadTicks().size();
+        const auto [first, second] = StartTwo(mSource, holds ? 11 : 12);
+        QRT::Guid key = MakeKey();
+        first->GetPrefetchKey(key);
+        EXPECT_TRUE(key.IsNil());
+        // Without a key nothing is shared: each handle queued a read of its own.
+        EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 2u);
+        EXPECT_TRUE(first->ContinueWaitingForPrefetch(0.0));
+        gate->Open();
+        Drain(mVideo);
+        // The handle takes what the source holds, without the cache.
+        EXPECT_FALSE(first->ContinueWaitingForPrefetch(0.0));
+        EXPECT_EQ(Taken(first) != nullptr, holds);
+        EXPECT_EQ(mSource->ReadTicks().size() - readsBefore, 2u);
+        EXPECT_EQ(VF::SharedVideoFrameCache::GetStatistics().mInsertions, insertions);
+    }
 }
 
-TEST_F(MediaNodePrefetcherTest, NullKeyHandleWhoseSourceKeepsNothingStillFinishes)
+TEST_F(MediaNodePrefetcherTest, AsyncReadIsStartedOnceWaitedForTakenAndWithdrawnByTheLastCancel)
 {
-    mSource->mNullKeys = true;
-    mSource->mHoldsReadFrames = false;
-    const PrefetchRef handle = Make(12);
-    handle->InitiatePrefetch();
-    Drain(mVideo);
-    EXPECT_FALSE(handle->ContinueWaitingForPrefetch(0.0));
-    FrameRef frame;
-    EXPECT_EQ(handle->GetPrefetchedFrame(frame), QRT::kResult_Success);
-    EXPECT_FALSE(frame);
-}
-
-TEST_F(MediaNodePrefetcherTest, AsyncSourceIsStartedWaitedForAndTaken)
-{
-    const auto async = QRT::Allocated<TestAsyncVideoSource>::CreateInstance();
-    const Guid key = async->Inner().KeyFor(At(2));
-    const PrefetchRef first = Make(SourceRef(async), 2);
-    const PrefetchRef second = Make(SourceRef(async), 2);
-    EXPECT_EQ(first->InitiatePrefetch(), QRT::kResult_Success);
-    EXPECT_EQ(second->InitiatePrefetch(), QRT::kResult_Success);
+    const ScriptedSourceRef async = MakeAsync();
+    const Guid key = async->KeyFor(At(2));
+    const auto [first, second] = StartTwo(async, 2);
     EXPECT_EQ(async->mStarts.load(), 1);
-    EXPECT_EQ(ML::GetQueuedVideoSourcePrefetchCount(), 0u);
+    EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 0u);
     EXPECT_TRUE(first->ContinueWaitingForPrefetch(0.1));
     EXPECT_GE(async->mWaits.load(), 1);
 
     async->CompleteRead(At(2));
     EXPECT_FALSE(first->ContinueWaitingForPrefetch(0.2));
     EXPECT_FALSE(second->ContinueWaitingForPrefetch(0.2));
-    FrameRef a;
-    FrameRef b;
-    first->GetPrefetchedFrame(a);
-    second->GetPrefetchedFrame(b);
-    ASSERT_TRUE(a);
-    EXPECT_EQ(a.Get(), b.Get());
-    EXPECT_EQ(VF::SharedVideoFrameCache::RetrieveFromCache(key).Get(), a.Get());
+    const FrameRef frame = Taken(first);
+    ASSERT_TRUE(frame);
+    EXPECT_EQ(Taken(second).Get(), frame.Get());
+    EXPECT_EQ(VF::SharedVideoFrameCache::RetrieveFromCache(key).Get(), frame.Get());
     EXPECT_EQ(async->mCancels.load(), 0);
     EXPECT_TRUE(Asserts().empty());
-}
 
-TEST_F(MediaNodePrefetcherTest, CancellingAnAsyncReadWithdrawsItsStartOnce)
-{
-    const auto async = QRT::Allocated<TestAsyncVideoSource>::CreateInstance();
-    const PrefetchRef first = Make(SourceRef(async), 2);
-    const PrefetchRef second = Make(SourceRef(async), 2);
-    first->InitiatePrefetch();
-    second->InitiatePrefetch();
-    first->CancelPrefetch();
-    EXPECT_EQ(async->mCancels.load(), 0);
-    second->CancelPrefetch();
-    EXPECT_EQ(async->mCancels.load(), 1);
+    const ScriptedSourceRef cancelled = MakeAsync();
+    const auto [a, b] = StartTwo(cancelled, 2);
+    a->CancelPrefetch();
+    EXPECT_EQ(cancelled->mCancels.load(), 0);
+    b->CancelPrefetch();
+    EXPECT_EQ(cancelled->mCancels.load(), 1);
 }
 
 TEST_F(MediaNodePrefetcherTest, FailedAsyncStartLeavesTheHandleInert)
 {
-    const auto async = QRT::Allocated<TestAsyncVideoSource>::CreateInstance();
+    const ScriptedSourceRef async = MakeAsync();
     const QRT::Result failure = static_cast<QRT::Result>(0xA0100004u);
     async->mStartStatus = failure;
-    const Guid key = async->Inner().KeyFor(At(3));
-    const PrefetchRef handle = Make(SourceRef(async), 3);
+    const Guid key = async->KeyFor(At(3));
+    const PrefetchRef handle = Make(VideoSourceRef(async), 3);
     EXPECT_EQ(handle->InitiatePrefetch(), failure);
-
     QRT::Guid handleKey;
     handle->GetPrefetchKey(handleKey);
     EXPECT_TRUE(handleKey.IsNil());
-    EXPECT_EQ(ML::GetMediaNodePrefetchReferenceCount(key), 0u);
-    EXPECT_EQ(VF::SharedVideoFrameCache::GetInstance().GetDependencyCount(key), 0u);
+    EXPECT_EQ(GetMediaNodePrefetchReferenceCount(key), 0u);
+    EXPECT_EQ(Dependencies(key), 0u);
     EXPECT_FALSE(handle->ContinueWaitingForPrefetch(0.0));
-    FrameRef frame;
-    EXPECT_EQ(handle->GetPrefetchedFrame(frame), QRT::kResult_Success);
-    EXPECT_FALSE(frame);
+    EXPECT_FALSE(Taken(handle));
     EXPECT_EQ(handle->CancelPrefetch(), QRT::kResult_Success);
     EXPECT_EQ(async->mCancels.load(), 0);
 }
 
-TEST_F(MediaNodePrefetcherTest, AsyncTimeoutAssertsOnceAndFallsBackToTheQueuedRead)
+TEST_F(MediaNodePrefetcherTest, AsyncTimeoutAssertsOnceUnlessSilencedAndFallsBackToTheQueue)
 {
-    const auto async = QRT::Allocated<TestAsyncVideoSource>::CreateInstance();
-    async->mWaitAnswer = false;
-    const Guid key = async->Inner().KeyFor(At(4));
-    const PrefetchRef first = Make(SourceRef(async), 4);
-    const PrefetchRef second = Make(SourceRef(async), 4);
-    const auto gate = BlockVideoExecutor();
-    first->InitiatePrefetch();
-    second->InitiatePrefetch();
+    for (const bool silenced : {false, true})
+    {
+        SCOPED_TRACE(silenced ? "silenced" : "asserting");
+        SilenceMediaNodePrefetchTimeoutAssertion(silenced);
+        const std::size_t assertsBefore = Asserts().size();
+        const ScriptedSourceRef async = MakeAsync();
+        async->mWaitAnswer = false;
+        const std::int64_t ticks = silenced ? 5 : 4;
+        const auto gate = BlockVideoExecutor();
+        const auto [first, second] = StartTwo(async, ticks);
+        EXPECT_TRUE(first->ContinueWaitingForPrefetch(20.0));
+        EXPECT_TRUE(second->ContinueWaitingForPrefetch(20.0));
+        EXPECT_TRUE(first->ContinueWaitingForPrefetch(21.0));
+        // One report for the read, its start withdrawn, one queued read instead.
+        EXPECT_EQ(Asserts().size() - assertsBefore, silenced ? 0u : 1u);
+        EXPECT_EQ(async->mCancels.load(), 1);
+        EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 1u);
 
-    EXPECT_TRUE(first->ContinueWaitingForPrefetch(20.0));
-    EXPECT_TRUE(second->ContinueWaitingForPrefetch(20.0));
-    EXPECT_TRUE(first->ContinueWaitingForPrefetch(21.0));
-    // One report for the read, its start withdrawn, one queued read instead.
-    EXPECT_EQ(Asserts(), (std::vector<std::string>{kTimeoutAssert}));
-    EXPECT_EQ(async->mCancels.load(), 1);
-    EXPECT_EQ(ML::GetQueuedVideoSourcePrefetchCount(), 1u);
-
-    gate->Open();
-    Drain(mVideo);
-    EXPECT_FALSE(first->ContinueWaitingForPrefetch(22.0));
-    EXPECT_FALSE(second->ContinueWaitingForPrefetch(22.0));
-    FrameRef frame;
-    EXPECT_EQ(second->GetPrefetchedFrame(frame), QRT::kResult_Success);
-    ASSERT_TRUE(frame);
-    EXPECT_EQ(frame.Get(), VF::SharedVideoFrameCache::RetrieveFromCache(key).Get());
-    EXPECT_EQ(async->Inner().ReadTicks(), (std::vector<int64_t>{4}));
-    EXPECT_EQ(Asserts().size(), 1u);
-}
-
-TEST_F(MediaNodePrefetcherTest, SilencedTimeoutAssertionStillFallsBack)
-{
-    ML::SilenceMediaNodePrefetchTimeoutAssertion(true);
-    const auto async = QRT::Allocated<TestAsyncVideoSource>::CreateInstance();
-    async->mWaitAnswer = false;
-    const PrefetchRef handle = Make(SourceRef(async), 4);
-    handle->InitiatePrefetch();
-    EXPECT_TRUE(handle->ContinueWaitingForPrefetch(20.0));
-    Drain(mVideo);
-    EXPECT_FALSE(handle->ContinueWaitingForPrefetch(20.0));
-    EXPECT_TRUE(Asserts().empty());
-    EXPECT_EQ(async->Inner().ReadTicks().size(), 1u);
-}
-
-TEST_F(MediaNodePrefetcherTest, BackendAsyncSourceTimesOutThenIsReadThroughTheQueue)
-{
-    SourceRef pattern;
-    ASSERT_TRUE(BE::OpenVideoSource("pattern:moving?size=16x8&rate=25", pattern).Succeeded());
-    // Pattern frames have the same key in every run: start from an empty cache.
-    VF::SharedVideoFrameCache::Clear();
-    const SourceRef slow = BE::CreateAsyncVideoSource(pattern, std::chrono::milliseconds(300),
-                                                      std::chrono::milliseconds(10));
-    const TickTime time = At(0);
-    const Guid key = slow->GetFrameKey(time, {}, {}, {});
-    const PrefetchRef handle = ML::CreateMediaNodePrefetcher(slow, time, {}, {}, {});
-    ASSERT_TRUE(handle);
-    EXPECT_EQ(handle->InitiatePrefetch(), QRT::kResult_Success);
-    // Waited 1 s already, well past the source's 10 ms time-out.
-    EXPECT_TRUE(handle->ContinueWaitingForPrefetch(1.0));
-    EXPECT_EQ(Asserts(), (std::vector<std::string>{kTimeoutAssert}));
-
-    Drain(mVideo);
-    EXPECT_FALSE(handle->ContinueWaitingForPrefetch(2.0));
-    FrameRef frame;
-    EXPECT_EQ(handle->GetPrefetchedFrame(frame), QRT::kResult_Success);
-    ASSERT_TRUE(frame);
-    EXPECT_EQ(frame->GetBounds().Width(), 16);
-    EXPECT_EQ(VF::SharedVideoFrameCache::RetrieveFromCache(key).Get(), frame.Get());
-}
-
-TEST_F(MediaNodePrefetcherTest, BackendAsyncSourceDeliversWithinItsTimeout)
-{
-    SourceRef pattern;
-    ASSERT_TRUE(BE::OpenVideoSource("pattern:moving?size=16x8&rate=25", pattern).Succeeded());
-    const SourceRef slow =
-        BE::CreateAsyncVideoSource(pattern, std::chrono::milliseconds(5), std::chrono::seconds(30));
-    const TickTime time = At(mvxmediatypes::kFrameRate_Video1000.GetTicksPerFrame() * 0);
-    const PrefetchRef handle = ML::CreateMediaNodePrefetcher(slow, time, {}, {}, {});
-    ASSERT_TRUE(handle);
-    handle->InitiatePrefetch();
-    // Each wait blocks for at most a slice of the source's; the loop ends when
-    // the frame is there.
-    double elapsed = 0.0;
-    while (handle->ContinueWaitingForPrefetch(elapsed))
-        elapsed += 0.001;
-    FrameRef frame;
-    EXPECT_EQ(handle->GetPrefetchedFrame(frame), QRT::kResult_Success);
-    EXPECT_TRUE(frame);
-    EXPECT_TRUE(Asserts().empty());
-    EXPECT_EQ(ML::GetQueuedVideoSourcePrefetchCount(), 0u);
+        gate->Open();
+        Drain(mVideo);
+        EXPECT_FALSE(first->ContinueWaitingForPrefetch(22.0));
+        EXPECT_FALSE(second->ContinueWaitingForPrefetch(22.0));
+        const FrameRef frame = Taken(second);
+        ASSERT_TRUE(frame);
+        EXPECT_EQ(frame.Get(),
+                  VF::SharedVideoFrameCache::RetrieveFromCache(async->KeyFor(At(ticks))).Get());
+        EXPECT_EQ(async->ReadTicks(), std::vector<std::int64_t>{ticks});
+    }
+    EXPECT_EQ(Asserts(), Asserted{kTimeoutAssert});
 }
 
 TEST_F(MediaNodePrefetcherTest, FlushedRegistryEndsEveryWait)
 {
     const auto gate = BlockVideoExecutor();
     const Guid key = mSource->KeyFor(At(13));
-    const PrefetchRef first = Make(13);
-    const PrefetchRef second = Make(13);
-    first->InitiatePrefetch();
-    second->InitiatePrefetch();
-    const auto async = QRT::Allocated<TestAsyncVideoSource>::CreateInstance();
-    const PrefetchRef asyncHandle = Make(SourceRef(async), 13);
+    const auto [first, second] = StartTwo(mSource, 13);
+    const ScriptedSourceRef async = MakeAsync();
+    const PrefetchRef asyncHandle = Make(VideoSourceRef(async), 13);
     asyncHandle->InitiatePrefetch();
 
-    ML::FlushMediaNodePrefetchRegistry();
-    EXPECT_EQ(ML::GetMediaNodePrefetchReferenceCount(key), 0u);
+    FlushMediaNodePrefetchRegistry();
+    EXPECT_EQ(GetMediaNodePrefetchReferenceCount(key), 0u);
     EXPECT_EQ(async->mCancels.load(), 1);
-    EXPECT_FALSE(first->ContinueWaitingForPrefetch(0.0));
-    EXPECT_FALSE(second->ContinueWaitingForPrefetch(0.0));
-    EXPECT_FALSE(asyncHandle->ContinueWaitingForPrefetch(0.0));
+    for (const PrefetchRef& handle : {first, second, asyncHandle})
+        EXPECT_FALSE(handle->ContinueWaitingForPrefetch(0.0));
     // Cancels after the flush start and cancel nothing more.
     first->CancelPrefetch();
     asyncHandle->CancelPrefetch();
@@ -442,8 +318,7 @@ TEST_F(MediaNodePrefetcherTest, FlushedRegistryEndsEveryWait)
 // pinned or queued.
 TEST_F(MediaNodePrefetcherTest, ConcurrentHandlesLeaveNothingBehind)
 {
-    boost::atomic_store(&ML::sVideoSourcePrefetcherQueue,
-                        mvxcore::threads::CreateThreadPoolExecutor(2));
+    const ExecutorRef video = UseTwoVideoThreads();
     constexpr int kThreads = 4;
     constexpr int kRounds = 150;
     constexpr int kKeys = 5;
@@ -465,26 +340,23 @@ TEST_F(MediaNodePrefetcherTest, ConcurrentHandlesLeaveNothingBehind)
                     }
                     while (handle->ContinueWaitingForPrefetch(0.0))
                         std::this_thread::yield();
-                    FrameRef frame;
-                    EXPECT_EQ(handle->GetPrefetchedFrame(frame), QRT::kResult_Success);
-                    if (frame)
+                    if (Taken(handle))
                         framesTaken.fetch_add(1);
                 }
             });
     for (std::thread& thread : threads)
         thread.join();
-    const ML::ExecutorRef video = boost::atomic_load(&ML::sVideoSourcePrefetcherQueue);
     video->BeginShutdown();
     video->WaitForRunningTasks();
 
     EXPECT_GT(framesTaken.load(), 0);
     for (int k = 0; k < kKeys; ++k)
     {
-        const Guid key = mSource->KeyFor(At(k));
-        EXPECT_EQ(ML::GetMediaNodePrefetchReferenceCount(key), 0u);
-        EXPECT_EQ(VF::SharedVideoFrameCache::GetInstance().GetDependencyCount(key), 0u);
+        EXPECT_EQ(GetMediaNodePrefetchReferenceCount(mSource->KeyFor(At(k))), 0u);
+        EXPECT_EQ(Dependencies(mSource->KeyFor(At(k))), 0u);
     }
-    EXPECT_EQ(ML::GetQueuedVideoSourcePrefetchCount(), 0u);
+    EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 0u);
 }
 
 } // namespace
+} // namespace ML::Test

@@ -2,13 +2,12 @@
 // conforming anchored at the frame-grid origin, the frame it makes and the
 // draw-into-frame arguments, alpha handling and failures.
 
+#include "BE/MediaStatus.h"
+#include "BE/VideoSources.h"
 #include "ML/RenderRequestException.h"
 #include "ML/RenderableVideoSources.h"
 #include "QRT/Exception.h"
-#include "ScriptedVideoSource.h"
-#include "SourceTestSupport.h"
-
-#include <gtest/gtest.h>
+#include "ScriptedSources.h"
 
 namespace ML::Test
 {
@@ -33,7 +32,7 @@ protected:
         FrameRate mFrameRate = mvxmediatypes::kFrameRate_Video25;
     };
 
-    SourceRef Make(const BE::VideoSourceRef& inSource, const Declaration& inDeclaration)
+    SourceRef Make(const BE::VideoSourceRef& inSource, const Declaration& inDeclaration) const
     {
         return CreateRenderableGetVideoSource(inSource, mBinaryData, inDeclaration.mOrigin,
                                               inDeclaration.mSecondTime, inDeclaration.mMatte,
@@ -41,102 +40,113 @@ protected:
                                               inDeclaration.mInvertAlpha, inDeclaration.mThirdFlag,
                                               inDeclaration.mValue, inDeclaration.mFrameRate);
     }
-
-    SourceRef MakeOver(const ScriptedSourceRef& inScripted, const Declaration& inDeclaration)
+    SourceRef Make(const ScriptedSourceRef& inScripted, const Declaration& inDeclaration) const
     {
         return Make(BE::VideoSourceRef(inScripted), inDeclaration);
+    }
+    // The two field times of the conformed request, in ticks.
+    static std::pair<std::int64_t, std::int64_t> Conformed(const SourceRef& inSource,
+                                                           TickTime inFirst, TickTime inSecond)
+    {
+        const MF::FrameTime conformed = Conform(*inSource, MF::FrameTime(inFirst, inSecond));
+        return {conformed.GetFirstFieldTime().GetTicks(),
+                conformed.GetSecondFieldTime().GetTicks()};
+    }
+    // The status of the RenderRequestException that rendering throws (0 when none).
+    QRT::Result RenderStatus(const SourceRef& inSource, FrameRef& outFrame) const
+    {
+        try
+        {
+            inSource->RenderFrame(MF::FrameTime(), m4x2, outFrame);
+        }
+        catch (const RenderRequestException& exception)
+        {
+            return exception.GetStatus();
+        }
+        return QRT::kResult_Success;
     }
 
     const std::uint8_t mBytes[2] = {0xAB, 0xCD};
     const MF::BinaryData mBinaryData{mBytes, sizeof(mBytes)};
+    const CutlistRenderParams m4x2 = MakeParams(4, 2, 5);
 };
-
-// --- Rates -------------------------------------------------------------------------
 
 TEST_F(RenderableGetVideoSourceTest, RatesFollowKindStillAndSourceFieldType)
 {
     const ScriptedSourceRef scripted = MakeScriptedSource();
-    const SourceRef source = MakeOver(scripted, {});
-    EXPECT_EQ(RateOf(*source), mvxmediatypes::kFrameRate_Video25);
-    EXPECT_EQ(FieldRateOf(*source), mvxmediatypes::kFrameRate_Video25);
-
-    for (mvxmediatypes::FieldType fieldType :
-         {mvxmediatypes::kFieldType_UpperFirst, mvxmediatypes::kFieldType_LowerFirst,
-          mvxmediatypes::kFieldType_AsSource})
+    const SourceRef source = Make(scripted, {});
+    const struct
     {
-        scripted->mFieldType = fieldType;
-        EXPECT_EQ(FieldRateOf(*source), mvxmediatypes::kFrameRate_Video50) << fieldType;
+        mvxmediatypes::FieldType mFieldType;
+        bool mStill;
+        std::int32_t mKind;
+        FrameRate mRate;
+        FrameRate mFieldRate;
+    } cases[] = {
+        {mvxmediatypes::kFieldType_Progressive, false, BE::Deprecated::kMediaInfoKind_Clip,
+         mvxmediatypes::kFrameRate_Video25, mvxmediatypes::kFrameRate_Video25},
+        {mvxmediatypes::kFieldType_UpperFirst, false, BE::Deprecated::kMediaInfoKind_Clip,
+         mvxmediatypes::kFrameRate_Video25, mvxmediatypes::kFrameRate_Video50},
+        {mvxmediatypes::kFieldType_LowerFirst, false, BE::Deprecated::kMediaInfoKind_Clip,
+         mvxmediatypes::kFrameRate_Video25, mvxmediatypes::kFrameRate_Video50},
+        {mvxmediatypes::kFieldType_AsSource, false, BE::Deprecated::kMediaInfoKind_Clip,
+         mvxmediatypes::kFrameRate_Video25, mvxmediatypes::kFrameRate_Video50},
+        {mvxmediatypes::kFieldType_Unknown, false, BE::Deprecated::kMediaInfoKind_Clip,
+         mvxmediatypes::kFrameRate_Video25, mvxmediatypes::kFrameRate_Video25},
+        {mvxmediatypes::kFieldType_UpperFirst, true, BE::Deprecated::kMediaInfoKind_Clip,
+         mvxmediatypes::kFrameRate_Video1000, mvxmediatypes::kFrameRate_Video1000},
+        {mvxmediatypes::kFieldType_UpperFirst, false, BE::Deprecated::kMediaInfoKind_TimeInvariant,
+         mvxmediatypes::kFrameRate_Zero, mvxmediatypes::kFrameRate_Zero},
+    };
+    for (const auto& c : cases)
+    {
+        scripted->mFieldType = c.mFieldType;
+        scripted->mStill = c.mStill;
+        scripted->mKind = c.mKind;
+        EXPECT_EQ(RateOf(*source), c.mRate) << c.mFieldType << " still " << c.mStill;
+        EXPECT_EQ(FieldRateOf(*source), c.mFieldRate) << c.mFieldType << " still " << c.mStill;
     }
-    scripted->mFieldType = mvxmediatypes::kFieldType_Unknown;
-    EXPECT_EQ(FieldRateOf(*source), mvxmediatypes::kFrameRate_Video25);
-
-    scripted->mFieldType = mvxmediatypes::kFieldType_UpperFirst;
-    scripted->mStill = true;
-    EXPECT_EQ(RateOf(*source), mvxmediatypes::kFrameRate_Video1000);
-    EXPECT_EQ(FieldRateOf(*source), mvxmediatypes::kFrameRate_Video1000);
-
-    scripted->mStill = false;
-    scripted->mKind = BE::Deprecated::kMediaInfoKind_TimeInvariant;
-    EXPECT_EQ(RateOf(*source), mvxmediatypes::kFrameRate_Zero);
-    EXPECT_EQ(FieldRateOf(*source), mvxmediatypes::kFrameRate_Zero);
 }
 
-// --- ConformFrameTime --------------------------------------------------------------
-
-TEST_F(RenderableGetVideoSourceTest, FrameGridIsAnchoredAtTheOrigin)
+TEST_F(RenderableGetVideoSourceTest, FrameGridIsAnchoredAtTheOriginAndKeepsTheRequestedOrder)
 {
     Declaration declaration;
     declaration.mOrigin = Ticks(1000);
-    const SourceRef source = MakeOver(MakeScriptedSource(), declaration);
-    EXPECT_EQ(TicksOf(Conform(*source, MF::FrameTime(Ticks(kFrame25 + 999)))), Pair(1000, 1000));
-    EXPECT_EQ(TicksOf(Conform(*source, MF::FrameTime(Ticks(kFrame25 + 1000)))),
-              Pair(kFrame25 + 1000, kFrame25 + 1000));
+    const SourceRef anchored = Make(MakeScriptedSource(), declaration);
+    const auto progressive = [&](std::int64_t inTicks)
+    { return Conformed(anchored, Ticks(inTicks), Ticks(inTicks)).first; };
+    EXPECT_EQ(progressive(kFrame25 + 999), 1000);
+    EXPECT_EQ(progressive(kFrame25 + 1000), kFrame25 + 1000);
     // Before the origin the grid continues downward.
-    EXPECT_EQ(TicksOf(Conform(*source, MF::FrameTime(Ticks(999)))),
-              Pair(1000 - kFrame25, 1000 - kFrame25));
-}
+    EXPECT_EQ(progressive(999), 1000 - kFrame25);
 
-TEST_F(RenderableGetVideoSourceTest, InterlacedRequestGetsSecondFieldInItsOrder)
-{
     const ScriptedSourceRef scripted = MakeScriptedSource();
     scripted->mFieldType = mvxmediatypes::kFieldType_UpperFirst;
-    const SourceRef source = MakeOver(scripted, {});
+    const SourceRef source = Make(scripted, {});
     const std::int64_t frame = kFrame25 * 6;
     const TickTime early = Ticks(frame + 77);
     const TickTime late = Ticks(frame + 77 + kField25);
-    EXPECT_EQ(TicksOf(Conform(*source, MF::FrameTime(early, late))), Pair(frame, frame + kField25));
-    EXPECT_EQ(TicksOf(Conform(*source, MF::FrameTime(late, early))), Pair(frame + kField25, frame));
+    using Pair = std::pair<std::int64_t, std::int64_t>;
+    EXPECT_EQ(Conformed(source, early, late), Pair(frame, frame + kField25));
+    EXPECT_EQ(Conformed(source, late, early), Pair(frame + kField25, frame));
     // A progressive request stays progressive, on the frame grid.
-    EXPECT_EQ(TicksOf(Conform(*source, MF::FrameTime(late))), Pair(frame, frame));
-
+    EXPECT_EQ(Conformed(source, late, late), Pair(frame, frame));
     // Over a progressive source the second field lies a whole frame later.
     scripted->mFieldType = mvxmediatypes::kFieldType_Progressive;
-    EXPECT_EQ(TicksOf(Conform(*source, MF::FrameTime(early, late))), Pair(frame, frame + kFrame25));
-}
+    EXPECT_EQ(Conformed(source, early, late), Pair(frame, frame + kFrame25));
 
-TEST_F(RenderableGetVideoSourceTest, StillsAndTimeInvariantMediaAreNotAligned)
-{
-    const ScriptedSourceRef scripted = MakeScriptedSource();
-    scripted->mStill = true;
+    // Stills are not aligned; time-invariant media and clips without a rate conform to 0.
     scripted->mFieldType = mvxmediatypes::kFieldType_UpperFirst;
-    const SourceRef source = MakeOver(scripted, {});
-    const TickTime early = Ticks(kFrame25 + 5);
-    const TickTime late = Ticks(kFrame25 + 5 + kField25);
-    EXPECT_EQ(TicksOf(Conform(*source, MF::FrameTime(early, late))),
-              Pair(kFrame25 + 5, kFrame25 + 5));
-
+    scripted->mStill = true;
+    EXPECT_EQ(Conformed(source, early, late), Pair(frame + 77, frame + 77));
     scripted->mStill = false;
     scripted->mKind = BE::Deprecated::kMediaInfoKind_TimeInvariant;
-    EXPECT_EQ(TicksOf(Conform(*source, MF::FrameTime(early, late))), Pair(0, 0));
-
+    EXPECT_EQ(Conformed(source, early, late), Pair(0, 0));
     scripted->mKind = BE::Deprecated::kMediaInfoKind_Clip;
     Declaration noRate;
     noRate.mFrameRate = mvxmediatypes::kFrameRate_Zero;
-    EXPECT_EQ(TicksOf(Conform(*MakeOver(scripted, noRate), MF::FrameTime(early, late))),
-              Pair(0, 0));
+    EXPECT_EQ(Conformed(Make(scripted, noRate), early, late), Pair(0, 0));
 }
-
-// --- RenderFrame ---------------------------------------------------------------------
 
 TEST_F(RenderableGetVideoSourceTest, DrawsIntoNearestFormatWithTheClipsArguments)
 {
@@ -145,24 +155,22 @@ TEST_F(RenderableGetVideoSourceTest, DrawsIntoNearestFormatWithTheClipsArguments
                                mvxmediatypes::kPixelFormat_VUYA_4444_8u};
     Declaration declaration;
     declaration.mOrigin = Ticks(300);
-    declaration.mIgnoreAlpha = false;
     declaration.mInvertAlpha = true;
-    const SourceRef source = MakeOver(scripted, declaration);
-    CutlistRenderParams params = MakeParams(6, 4, mvxmediatypes::kPixelFormat_VUYA_4444_32f, 2);
+    const SourceRef source = Make(scripted, declaration);
+    CutlistRenderParams params = MakeParams(6, 4, 2, mvxmediatypes::kPixelFormat_VUYA_4444_32f);
     params.mPixelAspectRatio = PixelAspectRatio(4, 3);
     const TickTime early = Ticks(kFrame25 * 2 + 11);
     const TickTime late = Ticks(kFrame25 * 2 + 11 + kField25);
 
-    FrameRef frame;
-    source->RenderFrame(MF::FrameTime(late, early), params, frame);
+    const FrameRef frame = Render(*source, MF::FrameTime(late, early), params);
     ASSERT_TRUE(frame);
+    EXPECT_EQ(frame->GetFieldType(), mvxmediatypes::kFieldType_LowerFirst);
     const std::vector<DrawCall> calls = scripted->DrawCalls();
     ASSERT_EQ(calls.size(), 1u);
     const DrawCall& call = calls[0];
     // The YUV model is nearer than depth: the 8-bit VUYA the source offers.
     EXPECT_EQ(call.mDestinationFormat, mvxmediatypes::kPixelFormat_VUYA_4444_8u);
-    EXPECT_EQ(call.mDestinationBounds.Width(), 6);
-    EXPECT_EQ(call.mDestinationBounds.Height(), 4);
+    EXPECT_EQ(call.mDestinationBounds, QRT::ParamRect(0, 0, 6, 4));
     EXPECT_EQ(call.mDestinationRatio, PixelAspectRatio(4, 3));
     EXPECT_EQ(call.mDestinationFieldType, mvxmediatypes::kFieldType_LowerFirst);
     // Its own frame is worked on in place (here: the inverted alpha).
@@ -178,9 +186,8 @@ TEST_F(RenderableGetVideoSourceTest, DrawsIntoNearestFormatWithTheClipsArguments
     EXPECT_TRUE(call.mInvertAlpha);
     EXPECT_TRUE(call.mThirdFlag);
     EXPECT_EQ(call.mValue, 0.625);
-    EXPECT_EQ(frame->GetFieldType(), mvxmediatypes::kFieldType_LowerFirst);
 
-    source->RenderFrame(MF::FrameTime(early), params, frame);
+    Render(*source, MF::FrameTime(early), params);
     EXPECT_TRUE(scripted->DrawCalls().at(1).mProgressive);
     EXPECT_EQ(scripted->DrawCalls().at(1).mFieldType, mvxmediatypes::kFieldType_Progressive);
 }
@@ -188,53 +195,48 @@ TEST_F(RenderableGetVideoSourceTest, DrawsIntoNearestFormatWithTheClipsArguments
 TEST_F(RenderableGetVideoSourceTest, ConvertsTimeByFrameNumberOnlyBetweenVideoRates)
 {
     const ScriptedSourceRef scripted = MakeScriptedSource();
-    scripted->mFrameRate = mvxmediatypes::kFrameRate_Video50;
-    FrameRef frame;
     const MF::FrameTime time(Ticks(kFrame25 * 9 + 3));
-    MakeOver(scripted, {})->RenderFrame(time, MakeParams(2, 2), frame);
-    EXPECT_EQ(scripted->DrawCalls().at(0).mTime.GetTicks(), 9 * kField25);
-
-    // Still rates are not numbered against video rates.
-    scripted->mFrameRate = mvxmediatypes::kFrameRate_Video1000;
-    MakeOver(scripted, {})->RenderFrame(time, MakeParams(2, 2), frame);
-    EXPECT_EQ(scripted->DrawCalls().at(1).mTime.GetTicks(), kFrame25 * 9 + 3);
-
-    scripted->mFrameRate = mvxmediatypes::kFrameRate_Video50;
     Declaration noRate;
     noRate.mFrameRate = mvxmediatypes::kFrameRate_Zero;
-    MakeOver(scripted, noRate)->RenderFrame(time, MakeParams(2, 2), frame);
-    EXPECT_EQ(scripted->DrawCalls().at(2).mTime.GetTicks(), kFrame25 * 9 + 3);
+    // Still rates are not numbered against video rates, nor is a clip without a rate.
+    const struct
+    {
+        FrameRate mSourceRate;
+        Declaration mDeclaration;
+        std::int64_t mTicks;
+    } cases[] = {{mvxmediatypes::kFrameRate_Video50, {}, 9 * kField25},
+                 {mvxmediatypes::kFrameRate_Video1000, {}, kFrame25 * 9 + 3},
+                 {mvxmediatypes::kFrameRate_Video50, noRate, kFrame25 * 9 + 3}};
+    for (const auto& c : cases)
+    {
+        scripted->mFrameRate = c.mSourceRate;
+        Render(*Make(scripted, c.mDeclaration), time, MakeParams(2, 2));
+        EXPECT_EQ(scripted->DrawCalls().back().mTime.GetTicks(), c.mTicks);
+    }
 }
 
-TEST_F(RenderableGetVideoSourceTest, DrawsARealPatternSource)
+TEST_F(RenderableGetVideoSourceTest, DrawnAlphaIsMadeStraightOrOpaqueAndARealPatternDraws)
 {
-    const SourceRef source = Make(OpenPattern("pattern:solid?size=8x4&color=336699"), {});
-    FrameRef frame;
-    source->RenderFrame(MF::FrameTime(Ticks(kFrame25)), MakeParams(4, 2), frame);
-    ASSERT_TRUE(frame);
-    EXPECT_EQ(frame->GetPixelFormat(), mvxmediatypes::kPixelFormat_BGRA_4444_8u);
-    EXPECT_TRUE(AllPixelsAre(frame, Bgra(0x99, 0x66, 0x33, 255)));
-}
+    BE::VideoSourceRef pattern;
+    ASSERT_TRUE(BE::OpenVideoSource("pattern:solid?size=8x4&color=336699", pattern).Succeeded());
+    const FrameRef drawn = Render(*Make(pattern, {}), MF::FrameTime(Ticks(kFrame25)), m4x2);
+    ASSERT_TRUE(drawn);
+    EXPECT_EQ(drawn->GetPixelFormat(), mvxmediatypes::kPixelFormat_BGRA_4444_8u);
+    EXPECT_TRUE(AllPixelsAre(drawn, Pixel{0x99, 0x66, 0x33, 255}));
 
-TEST_F(RenderableGetVideoSourceTest, PremultipliedDrawIsUnpremultipliedAgainstTheMatte)
-{
-    const ScriptedSourceRef scripted = MakeScriptedSource();
     // Red at alpha 128 premultiplied over blue.
-    scripted->mDrawColor = 0x8080007Fu;
+    const ScriptedSourceRef scripted = MakeScriptedSource();
+    scripted->mDrawPixel = Pixel{0x7F, 0, 0x80, 0x80};
     Declaration declaration;
     declaration.mAlphaKind = mvxmediatypes::kAlphaChannel_Premultiplied;
     declaration.mMatte = QRT::ParamColor::FromRGBA(0, 0, 0xFF);
-    FrameRef frame;
-    MakeOver(scripted, declaration)->RenderFrame(MF::FrameTime(), MakeParams(4, 2), frame);
-    ASSERT_TRUE(frame);
-    EXPECT_TRUE(AllPixelsAre(frame, Bgra(0, 0, 255, 128)));
+    FrameRef frame = Render(*Make(scripted, declaration), MF::FrameTime(), m4x2);
+    EXPECT_TRUE(AllPixelsAre(frame, Pixel{0, 0, 255, 128}));
     EXPECT_EQ(frame->GetAlphaChannel(), mvxmediatypes::kAlphaChannel_Straight);
-
     // Ignore and invert together: opaque alpha, colour as drawn.
-    declaration.mIgnoreAlpha = true;
-    declaration.mInvertAlpha = true;
-    MakeOver(scripted, declaration)->RenderFrame(MF::FrameTime(), MakeParams(4, 2), frame);
-    EXPECT_TRUE(AllPixelsAre(frame, Bgra(0x7F, 0, 0x80, 255)));
+    declaration.mIgnoreAlpha = declaration.mInvertAlpha = true;
+    frame = Render(*Make(scripted, declaration), MF::FrameTime(), m4x2);
+    EXPECT_TRUE(AllPixelsAre(frame, Pixel{0x7F, 0, 0x80, 255}));
 }
 
 TEST_F(RenderableGetVideoSourceTest, CollectsNoPrefetches)
@@ -242,63 +244,39 @@ TEST_F(RenderableGetVideoSourceTest, CollectsNoPrefetches)
     const ScriptedSourceRef scripted = MakeScriptedSource();
     scripted->mPrefetchWanted = true;
     RenderableNodePrefetchList prefetches;
-    MakeOver(scripted, {})->CollectPrefetches(MF::FrameTime(), MakeParams(4, 2), prefetches);
+    Make(scripted, {})->CollectPrefetches(MF::FrameTime(), m4x2, prefetches);
     EXPECT_TRUE(prefetches.empty());
     EXPECT_TRUE(scripted->PrefetchCalls().empty());
 }
 
-// --- Failures --------------------------------------------------------------------------
-
-TEST_F(RenderableGetVideoSourceTest, DrawFailureIsThrownWithItsStatus)
+TEST_F(RenderableGetVideoSourceTest, DrawAndFrameCreationFailuresAreThrownWithTheirStatus)
 {
-    const ScriptedSourceRef scripted = MakeScriptedSource();
-    scripted->mDrawStatus = BE::kResult_MediaMalformed;
-    FrameRef frame = MakeFilledFrame(2, 2, 0);
-    try
-    {
-        MakeOver(scripted, {})->RenderFrame(MF::FrameTime(), MakeParams(4, 2), frame);
-        FAIL() << "no exception";
-    }
-    catch (const RenderRequestException& exception)
-    {
-        EXPECT_EQ(exception.GetStatus(), BE::kResult_MediaMalformed);
-    }
+    const ScriptedSourceRef failing = MakeScriptedSource();
+    failing->mDrawStatus = BE::kResult_MediaMalformed;
+    FrameRef frame = MakeFilledFrame(2, 2, Pixel{});
+    EXPECT_EQ(RenderStatus(Make(failing, {}), frame), BE::kResult_MediaMalformed);
     EXPECT_FALSE(frame);
-}
 
-TEST_F(RenderableGetVideoSourceTest, FrameCreationFailureIsThrownWithItsStatus)
-{
-    const ScriptedSourceRef scripted = MakeScriptedSource();
     // No format to choose from: the frame cannot be made.
-    scripted->mPixelFormats.clear();
-    FrameRef frame;
-    QRT::Result expected = QRT::kResult_Success;
+    const ScriptedSourceRef formatless = MakeScriptedSource();
+    formatless->mPixelFormats.clear();
     FrameRef unused;
-    expected = VF::CreateVideoFrame(mvxmediatypes::kPixelFormat_Invalid, 4, 2,
-                                    mvxmediatypes::kPixelAspectRatio_Square, false, false, unused);
+    const QRT::Result expected =
+        VF::CreateVideoFrame(mvxmediatypes::kPixelFormat_Invalid, 4, 2,
+                             mvxmediatypes::kPixelAspectRatio_Square, false, false, unused);
     ASSERT_TRUE(QRT::Failed(expected));
-    try
-    {
-        MakeOver(scripted, {})->RenderFrame(MF::FrameTime(), MakeParams(4, 2), frame);
-        FAIL() << "no exception";
-    }
-    catch (const RenderRequestException& exception)
-    {
-        EXPECT_EQ(exception.GetStatus(), expected);
-    }
+    frame = MakeFilledFrame(2, 2, Pixel{});
+    EXPECT_EQ(RenderStatus(Make(formatless, {}), frame), expected);
     EXPECT_FALSE(frame);
-    EXPECT_TRUE(scripted->DrawCalls().empty());
+    EXPECT_TRUE(formatless->DrawCalls().empty());
 }
 
 TEST_F(RenderableGetVideoSourceTest, EmptySourceThrowsNullInterface)
 {
     const SourceRef source = Make(BE::VideoSourceRef(), {});
     ASSERT_TRUE(source);
-    FrameRef frame;
-    EXPECT_THROW(source->RenderFrame(MF::FrameTime(), MakeParams(4, 2), frame),
-                 QRT::NullInterfaceException);
-    FrameRate rate;
-    EXPECT_THROW(source->GetFrameRate(rate), QRT::NullInterfaceException);
+    EXPECT_THROW(Render(*source, MF::FrameTime(), m4x2), QRT::NullInterfaceException);
+    EXPECT_THROW(RateOf(*source), QRT::NullInterfaceException);
 }
 
 } // namespace

@@ -2,16 +2,12 @@
 // conforming, the frame request, alpha and pixel-aspect handling, failures and
 // prefetch collection.
 
+#include "BE/MediaStatus.h"
+#include "BE/VideoSources.h"
 #include "ML/RenderRequestException.h"
 #include "ML/RenderableVideoSources.h"
 #include "QRT/Exception.h"
-#include "ScriptedVideoSource.h"
-#include "SourceTestSupport.h"
-
-#include <atomic>
-#include <thread>
-
-#include <gtest/gtest.h>
+#include "ScriptedSources.h"
 
 namespace ML::Test
 {
@@ -19,6 +15,36 @@ namespace
 {
 
 using mvxmediatypes::PixelAspectRatio;
+using TickPair = std::pair<std::int64_t, std::int64_t>;
+
+// The two field times in ticks, for readable comparisons.
+TickPair TicksOf(const MF::FrameTime& inTime)
+{
+    return {inTime.GetFirstFieldTime().GetTicks(), inTime.GetSecondFieldTime().GetTicks()};
+}
+
+BE::VideoSourceRef OpenPattern(const std::string& inMedia)
+{
+    BE::VideoSourceRef source;
+    const BE::OpenStatus status = BE::OpenVideoSource(inMedia, source);
+    EXPECT_TRUE(status.Succeeded()) << status.mMessage;
+    return source;
+}
+
+// The status of the RenderRequestException inRender throws (0 when none).
+template <typename Render>
+QRT::Result ThrownStatus(Render inRender)
+{
+    try
+    {
+        inRender();
+    }
+    catch (const RenderRequestException& exception)
+    {
+        return exception.GetStatus();
+    }
+    return QRT::kResult_Success;
+}
 
 class RenderableVideoSourceTest : public ::testing::Test
 {
@@ -34,254 +60,252 @@ protected:
         PixelAspectRatio mRatio = mvxmediatypes::kPixelAspectRatio_Square;
     };
 
-    SourceRef Make(const BE::VideoSourceRef& inSource, const Declaration& inDeclaration)
+    SourceRef Make(const BE::VideoSourceRef& inSource, const Declaration& inDeclaration) const
     {
         return CreateRenderableSource(inSource, mBinaryData, inDeclaration.mAlphaKind,
                                       inDeclaration.mMatte, inDeclaration.mIgnoreAlpha,
                                       inDeclaration.mInvertAlpha, inDeclaration.mFrameRate,
                                       inDeclaration.mFieldType, inDeclaration.mRatio, mProfile);
     }
-
-    SourceRef MakeOver(const ScriptedSourceRef& inScripted, const Declaration& inDeclaration)
+    SourceRef Make(const ScriptedSourceRef& inScripted, const Declaration& inDeclaration) const
     {
         return Make(BE::VideoSourceRef(inScripted), inDeclaration);
     }
-
-    FrameRef Render(const SourceRef& inSource, const MF::FrameTime& inTime,
-                    const CutlistRenderParams& inParams)
+    // A scripted source handing out inFrame, marked shared.
+    static ScriptedSourceRef Handing(const FrameRef& inFrame)
     {
-        FrameRef frame;
-        inSource->RenderFrame(inTime, inParams, frame);
-        EXPECT_TRUE(frame);
-        return frame;
+        const ScriptedSourceRef scripted = MakeScriptedSource();
+        inFrame->MarkShared(1);
+        scripted->mFrame = inFrame;
+        return scripted;
     }
 
     const std::uint8_t mBytes[3] = {7, 8, 9};
     const MF::BinaryData mBinaryData{mBytes, sizeof(mBytes)};
     const BE::ColorProfile mProfile{"BT.709", std::make_shared<const std::vector<std::uint8_t>>(
                                                   std::vector<std::uint8_t>{1, 2})};
+    const CutlistRenderParams m4x2 = MakeParams(4, 2);
 };
 
-// --- Object model --------------------------------------------------------------
-
-TEST_F(RenderableVideoSourceTest, AnswersOnlyItsOwnInterfaceAndTheRoot)
-{
-    const SourceRef source = MakeOver(MakeScriptedSource(), {});
-    ASSERT_TRUE(source);
-    void* found = nullptr;
-    EXPECT_EQ(source->QueryInterface(IRenderableSource::kIID, &found), QRT::kResult_Success);
-    EXPECT_EQ(found, source.Get());
-    source->Release();
-    EXPECT_EQ(source->QueryInterface(QRT::QRTUnknown::kIID, &found), QRT::kResult_Success);
-    EXPECT_NE(found, nullptr);
-    static_cast<QRT::QRTUnknown*>(found)->Release();
-    found = &found;
-    EXPECT_EQ(source->QueryInterface(MF::IVideoFrame::kIID, &found), QRT::kResult_NoInterface);
-    EXPECT_EQ(found, nullptr);
-}
-
-// --- Rates -------------------------------------------------------------------------
-
-TEST_F(RenderableVideoSourceTest, StillAnswersVideo1000AndConformsWithoutAligning)
-{
-    const ScriptedSourceRef scripted = MakeScriptedSource();
-    scripted->mStill = true;
-    scripted->mFrameRate = mvxmediatypes::kFrameRate_Video1000;
-    const SourceRef source = MakeOver(scripted, {});
-    EXPECT_EQ(RateOf(*source), mvxmediatypes::kFrameRate_Video1000);
-    EXPECT_EQ(FieldRateOf(*source), mvxmediatypes::kFrameRate_Video1000);
-    const std::int64_t time = kFrame25 * 3 + 12'345;
-    EXPECT_EQ(TicksOf(Conform(*source, MF::FrameTime(Ticks(time)))), Pair(time, time));
-}
-
-TEST_F(RenderableVideoSourceTest, OddInterlacedFrameIsStoredOneTickLonger)
-{
-    Declaration declaration;
-    declaration.mFrameRate = FrameRate::Create(1'000'001);
-    declaration.mFieldType = mvxmediatypes::kFieldType_LowerFirst;
-    EXPECT_EQ(RateOf(*MakeOver(MakeScriptedSource(), declaration)), FrameRate::Create(1'000'002));
-
-    declaration.mFieldType = mvxmediatypes::kFieldType_UpperFirst;
-    const SourceRef upper = MakeOver(MakeScriptedSource(), declaration);
-    EXPECT_EQ(RateOf(*upper), FrameRate::Create(1'000'002));
-    // The fields are then exactly half a frame apart.
-    EXPECT_EQ(TicksOf(Conform(*upper, MF::FrameTime(Ticks(1'000'003)))),
-              Pair(1'000'002, 1'500'003));
-
-    // Progressive and as-source declarations keep an odd frame.
-    declaration.mFieldType = mvxmediatypes::kFieldType_Progressive;
-    EXPECT_EQ(RateOf(*MakeOver(MakeScriptedSource(), declaration)), FrameRate::Create(1'000'001));
-    declaration.mFieldType = mvxmediatypes::kFieldType_AsSource;
-    EXPECT_EQ(RateOf(*MakeOver(MakeScriptedSource(), declaration)), FrameRate::Create(1'000'001));
-}
-
-TEST_F(RenderableVideoSourceTest, FieldRateDoublesForInterlacedDeclarationsAndSources)
+TEST_F(RenderableVideoSourceTest, RatesFollowTheDeclarationTheSourceAndStills)
 {
     const ScriptedSourceRef progressive = MakeScriptedSource();
     const ScriptedSourceRef lower = MakeScriptedSource();
     lower->mFieldType = mvxmediatypes::kFieldType_LowerFirst;
-    Declaration declaration;
-
-    declaration.mFieldType = mvxmediatypes::kFieldType_Progressive;
-    EXPECT_EQ(FieldRateOf(*MakeOver(lower, declaration)), mvxmediatypes::kFrameRate_Video25);
-    declaration.mFieldType = mvxmediatypes::kFieldType_UpperFirst;
-    EXPECT_EQ(FieldRateOf(*MakeOver(progressive, declaration)), mvxmediatypes::kFrameRate_Video50);
-    declaration.mFieldType = mvxmediatypes::kFieldType_AsSource;
-    EXPECT_EQ(FieldRateOf(*MakeOver(lower, declaration)), mvxmediatypes::kFrameRate_Video50);
-    EXPECT_EQ(FieldRateOf(*MakeOver(progressive, declaration)), mvxmediatypes::kFrameRate_Video25);
-    declaration.mFieldType = mvxmediatypes::kFieldType_Unknown;
-    EXPECT_EQ(FieldRateOf(*MakeOver(lower, declaration)), mvxmediatypes::kFrameRate_Video25);
-    EXPECT_EQ(RateOf(*MakeOver(lower, declaration)), mvxmediatypes::kFrameRate_Video25);
+    const ScriptedSourceRef still = MakeScriptedSource();
+    still->mStill = true;
+    still->mFrameRate = mvxmediatypes::kFrameRate_Video1000;
+    const FrameRate odd = FrameRate::Create(1'000'001);
+    const FrameRate even = FrameRate::Create(1'000'002);
+    const struct
+    {
+        ScriptedSourceRef mSource;
+        mvxmediatypes::FieldType mDeclared;
+        FrameRate mDeclaredRate;
+        FrameRate mRate;
+        FrameRate mFieldRate;
+    } cases[] = {
+        {lower, mvxmediatypes::kFieldType_Progressive, mvxmediatypes::kFrameRate_Video25,
+         mvxmediatypes::kFrameRate_Video25, mvxmediatypes::kFrameRate_Video25},
+        {progressive, mvxmediatypes::kFieldType_UpperFirst, mvxmediatypes::kFrameRate_Video25,
+         mvxmediatypes::kFrameRate_Video25, mvxmediatypes::kFrameRate_Video50},
+        {lower, mvxmediatypes::kFieldType_AsSource, mvxmediatypes::kFrameRate_Video25,
+         mvxmediatypes::kFrameRate_Video25, mvxmediatypes::kFrameRate_Video50},
+        {progressive, mvxmediatypes::kFieldType_AsSource, mvxmediatypes::kFrameRate_Video25,
+         mvxmediatypes::kFrameRate_Video25, mvxmediatypes::kFrameRate_Video25},
+        {lower, mvxmediatypes::kFieldType_Unknown, mvxmediatypes::kFrameRate_Video25,
+         mvxmediatypes::kFrameRate_Video25, mvxmediatypes::kFrameRate_Video25},
+        {still, mvxmediatypes::kFieldType_Progressive, mvxmediatypes::kFrameRate_Video25,
+         mvxmediatypes::kFrameRate_Video1000, mvxmediatypes::kFrameRate_Video1000},
+        // An odd interlaced frame is stored one tick longer; progressive and
+        // as-source declarations keep it.
+        {progressive, mvxmediatypes::kFieldType_LowerFirst, odd, even, even * 2},
+        {progressive, mvxmediatypes::kFieldType_Progressive, odd, odd, odd},
+        {progressive, mvxmediatypes::kFieldType_AsSource, odd, odd, odd},
+    };
+    for (const auto& c : cases)
+    {
+        SCOPED_TRACE(testing::Message() << "declared " << c.mDeclared << " rate "
+                                        << c.mDeclaredRate.GetTicksPerFrame());
+        Declaration declaration;
+        declaration.mFieldType = c.mDeclared;
+        declaration.mFrameRate = c.mDeclaredRate;
+        const SourceRef source = Make(c.mSource, declaration);
+        EXPECT_EQ(RateOf(*source), c.mRate);
+        EXPECT_EQ(FieldRateOf(*source), c.mFieldRate);
+    }
 }
 
-// --- ConformFrameTime --------------------------------------------------------------
-
-TEST_F(RenderableVideoSourceTest, TimeInvariantMediaConformsEveryTimeToZero)
+TEST_F(RenderableVideoSourceTest, ConformsToTheFrameOrFieldGridInTheDeliveredOrder)
 {
-    Declaration declaration;
-    declaration.mFieldType = mvxmediatypes::kFieldType_UpperFirst;
-    const SourceRef solid = Make(OpenPattern("pattern:solid?size=8x4"), declaration);
-    const MF::FrameTime interlaced(Ticks(kFrame25 * 7 + 5), Ticks(kFrame25 * 7 + 5 + kField25));
-    EXPECT_EQ(TicksOf(Conform(*solid, interlaced)), Pair(0, 0));
-
-    const ScriptedSourceRef scripted = MakeScriptedSource();
-    scripted->mKind = BE::Deprecated::kMediaInfoKind_TimeInvariant;
-    EXPECT_EQ(TicksOf(Conform(*MakeOver(scripted, declaration), interlaced)), Pair(0, 0));
-
-    // A clip without a rate has a single frame as well.
-    declaration.mFrameRate = mvxmediatypes::kFrameRate_Zero;
-    EXPECT_EQ(TicksOf(Conform(*MakeOver(MakeScriptedSource(), declaration), interlaced)),
-              Pair(0, 0));
+    using mvxmediatypes::kFieldType_AsSource;
+    using mvxmediatypes::kFieldType_LowerFirst;
+    using mvxmediatypes::kFieldType_Progressive;
+    using mvxmediatypes::kFieldType_UpperFirst;
+    const std::int64_t f4 = 4 * kFrame25;
+    const std::int64_t f2 = 2 * kFrame25;
+    const std::int64_t early = f4 + kField25 + 99;
+    const MF::FrameTime upperRequest(Ticks(f2 + 10), Ticks(f2 + 10 + kField25));
+    const MF::FrameTime interlaced(Ticks(7 * kFrame25 + 5), Ticks(7 * kFrame25 + 5 + kField25));
+    const struct
+    {
+        const char* mWhat;
+        mvxmediatypes::FieldType mSourceFieldType;
+        mvxmediatypes::FieldType mDeclared;
+        std::int32_t mKind;
+        FrameRate mDeclaredRate;
+        MF::FrameTime mRequest;
+        TickPair mConformed;
+    } cases[] = {
+        {"time-invariant media: one frame at 0",
+         kFieldType_Progressive,
+         kFieldType_UpperFirst,
+         BE::Deprecated::kMediaInfoKind_TimeInvariant,
+         mvxmediatypes::kFrameRate_Video25,
+         interlaced,
+         {0, 0}},
+        {"a clip without a rate: one frame",
+         kFieldType_Progressive,
+         kFieldType_UpperFirst,
+         BE::Deprecated::kMediaInfoKind_Clip,
+         mvxmediatypes::kFrameRate_Zero,
+         interlaced,
+         {0, 0}},
+        {"progressive request over interlaced: field grid",
+         kFieldType_UpperFirst,
+         kFieldType_AsSource,
+         BE::Deprecated::kMediaInfoKind_Clip,
+         mvxmediatypes::kFrameRate_Video25,
+         MF::FrameTime(Ticks(f4 + kField25 + 99)),
+         {f4 + kField25, f4 + kField25}},
+        {"interlaced request, order 1: frame grid",
+         kFieldType_UpperFirst,
+         kFieldType_AsSource,
+         BE::Deprecated::kMediaInfoKind_Clip,
+         mvxmediatypes::kFrameRate_Video25,
+         MF::FrameTime(Ticks(early), Ticks(early + kField25)),
+         {f4, f4 + kField25}},
+        {"interlaced request, order 2",
+         kFieldType_UpperFirst,
+         kFieldType_AsSource,
+         BE::Deprecated::kMediaInfoKind_Clip,
+         mvxmediatypes::kFrameRate_Video25,
+         MF::FrameTime(Ticks(early + kField25), Ticks(early)),
+         {f4 + kField25, f4}},
+        {"as source over progressive stays progressive",
+         kFieldType_Progressive,
+         kFieldType_AsSource,
+         BE::Deprecated::kMediaInfoKind_Clip,
+         mvxmediatypes::kFrameRate_Video25,
+         upperRequest,
+         {f2, f2}},
+        {"a declared order wins over the request's",
+         kFieldType_Progressive,
+         kFieldType_LowerFirst,
+         BE::Deprecated::kMediaInfoKind_Clip,
+         mvxmediatypes::kFrameRate_Video25,
+         upperRequest,
+         {f2 + kField25, f2}},
+        {"also for a progressive request",
+         kFieldType_Progressive,
+         kFieldType_LowerFirst,
+         BE::Deprecated::kMediaInfoKind_Clip,
+         mvxmediatypes::kFrameRate_Video25,
+         MF::FrameTime(Ticks(f2 + kField25 + 3)),
+         {f2 + kField25, f2}},
+        {"a progressive declaration",
+         kFieldType_UpperFirst,
+         kFieldType_Progressive,
+         BE::Deprecated::kMediaInfoKind_Clip,
+         mvxmediatypes::kFrameRate_Video25,
+         upperRequest,
+         {f2, f2}},
+        {"odd interlaced frame: fields half the stored frame apart",
+         kFieldType_Progressive,
+         kFieldType_UpperFirst,
+         BE::Deprecated::kMediaInfoKind_Clip,
+         FrameRate::Create(1'000'001),
+         MF::FrameTime(Ticks(1'000'003)),
+         {1'000'002, 1'500'003}},
+    };
+    for (const auto& c : cases)
+    {
+        const ScriptedSourceRef scripted = MakeScriptedSource();
+        scripted->mFieldType = c.mSourceFieldType;
+        scripted->mKind = c.mKind;
+        Declaration declaration;
+        declaration.mFieldType = c.mDeclared;
+        declaration.mFrameRate = c.mDeclaredRate;
+        EXPECT_EQ(TicksOf(Conform(*Make(scripted, declaration), c.mRequest)), c.mConformed)
+            << c.mWhat;
+    }
+    // A still conforms without aligning; a real time-invariant pattern to 0.
+    const ScriptedSourceRef still = MakeScriptedSource();
+    still->mStill = true;
+    still->mFrameRate = mvxmediatypes::kFrameRate_Video1000;
+    const std::int64_t time = 3 * kFrame25 + 12'345;
+    EXPECT_EQ(TicksOf(Conform(*Make(still, {}), MF::FrameTime(Ticks(time)))), TickPair(time, time));
+    Declaration upper;
+    upper.mFieldType = kFieldType_UpperFirst;
+    EXPECT_EQ(TicksOf(Conform(*Make(OpenPattern("pattern:solid?size=8x4"), upper), interlaced)),
+              TickPair(0, 0));
 }
-
-TEST_F(RenderableVideoSourceTest, ProgressiveRequestOverInterlacedSourceAlignsToFieldGrid)
-{
-    const ScriptedSourceRef upper = MakeScriptedSource();
-    upper->mFieldType = mvxmediatypes::kFieldType_UpperFirst;
-    Declaration declaration;
-    declaration.mFieldType = mvxmediatypes::kFieldType_AsSource;
-    const SourceRef source = MakeOver(upper, declaration);
-    const std::int64_t secondField = kFrame25 * 4 + kField25;
-    EXPECT_EQ(TicksOf(Conform(*source, MF::FrameTime(Ticks(secondField + 99)))),
-              Pair(secondField, secondField));
-}
-
-TEST_F(RenderableVideoSourceTest, InterlacedRequestAlignsToFrameGridInRequestedOrder)
-{
-    const ScriptedSourceRef upper = MakeScriptedSource();
-    upper->mFieldType = mvxmediatypes::kFieldType_UpperFirst;
-    Declaration declaration;
-    declaration.mFieldType = mvxmediatypes::kFieldType_AsSource;
-    const SourceRef source = MakeOver(upper, declaration);
-    const std::int64_t frame = kFrame25 * 4;
-    const std::int64_t early = frame + kField25 + 99;
-    const std::int64_t late = early + kField25;
-
-    // Order 1: the first slot is the earlier field.
-    EXPECT_EQ(TicksOf(Conform(*source, MF::FrameTime(Ticks(early), Ticks(late)))),
-              Pair(frame, frame + kField25));
-    // Order 2: the first slot is the later field.
-    EXPECT_EQ(TicksOf(Conform(*source, MF::FrameTime(Ticks(late), Ticks(early)))),
-              Pair(frame + kField25, frame));
-}
-
-TEST_F(RenderableVideoSourceTest, DeliveredOrderFollowsDeclarationOrProgressiveSource)
-{
-    const std::int64_t frame = kFrame25 * 2;
-    const MF::FrameTime upperRequest(Ticks(frame + 10), Ticks(frame + 10 + kField25));
-
-    // As-source over a progressive source: the frame stays progressive.
-    Declaration declaration;
-    declaration.mFieldType = mvxmediatypes::kFieldType_AsSource;
-    EXPECT_EQ(TicksOf(Conform(*MakeOver(MakeScriptedSource(), declaration), upperRequest)),
-              Pair(frame, frame));
-
-    // A declared order wins over the request's, also for a progressive request.
-    declaration.mFieldType = mvxmediatypes::kFieldType_LowerFirst;
-    const SourceRef lower = MakeOver(MakeScriptedSource(), declaration);
-    EXPECT_EQ(TicksOf(Conform(*lower, upperRequest)), Pair(frame + kField25, frame));
-    EXPECT_EQ(TicksOf(Conform(*lower, MF::FrameTime(Ticks(frame + kField25 + 3)))),
-              Pair(frame + kField25, frame));
-
-    // A progressive declaration over an interlaced request.
-    declaration.mFieldType = mvxmediatypes::kFieldType_Progressive;
-    EXPECT_EQ(TicksOf(Conform(*MakeOver(MakeScriptedSource(), declaration), upperRequest)),
-              Pair(frame, frame));
-}
-
-// --- RenderFrame: the request --------------------------------------------------------
 
 TEST_F(RenderableVideoSourceTest, FrameRequestCarriesParamsFieldOrderAndClipData)
 {
-    const ScriptedSourceRef scripted = MakeScriptedSource();
-    scripted->mFrame = MakeFilledFrame(4, 2, 0xFF102030u);
-    const SourceRef source = MakeOver(scripted, {});
-    CutlistRenderParams params = MakeParams(4, 2, mvxmediatypes::kPixelFormat_VUYA_4444_8u, 3);
+    const ScriptedSourceRef scripted =
+        Handing(MakeFilledFrame(4, 2, Pixel{0x30, 0x20, 0x10, 0xFF}));
+    const SourceRef source = Make(scripted, {});
+    CutlistRenderParams params = MakeParams(4, 2, 3, mvxmediatypes::kPixelFormat_VUYA_4444_8u);
     params.mPixelAspectRatio = PixelAspectRatio(10, 11);
     const std::int64_t early = kFrame25 * 5 + 17;
-
-    Render(source, MF::FrameTime(Ticks(early + kField25), Ticks(early)), params);
-    const std::vector<FrameRequestCall> calls = scripted->FrameCalls();
+    ASSERT_TRUE(Render(*source, MF::FrameTime(Ticks(early + kField25), Ticks(early)), params));
+    const std::vector<FrameCall> calls = scripted->FrameCalls();
     ASSERT_EQ(calls.size(), 1u);
     // Same rates: the earlier field time goes to the source as it is.
     EXPECT_EQ(calls[0].mTime.GetTicks(), early);
-    EXPECT_EQ(calls[0].mRequest.mWidth, 4u);
-    EXPECT_EQ(calls[0].mRequest.mHeight, 2u);
-    EXPECT_EQ(calls[0].mRequest.mPixelAspectRatio, PixelAspectRatio(10, 11));
-    EXPECT_EQ(calls[0].mRequest.mPixelFormat, mvxmediatypes::kPixelFormat_VUYA_4444_8u);
-    EXPECT_EQ(calls[0].mRequest.mFieldType, mvxmediatypes::kFieldType_LowerFirst);
-    EXPECT_EQ(calls[0].mRequest.mQuality, 3u);
+    const BE::VideoFrameRequest expected{4,
+                                         2,
+                                         PixelAspectRatio(10, 11),
+                                         mvxmediatypes::kPixelFormat_VUYA_4444_8u,
+                                         mvxmediatypes::kFieldType_LowerFirst,
+                                         3};
+    EXPECT_EQ(calls[0].mRequest, expected);
     EXPECT_EQ(calls[0].mBinaryData, mBinaryData);
     EXPECT_EQ(calls[0].mColorProfile, mProfile);
     EXPECT_EQ(calls[0].mFlags, BE::Deprecated::kFrameRequestFlag_Read);
 
-    Render(source, MF::FrameTime(Ticks(early)), params);
+    Render(*source, MF::FrameTime(Ticks(early)), params);
     EXPECT_EQ(scripted->FrameCalls().at(1).mRequest.mFieldType,
               mvxmediatypes::kFieldType_Progressive);
 }
 
 TEST_F(RenderableVideoSourceTest, DifferentRatesConvertTheTimeByFrameNumber)
 {
-    const ScriptedSourceRef scripted = MakeScriptedSource();
-    scripted->mFrame = MakeFilledFrame(4, 2, 0xFF000000u);
+    const ScriptedSourceRef scripted = Handing(MakeFilledFrame(4, 2, Pixel{0, 0, 0, 255}));
     scripted->mFrameRate = mvxmediatypes::kFrameRate_Video50;
-    const SourceRef source = MakeOver(scripted, {});
     // Frame 7 at 25 (anywhere inside it) is frame 7 at 50.
-    Render(source, MF::FrameTime(Ticks(kFrame25 * 7 + kFrame25 - 1)), MakeParams(4, 2));
+    Render(*Make(scripted, {}), MF::FrameTime(Ticks(kFrame25 * 7 + kFrame25 - 1)), m4x2);
     EXPECT_EQ(scripted->FrameCalls().at(0).mTime.GetTicks(), 7 * kField25);
-
     // A clip without a rate passes the time unchanged.
     Declaration noRate;
     noRate.mFrameRate = mvxmediatypes::kFrameRate_Zero;
-    Render(MakeOver(scripted, noRate), MF::FrameTime(Ticks(kFrame25 + 5)), MakeParams(4, 2));
+    Render(*Make(scripted, noRate), MF::FrameTime(Ticks(kFrame25 + 5)), m4x2);
     EXPECT_EQ(scripted->FrameCalls().at(1).mTime.GetTicks(), kFrame25 + 5);
 }
 
-// --- RenderFrame: failures --------------------------------------------------------------
-
-TEST_F(RenderableVideoSourceTest, SourceFailureIsThrownWithItsStatusAndEmptiesTheOutput)
+TEST_F(RenderableVideoSourceTest, FailuresAreThrownAndEmptyTheOutput)
 {
-    const ScriptedSourceRef scripted = MakeScriptedSource();
-    scripted->mFrameStatus = BE::kResult_FrameOutOfRange;
-    const SourceRef source = MakeOver(scripted, {});
-    FrameRef frame = MakeFilledFrame(4, 2, 0);
-    try
-    {
-        source->RenderFrame(MF::FrameTime(Ticks(0)), MakeParams(4, 2), frame);
-        FAIL() << "no exception";
-    }
-    catch (const RenderRequestException& exception)
-    {
-        EXPECT_EQ(exception.GetStatus(), BE::kResult_FrameOutOfRange);
-    }
+    const ScriptedSourceRef failing = MakeScriptedSource();
+    failing->mFrameStatus = BE::kResult_FrameOutOfRange;
+    FrameRef frame = MakeFilledFrame(4, 2, Pixel{});
+    EXPECT_EQ(ThrownStatus([&] { Make(failing, {})->RenderFrame(MF::FrameTime(), m4x2, frame); }),
+              BE::kResult_FrameOutOfRange);
     EXPECT_FALSE(frame);
-}
 
-TEST_F(RenderableVideoSourceTest, SuccessWithoutFrameThrowsNullInterface)
-{
-    const SourceRef source = MakeOver(MakeScriptedSource(), {});
-    FrameRef frame;
-    EXPECT_THROW(source->RenderFrame(MF::FrameTime(Ticks(0)), MakeParams(4, 2), frame),
+    // Success without a frame.
+    frame = MakeFilledFrame(4, 2, Pixel{});
+    EXPECT_THROW(Make(MakeScriptedSource(), {})->RenderFrame(MF::FrameTime(), m4x2, frame),
                  QRT::NullInterfaceException);
     EXPECT_FALSE(frame);
 }
@@ -292,60 +316,95 @@ TEST_F(RenderableVideoSourceTest, EmptySourceThrowsNullInterfaceOnlyWhenRenderin
     declaration.mFieldType = mvxmediatypes::kFieldType_UpperFirst;
     const SourceRef source = Make(BE::VideoSourceRef(), declaration);
     ASSERT_TRUE(source);
-    FrameRef frame = MakeFilledFrame(4, 2, 0);
-    EXPECT_THROW(source->RenderFrame(MF::FrameTime(Ticks(0)), MakeParams(4, 2), frame),
-                 QRT::NullInterfaceException);
+    FrameRef frame = MakeFilledFrame(4, 2, Pixel{});
+    EXPECT_THROW(source->RenderFrame(MF::FrameTime(), m4x2, frame), QRT::NullInterfaceException);
     EXPECT_FALSE(frame);
     // The description comes from the declaration.
     EXPECT_EQ(RateOf(*source), mvxmediatypes::kFrameRate_Video25);
     EXPECT_EQ(FieldRateOf(*source), mvxmediatypes::kFrameRate_Video50);
     EXPECT_EQ(TicksOf(Conform(*source, MF::FrameTime(Ticks(kFrame25 + 1)))),
-              Pair(kFrame25, kFrame25 + kField25));
+              TickPair(kFrame25, kFrame25 + kField25));
     RenderableNodePrefetchList prefetches;
-    source->CollectPrefetches(MF::FrameTime(Ticks(0)), MakeParams(4, 2), prefetches);
+    source->CollectPrefetches(MF::FrameTime(), m4x2, prefetches);
     EXPECT_TRUE(prefetches.empty());
 }
 
-// --- RenderFrame: alpha -----------------------------------------------------------------
-
-TEST_F(RenderableVideoSourceTest, PremultipliedOverBlackIsMadeStraight)
+TEST_F(RenderableVideoSourceTest, AlphaIsMadeStraightInvertedOrIgnoredAsDeclared)
 {
-    // Red at alpha 128 premultiplied over black is stored as red 128.
-    const BE::VideoSourceRef pattern = OpenPattern(
-        "pattern:solid?size=8x4&color=FF0000&alpha=premultiplied&opacity=128&matte=000000");
-    Declaration declaration;
-    declaration.mAlphaKind = mvxmediatypes::kAlphaChannel_Premultiplied;
-    // Only the colour bytes count: an alpha byte alone is still a black matte.
-    declaration.mMatte = QRT::ParamColor::FromRGBA(0, 0, 0, 0xFF);
-    const FrameRef frame = Render(Make(pattern, declaration), MF::FrameTime(), MakeParams(8, 4));
-    EXPECT_TRUE(AllPixelsAre(frame, Bgra(0, 0, 255, 128)));
-    EXPECT_EQ(frame->GetAlphaChannel(), mvxmediatypes::kAlphaChannel_Straight);
+    // Red at alpha 128 premultiplied over black (stored red 128) and over blue.
+    const std::string overBlack =
+        "pattern:solid?size=8x4&color=FF0000&alpha=premultiplied&opacity=128&matte=000000";
+    const std::string overBlue =
+        "pattern:solid?size=8x4&color=FF0000&alpha=premultiplied&opacity=128&matte=0000FF";
+    const std::string straight = "pattern:solid?size=8x4&color=336699&alpha=straight&opacity=64";
+    const auto premultiplied = mvxmediatypes::kAlphaChannel_Premultiplied;
+    const auto plain = mvxmediatypes::kAlphaChannel_Straight;
+    const struct
+    {
+        const char* mWhat;
+        const std::string& mMedia;
+        mvxmediatypes::AlphaChannel mKind;
+        QRT::ParamColor mMatte;
+        bool mIgnore;
+        bool mInvert;
+        Pixel mExpected;
+    } cases[] = {
+        // Only the colour bytes count: an alpha byte alone is still a black matte.
+        {"over black",
+         overBlack,
+         premultiplied,
+         QRT::ParamColor::FromRGBA(0, 0, 0, 0xFF),
+         false,
+         false,
+         {0, 0, 255, 128}},
+        {"over the blue matte",
+         overBlue,
+         premultiplied,
+         QRT::ParamColor::FromRGBA(0, 0, 0xFF),
+         false,
+         false,
+         {0, 0, 255, 128}},
+        {"blue matte taken as black",
+         overBlue,
+         premultiplied,
+         QRT::ParamColor(),
+         false,
+         false,
+         {253, 0, 255, 128}},
+        {"ignore and invert: opaque", straight, plain, {}, true, true, {0x99, 0x66, 0x33, 255}},
+        {"ignore wins over premultiplied",
+         straight,
+         premultiplied,
+         {},
+         true,
+         false,
+         {0x99, 0x66, 0x33, 255}},
+        {"invert alone", straight, plain, {}, false, true, {0x99, 0x66, 0x33, 191}},
+    };
+    for (const auto& c : cases)
+    {
+        SCOPED_TRACE(c.mWhat);
+        Declaration declaration;
+        declaration.mAlphaKind = c.mKind;
+        declaration.mMatte = c.mMatte;
+        declaration.mIgnoreAlpha = c.mIgnore;
+        declaration.mInvertAlpha = c.mInvert;
+        const FrameRef frame =
+            Render(*Make(OpenPattern(c.mMedia), declaration), MF::FrameTime(), MakeParams(8, 4, 5));
+        EXPECT_TRUE(AllPixelsAre(frame, c.mExpected));
+        if (!c.mIgnore && !c.mInvert)
+        {
+            EXPECT_EQ(frame->GetAlphaChannel(), plain);
+        }
+    }
 
     // The source's own (shared) frame was not written.
     FrameRef original;
-    ASSERT_EQ(pattern->GetVideoFrame(Ticks(0), BE::VideoFrameRequest{8, 4}, mBinaryData, mProfile,
-                                     BE::Deprecated::kFrameRequestFlag_Read, original),
+    ASSERT_EQ(OpenPattern(overBlack)->GetVideoFrame(
+                  Ticks(0), BE::VideoFrameRequest{8, 4}, mBinaryData, mProfile,
+                  BE::Deprecated::kFrameRequestFlag_Read, original),
               QRT::kResult_Success);
-    EXPECT_TRUE(AllPixelsAre(original, Bgra(0, 0, 128, 128)));
-}
-
-TEST_F(RenderableVideoSourceTest, PremultipliedOverColouredMatteIsUnpremultipliedAgainstIt)
-{
-    // Red at 128 over a blue matte: red 128, blue 127.
-    const BE::VideoSourceRef pattern = OpenPattern(
-        "pattern:solid?size=8x4&color=FF0000&alpha=premultiplied&opacity=128&matte=0000FF");
-    Declaration declaration;
-    declaration.mAlphaKind = mvxmediatypes::kAlphaChannel_Premultiplied;
-    declaration.mMatte = QRT::ParamColor::FromRGBA(0, 0, 0xFF);
-    const FrameRef frame = Render(Make(pattern, declaration), MF::FrameTime(), MakeParams(8, 4));
-    EXPECT_TRUE(AllPixelsAre(frame, Bgra(0, 0, 255, 128)));
-    EXPECT_EQ(frame->GetAlphaChannel(), mvxmediatypes::kAlphaChannel_Straight);
-
-    // Taken as premultiplied over black instead, the blue would stay.
-    declaration.mMatte = QRT::ParamColor();
-    const FrameRef overBlack =
-        Render(Make(pattern, declaration), MF::FrameTime(), MakeParams(8, 4));
-    EXPECT_TRUE(AllPixelsAre(overBlack, Bgra(253, 0, 255, 128)));
+    EXPECT_TRUE(AllPixelsAre(original, Pixel{0, 0, 128, 128}));
 }
 
 TEST_F(RenderableVideoSourceTest, SixteenBitPremultipliedIsMadeStraightThroughStaging)
@@ -353,206 +412,145 @@ TEST_F(RenderableVideoSourceTest, SixteenBitPremultipliedIsMadeStraightThroughSt
     // Full red at alpha 32768 / 65535 premultiplied over black.
     FrameRef delivered = VF::CreateVideoFrame(mvxmediatypes::kPixelFormat_BGRA_4444_16u, 4, 2,
                                               mvxmediatypes::kPixelAspectRatio_Square, true, false);
-    ASSERT_TRUE(delivered);
     for (int y = 0; y < 2; ++y)
-    {
-        auto* row = reinterpret_cast<std::uint16_t*>(
-            static_cast<std::uint8_t*>(delivered->GetWritableBaseAddress()) +
-            y * delivered->GetRowBytes());
         for (int x = 0; x < 4; ++x)
         {
-            row[4 * x + 2] = 32768;
-            row[4 * x + 3] = 32768;
+            auto* pixel = reinterpret_cast<std::uint16_t*>(
+                              static_cast<std::uint8_t*>(delivered->GetWritableBaseAddress()) +
+                              y * delivered->GetRowBytes()) +
+                          4 * x;
+            pixel[2] = pixel[3] = 32768;
         }
-    }
-    delivered->MarkShared(1);
-    const ScriptedSourceRef scripted = MakeScriptedSource();
-    scripted->mFrame = delivered;
     Declaration declaration;
     declaration.mAlphaKind = mvxmediatypes::kAlphaChannel_Premultiplied;
-    const FrameRef frame = Render(MakeOver(scripted, declaration), MF::FrameTime(),
-                                  MakeParams(4, 2, mvxmediatypes::kPixelFormat_BGRA_4444_16u));
+    const FrameRef frame = Render(*Make(Handing(delivered), declaration), MF::FrameTime(),
+                                  MakeParams(4, 2, 5, mvxmediatypes::kPixelFormat_BGRA_4444_16u));
     ASSERT_EQ(frame->GetPixelFormat(), mvxmediatypes::kPixelFormat_BGRA_4444_16u);
     EXPECT_EQ(frame->GetAlphaChannel(), mvxmediatypes::kAlphaChannel_Straight);
     for (int y = 0; y < 2; ++y)
-    {
-        const auto* row = reinterpret_cast<const std::uint16_t*>(
-            static_cast<const std::uint8_t*>(frame->GetBaseAddress()) + y * frame->GetRowBytes());
         for (int x = 0; x < 4; ++x)
         {
-            EXPECT_EQ(row[4 * x + 0], 0);
-            EXPECT_EQ(row[4 * x + 1], 0);
-            EXPECT_EQ(row[4 * x + 2], 65535);
-            EXPECT_EQ(row[4 * x + 3], 32768);
+            const auto* pixel = reinterpret_cast<const std::uint16_t*>(
+                                    static_cast<const std::uint8_t*>(frame->GetBaseAddress()) +
+                                    y * frame->GetRowBytes()) +
+                                4 * x;
+            EXPECT_EQ(std::vector<int>(pixel, pixel + 4), (std::vector<int>{0, 0, 65535, 32768}));
         }
-    }
 }
 
-TEST_F(RenderableVideoSourceTest, StraightDeclarationRelabelsWithoutTouchingPixels)
+TEST_F(RenderableVideoSourceTest, StraightDeclarationRelabelsAndOpaqueFormatsAreLeftAlone)
 {
-    const ScriptedSourceRef scripted = MakeScriptedSource();
-    FrameRef delivered = MakeFilledFrame(4, 2, 0x80402010u);
+    FrameRef delivered = MakeFilledFrame(4, 2, Pixel{0x10, 0x20, 0x40, 0x80});
     delivered->SetAlphaChannel(mvxmediatypes::kAlphaChannel_Premultiplied);
-    delivered->MarkShared(1);
-    scripted->mFrame = delivered;
-    const FrameRef frame = Render(MakeOver(scripted, {}), MF::FrameTime(), MakeParams(4, 2));
+    const FrameRef frame = Render(*Make(Handing(delivered), {}), MF::FrameTime(), m4x2);
     EXPECT_NE(frame.Get(), delivered.Get());
     EXPECT_EQ(frame->GetAlphaChannel(), mvxmediatypes::kAlphaChannel_Straight);
-    EXPECT_TRUE(AllPixelsAre(frame, Bgra(0x10, 0x20, 0x40, 0x80)));
+    EXPECT_TRUE(AllPixelsAre(frame, Pixel{0x10, 0x20, 0x40, 0x80}));
     EXPECT_EQ(delivered->GetAlphaChannel(), mvxmediatypes::kAlphaChannel_Premultiplied);
-}
 
-TEST_F(RenderableVideoSourceTest, IgnoreAndInvertTogetherOnlyMakeAlphaOpaque)
-{
-    const BE::VideoSourceRef pattern =
-        OpenPattern("pattern:solid?size=8x4&color=336699&alpha=straight&opacity=64");
-    Declaration declaration;
-    declaration.mIgnoreAlpha = true;
-    declaration.mInvertAlpha = true;
-    FrameRef frame = Render(Make(pattern, declaration), MF::FrameTime(), MakeParams(8, 4));
-    EXPECT_TRUE(AllPixelsAre(frame, Bgra(0x99, 0x66, 0x33, 255)));
-
-    // Ignore alone also wins over a premultiplied declaration: no conversion.
-    declaration.mInvertAlpha = false;
-    declaration.mAlphaKind = mvxmediatypes::kAlphaChannel_Premultiplied;
-    frame = Render(Make(pattern, declaration), MF::FrameTime(), MakeParams(8, 4));
-    EXPECT_TRUE(AllPixelsAre(frame, Bgra(0x99, 0x66, 0x33, 255)));
-
-    // Invert alone inverts the alpha and keeps straight colour.
-    declaration = {};
-    declaration.mInvertAlpha = true;
-    frame = Render(Make(pattern, declaration), MF::FrameTime(), MakeParams(8, 4));
-    EXPECT_TRUE(AllPixelsAre(frame, Bgra(0x99, 0x66, 0x33, 191)));
-}
-
-TEST_F(RenderableVideoSourceTest, OpaqueFormatsAreLeftAlone)
-{
-    const ScriptedSourceRef scripted = MakeScriptedSource();
-    const FrameRef delivered =
+    const FrameRef opaque =
         VF::CreateVideoFrame(mvxmediatypes::kPixelFormat_YUYV_422_8u, 4, 2,
                              mvxmediatypes::kPixelAspectRatio_Square, true, false);
-    delivered->MarkShared(1);
-    scripted->mFrame = delivered;
     Declaration declaration;
     declaration.mIgnoreAlpha = true;
     declaration.mAlphaKind = mvxmediatypes::kAlphaChannel_Premultiplied;
-    const FrameRef frame = Render(MakeOver(scripted, declaration), MF::FrameTime(),
-                                  MakeParams(4, 2, mvxmediatypes::kPixelFormat_YUYV_422_8u));
-    EXPECT_EQ(frame.Get(), delivered.Get());
+    EXPECT_EQ(Render(*Make(Handing(opaque), declaration), MF::FrameTime(),
+                     MakeParams(4, 2, 5, mvxmediatypes::kPixelFormat_YUYV_422_8u))
+                  .Get(),
+              opaque.Get());
 }
-
-// --- RenderFrame: pixel aspect ratio ---------------------------------------------------
 
 TEST_F(RenderableVideoSourceTest, PixelAspectRatioIsAdjustedForNonUniformDelivery)
 {
-    const ScriptedSourceRef scripted = MakeScriptedSource();
-    FrameRef delivered = MakeFilledFrame(360, 480, 0xFF000000u);
-    delivered->MarkShared(1);
-    scripted->mFrame = delivered;
-    Declaration declaration;
-    declaration.mRatio = PixelAspectRatio(10, 11);
-    const SourceRef source = MakeOver(scripted, declaration);
-
-    // Half the columns of a 720x480 request: pixels twice as wide.
-    FrameRef frame = Render(source, MF::FrameTime(), MakeParams(720, 480));
-    EXPECT_EQ(frame->GetPixelAspectRatio(), PixelAspectRatio(20, 11));
-    EXPECT_NE(frame.Get(), delivered.Get());
+    const FrameRef delivered = MakeFilledFrame(360, 480, Pixel{0, 0, 0, 255});
+    const ScriptedSourceRef scripted = Handing(delivered);
+    const struct
+    {
+        PixelAspectRatio mDeclared;
+        std::uint32_t mWidth, mHeight;
+        PixelAspectRatio mExpected;
+        bool mSameFrame;
+    } cases[] = {
+        // Half the columns of a 720x480 request: pixels twice as wide.
+        {PixelAspectRatio(10, 11), 720, 480, PixelAspectRatio(20, 11), false},
+        // Uniform delivery keeps the declared ratio; a request without a size too.
+        {PixelAspectRatio(10, 11), 720, 960, PixelAspectRatio(10, 11), false},
+        {PixelAspectRatio(10, 11), 0, 0, PixelAspectRatio(10, 11), false},
+        // A frame that already has the ratio is handed on untouched.
+        {PixelAspectRatio(2, 2), 360, 480, mvxmediatypes::kPixelAspectRatio_Square, true},
+        // A clip that accepts any ratio keeps the source's.
+        {mvxmediatypes::kPixelAspectRatio_Any, 720, 480, mvxmediatypes::kPixelAspectRatio_Square,
+         true},
+    };
+    for (const auto& c : cases)
+    {
+        Declaration declaration;
+        declaration.mRatio = c.mDeclared;
+        const FrameRef frame = Render(*Make(scripted, declaration), MF::FrameTime(),
+                                      MakeParams(c.mWidth, c.mHeight, 5));
+        ASSERT_TRUE(frame);
+        EXPECT_EQ(frame->GetPixelAspectRatio(), c.mExpected) << c.mWidth << "x" << c.mHeight;
+        EXPECT_EQ(frame.Get() == delivered.Get(), c.mSameFrame) << c.mWidth << "x" << c.mHeight;
+    }
     EXPECT_EQ(delivered->GetPixelAspectRatio(), mvxmediatypes::kPixelAspectRatio_Square);
-
-    // Uniform delivery keeps the declared ratio; a request without a size too.
-    frame = Render(source, MF::FrameTime(), MakeParams(720, 960));
-    EXPECT_EQ(frame->GetPixelAspectRatio(), PixelAspectRatio(10, 11));
-    frame = Render(source, MF::FrameTime(), MakeParams(0, 0));
-    EXPECT_EQ(frame->GetPixelAspectRatio(), PixelAspectRatio(10, 11));
-
-    // A frame that already has the ratio is handed on untouched.
-    declaration.mRatio = PixelAspectRatio(2, 2);
-    frame = Render(MakeOver(scripted, declaration), MF::FrameTime(), MakeParams(360, 480));
-    EXPECT_EQ(frame.Get(), delivered.Get());
-
-    // A clip that accepts any ratio keeps the source's.
-    declaration.mRatio = mvxmediatypes::kPixelAspectRatio_Any;
-    frame = Render(MakeOver(scripted, declaration), MF::FrameTime(), MakeParams(720, 480));
-    EXPECT_EQ(frame.Get(), delivered.Get());
 }
 
-// --- CollectPrefetches -------------------------------------------------------------------
-
-TEST_F(RenderableVideoSourceTest, CollectsOneHandleForTheConvertedTimeWhenWanted)
+TEST_F(RenderableVideoSourceTest, CollectsOneHandleForTheConvertedTimeOnlyWhenWanted)
 {
     const ScriptedSourceRef scripted = MakeScriptedSource();
     scripted->mFrameRate = mvxmediatypes::kFrameRate_Video50;
-    scripted->mPrefetchWanted = true;
-    const SourceRef source = MakeOver(scripted, {});
-    const CutlistRenderParams params =
-        MakeParams(4, 2, mvxmediatypes::kPixelFormat_BGRA_4444_8u, 4);
+    const SourceRef source = Make(scripted, {});
     const MF::FrameTime time(Ticks(kFrame25 * 3 + kField25 + 1), Ticks(kFrame25 * 3 + 1));
-
     RenderableNodePrefetchList prefetches;
-    source->CollectPrefetches(time, params, prefetches);
+    // Not wanted: the source still receives the hint.
+    source->CollectPrefetches(time, m4x2, prefetches);
+    EXPECT_TRUE(prefetches.empty());
+    scripted->mPrefetchWanted = true;
+    source->CollectPrefetches(time, m4x2, prefetches);
     ASSERT_EQ(prefetches.size(), 1u);
     ASSERT_TRUE(prefetches[0]);
 
     const std::vector<PrefetchCall> hints = scripted->PrefetchCalls();
-    ASSERT_EQ(hints.size(), 1u);
-    EXPECT_EQ(hints[0].mTime.GetTicks(), 3 * kField25);
-    EXPECT_EQ(hints[0].mRequest.mFieldType, mvxmediatypes::kFieldType_LowerFirst);
-    EXPECT_EQ(hints[0].mRequest.mQuality, 4u);
-    EXPECT_EQ(hints[0].mBinaryData, mBinaryData);
-
+    ASSERT_EQ(hints.size(), 2u);
+    for (const PrefetchCall& hint : hints)
+    {
+        EXPECT_EQ(hint.mTime.GetTicks(), 3 * kField25);
+        EXPECT_EQ(hint.mRequest.mFieldType, mvxmediatypes::kFieldType_LowerFirst);
+        EXPECT_EQ(hint.mRequest.mQuality, 4u);
+        EXPECT_EQ(hint.mBinaryData, mBinaryData);
+    }
     // The handle reads the frame of the converted time with the same record.
     QRT::Guid key;
     prefetches[0]->GetPrefetchKey(key);
-    EXPECT_EQ(key,
-              scripted->GetFrameKey(Ticks(3 * kField25), hints[0].mRequest, mBinaryData, mProfile));
-
+    EXPECT_EQ(key, scripted->KeyFor(Ticks(3 * kField25)));
     // Appends to what the list already holds.
-    source->CollectPrefetches(time, params, prefetches);
+    source->CollectPrefetches(time, m4x2, prefetches);
     EXPECT_EQ(prefetches.size(), 2u);
 }
 
-TEST_F(RenderableVideoSourceTest, CollectsNothingWhenNoPrefetchIsWanted)
-{
-    const ScriptedSourceRef scripted = MakeScriptedSource();
-    const SourceRef source = MakeOver(scripted, {});
-    RenderableNodePrefetchList prefetches;
-    source->CollectPrefetches(MF::FrameTime(Ticks(kFrame25)), MakeParams(4, 2), prefetches);
-    EXPECT_TRUE(prefetches.empty());
-    // The source still receives the hint.
-    ASSERT_EQ(scripted->PrefetchCalls().size(), 1u);
-    EXPECT_EQ(scripted->PrefetchCalls()[0].mTime.GetTicks(), kFrame25);
-}
-
-// --- Threads -----------------------------------------------------------------------------
-
 TEST_F(RenderableVideoSourceTest, ConcurrentRendersOfOneSourceAgree)
 {
-    const BE::VideoSourceRef pattern = OpenPattern(
-        "pattern:solid?size=16x8&color=FF8000&alpha=premultiplied&opacity=128&matte=0000FF");
     Declaration declaration;
     declaration.mAlphaKind = mvxmediatypes::kAlphaChannel_Premultiplied;
     declaration.mMatte = QRT::ParamColor::FromRGBA(0, 0, 0xFF);
     declaration.mRatio = PixelAspectRatio(10, 11);
-    const SourceRef source = Make(pattern, declaration);
-    const FrameRef reference = Render(source, MF::FrameTime(), MakeParams(16, 8));
-    const std::array<int, 4> expected = Pixel(reference, 0, 0);
-
-    constexpr int kThreads = 4;
-    constexpr int kRendersPerThread = 50;
+    const SourceRef source = Make(
+        OpenPattern(
+            "pattern:solid?size=16x8&color=FF8000&alpha=premultiplied&opacity=128&matte=0000FF"),
+        declaration);
+    const Pixel expected = ReadPixel(*Render(*source, MF::FrameTime(), MakeParams(16, 8, 5)), 0, 0);
     std::atomic<int> mismatches{0};
     std::vector<std::thread> threads;
-    for (int t = 0; t < kThreads; ++t)
+    for (int t = 0; t < 4; ++t)
         threads.emplace_back(
             [&, t]
             {
-                for (int i = 0; i < kRendersPerThread; ++i)
+                for (int i = 0; i < 50; ++i)
                 {
-                    FrameRef frame;
                     // Two request sizes: the source scales for one of them.
-                    const std::uint32_t width = (i + t) % 2 == 0 ? 16 : 32;
-                    source->RenderFrame(MF::FrameTime(Ticks(i * kFrame25)), MakeParams(width, 8),
-                                        frame);
-                    if (!frame || !AllPixelsAre(frame, expected) ||
+                    const FrameRef frame = Render(*source, MF::FrameTime(Ticks(i * kFrame25)),
+                                                  MakeParams((i + t) % 2 == 0 ? 16 : 32, 8, 5));
+                    if (!AllPixelsAre(frame, expected) ||
                         frame->GetAlphaChannel() != mvxmediatypes::kAlphaChannel_Straight)
                         ++mismatches;
                 }

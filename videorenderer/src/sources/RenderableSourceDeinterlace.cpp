@@ -1,7 +1,7 @@
 #include "ML/RenderableSourceFilters.h"
 #include "QRT/Allocated.h"
-#include "QRT/QRTUnknown.h"
 #include "sources/FieldFilterSteps.h"
+#include "sources/FilterSourceBase.h"
 
 namespace ML
 {
@@ -16,11 +16,11 @@ using namespace FieldFilterSteps;
 // upstream already delivers progressive passes unchanged. Owned by whoever
 // holds its reference (a media chain); immutable, called from render and
 // prefetch threads at once.
-class RenderableSourceDeinterlace : public QRT::Implements<IRenderableSource>
+class RenderableSourceDeinterlace : public FilterSourceBase
 {
 public:
     explicit RenderableSourceDeinterlace(const QRT::InterfaceRef<IRenderableSource>& inUpstream)
-        : mUpstream(inUpstream)
+        : FilterSourceBase(inUpstream, Output::kProgressive)
     {
     }
 
@@ -32,44 +32,23 @@ public:
         outConformed = MF::FrameTime(upstream.GetTime());
     }
 
-    void CollectPrefetches(const MF::FrameTime& inTime, const CutlistRenderParams& inParams,
-                           RenderableNodePrefetchList& ioPrefetches) override
+private:
+    FrameRef Filter(const FrameRef& inFrame, const MF::FrameTime& inTime,
+                    const MF::FrameTime& inUpstreamTime,
+                    const CutlistRenderParams& inParams) override
     {
-        mUpstream->CollectPrefetches(ConformUpstream(mUpstream, inTime, inParams), inParams,
-                                     ioPrefetches);
-    }
-
-    void RenderFrame(const MF::FrameTime& inTime, const CutlistRenderParams& inParams,
-                     QRT::InterfaceRef<MF::IVideoFrame>& outFrame) override
-    {
-        outFrame = nullptr;
-        const MF::FrameTime conformed = ConformUpstream(mUpstream, inTime, inParams);
-        FrameRef frame = RenderUpstream(mUpstream, conformed, inParams);
-        if (!frame || conformed.IsProgressive())
-        {
-            outFrame = frame;
-            return;
-        }
+        if (inUpstreamTime.IsProgressive())
+            return inFrame;
         // The field to keep is the one upstream delivered at the requested
         // second time; the other one belongs to another instant.
-        const bool keepSecond = conformed.GetSecondFieldTime() == inTime.GetSecondFieldTime();
+        const bool keepSecond = inUpstreamTime.GetSecondFieldTime() == inTime.GetSecondFieldTime();
         CutlistRenderParams params = inParams;
-        const QRT::ParamRect bounds = frame->GetBounds();
+        const QRT::ParamRect bounds = inFrame->GetBounds();
         params.mWidth = static_cast<std::uint32_t>(bounds.Width());
         params.mHeight = static_cast<std::uint32_t>(bounds.Height());
-        params.mPixelAspectRatio = frame->GetPixelAspectRatio();
-        outFrame = DeinterlaceKeepingField(frame, params, keepSecond);
+        params.mPixelAspectRatio = inFrame->GetPixelAspectRatio();
+        return DeinterlaceKeepingField(inFrame, params, keepSecond);
     }
-
-    void GetFrameRate(mvxmediatypes::FrameRate& outRate) override
-    {
-        mUpstream->GetFrameRate(outRate);
-    }
-
-    void GetFieldRate(mvxmediatypes::FrameRate& outRate) override { GetFrameRate(outRate); }
-
-private:
-    const QRT::InterfaceRef<IRenderableSource> mUpstream;
 };
 
 } // namespace

@@ -1,8 +1,8 @@
 #include "ML/RenderableSourceFilters.h"
 #include "QRT/Allocated.h"
-#include "QRT/QRTUnknown.h"
 #include "VF/VideoFrameManipulators.h"
 #include "sources/FieldFilterSteps.h"
+#include "sources/FilterSourceBase.h"
 
 namespace ML
 {
@@ -17,11 +17,11 @@ using namespace FieldFilterSteps;
 // two fields of the frame it gets, so each field lands in the slot whose time
 // the caller asked for. Progressive requests pass through untouched.
 // Immutable; called from render and prefetch threads at once.
-class RenderableSourceFieldReverse : public QRT::Implements<IRenderableSource>
+class RenderableSourceFieldReverse : public FilterSourceBase
 {
 public:
     explicit RenderableSourceFieldReverse(const QRT::InterfaceRef<IRenderableSource>& inUpstream)
-        : mUpstream(inUpstream)
+        : FilterSourceBase(inUpstream, Output::kFieldsAsUpstream)
     {
     }
 
@@ -31,41 +31,23 @@ public:
         outConformed = ConformUpstream(mUpstream, inRequested, inParams).Swapped();
     }
 
-    void CollectPrefetches(const MF::FrameTime& inTime, const CutlistRenderParams& inParams,
-                           RenderableNodePrefetchList& ioPrefetches) override
+private:
+    MF::FrameTime UpstreamTime(const MF::FrameTime& inTime, const CutlistRenderParams&) override
     {
-        mUpstream->CollectPrefetches(inTime.Swapped(), inParams, ioPrefetches);
+        return inTime.Swapped();
     }
 
-    void RenderFrame(const MF::FrameTime& inTime, const CutlistRenderParams& inParams,
-                     QRT::InterfaceRef<MF::IVideoFrame>& outFrame) override
+    FrameRef Filter(const FrameRef& inFrame, const MF::FrameTime& inTime, const MF::FrameTime&,
+                    const CutlistRenderParams& inParams) override
     {
-        outFrame = nullptr;
-        FrameRef frame = RenderUpstream(mUpstream, inTime.Swapped(), inParams);
-        if (!frame || inTime.IsProgressive())
-        {
-            outFrame = frame;
-            return;
-        }
-        const FrameRef copy = MakeAddressableCopy(frame, inParams);
+        if (inTime.IsProgressive())
+            return inFrame;
+        const FrameRef copy = MakeAddressableCopy(inFrame, inParams);
         FrameRef swapped = copy->CreateEmptyFrame(false);
         ThrowIfFailed(VF::VideoFrameManipulators::SwapFields(copy, swapped));
         swapped->SetFieldType(inTime.GetFieldOrder());
-        outFrame = swapped;
+        return swapped;
     }
-
-    void GetFrameRate(mvxmediatypes::FrameRate& outRate) override
-    {
-        mUpstream->GetFrameRate(outRate);
-    }
-
-    void GetFieldRate(mvxmediatypes::FrameRate& outRate) override
-    {
-        mUpstream->GetFieldRate(outRate);
-    }
-
-private:
-    const QRT::InterfaceRef<IRenderableSource> mUpstream;
 };
 
 } // namespace

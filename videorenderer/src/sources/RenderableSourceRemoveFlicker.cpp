@@ -1,8 +1,8 @@
 #include "ML/RenderableSourceFilters.h"
 #include "QRT/Allocated.h"
-#include "QRT/QRTUnknown.h"
 #include "VF/VideoFrameManipulators.h"
 #include "sources/FieldFilterSteps.h"
+#include "sources/FilterSourceBase.h"
 
 namespace ML
 {
@@ -16,11 +16,11 @@ using namespace FieldFilterSteps;
 // filtered vertically (1, 2, 1) so that thin horizontal detail does not
 // flicker on an interlaced display. Immutable; called from render and
 // prefetch threads at once.
-class RenderableSourceRemoveFlicker : public QRT::Implements<IRenderableSource>
+class RenderableSourceRemoveFlicker : public FilterSourceBase
 {
 public:
     explicit RenderableSourceRemoveFlicker(const QRT::InterfaceRef<IRenderableSource>& inUpstream)
-        : mUpstream(inUpstream)
+        : FilterSourceBase(inUpstream, Output::kProgressive)
     {
     }
 
@@ -30,38 +30,17 @@ public:
         outConformed = MF::FrameTime(ConformUpstream(mUpstream, inRequested, inParams).GetTime());
     }
 
-    void CollectPrefetches(const MF::FrameTime& inTime, const CutlistRenderParams& inParams,
-                           RenderableNodePrefetchList& ioPrefetches) override
+private:
+    FrameRef Filter(const FrameRef& inFrame, const MF::FrameTime&, const MF::FrameTime&,
+                    const CutlistRenderParams& inParams) override
     {
-        mUpstream->CollectPrefetches(ConformUpstream(mUpstream, inTime, inParams), inParams,
-                                     ioPrefetches);
-    }
-
-    void RenderFrame(const MF::FrameTime& inTime, const CutlistRenderParams& inParams,
-                     QRT::InterfaceRef<MF::IVideoFrame>& outFrame) override
-    {
-        outFrame = nullptr;
-        const FrameRef frame =
-            RenderUpstream(mUpstream, ConformUpstream(mUpstream, inTime, inParams), inParams);
-        if (!frame)
-            return;
-        const FrameRef copy = MakeAddressableCopy(frame, inParams);
+        const FrameRef copy = MakeAddressableCopy(inFrame, inParams);
         FrameRef filtered = copy->CreateEmptyFrame(false);
         ThrowIfFailed(VF::VideoFrameManipulators::VerticalConvolve(copy, filtered));
         // The filtered rows mix both fields: the frame no longer has two instants.
         filtered->SetFieldType(mvxmediatypes::kFieldType_Progressive);
-        outFrame = filtered;
+        return filtered;
     }
-
-    void GetFrameRate(mvxmediatypes::FrameRate& outRate) override
-    {
-        mUpstream->GetFrameRate(outRate);
-    }
-
-    void GetFieldRate(mvxmediatypes::FrameRate& outRate) override { GetFrameRate(outRate); }
-
-private:
-    const QRT::InterfaceRef<IRenderableSource> mUpstream;
 };
 
 } // namespace

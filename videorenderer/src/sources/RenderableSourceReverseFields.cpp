@@ -1,7 +1,7 @@
 #include "ML/RenderableSourceFilters.h"
 #include "QRT/Allocated.h"
-#include "QRT/QRTUnknown.h"
 #include "sources/FieldFilterSteps.h"
+#include "sources/FilterSourceBase.h"
 
 namespace ML
 {
@@ -15,11 +15,11 @@ using namespace FieldFilterSteps;
 // whose field order is labelled wrongly. Every frame time passed upstream has
 // its two times swapped (and conformed times come back swapped); pixels are
 // never touched. Immutable; called from render and prefetch threads at once.
-class RenderableSourceReverseFields : public QRT::Implements<IRenderableSource>
+class RenderableSourceReverseFields : public FilterSourceBase
 {
 public:
     explicit RenderableSourceReverseFields(const QRT::InterfaceRef<IRenderableSource>& inUpstream)
-        : mUpstream(inUpstream)
+        : FilterSourceBase(inUpstream, Output::kFieldsAsUpstream)
     {
     }
 
@@ -29,31 +29,17 @@ public:
         outConformed = ConformUpstream(mUpstream, inRequested.Swapped(), inParams).Swapped();
     }
 
-    void CollectPrefetches(const MF::FrameTime& inTime, const CutlistRenderParams& inParams,
-                           RenderableNodePrefetchList& ioPrefetches) override
-    {
-        mUpstream->CollectPrefetches(inTime.Swapped(), inParams, ioPrefetches);
-    }
-
-    void RenderFrame(const MF::FrameTime& inTime, const CutlistRenderParams& inParams,
-                     QRT::InterfaceRef<MF::IVideoFrame>& outFrame) override
-    {
-        outFrame = nullptr;
-        outFrame = RenderUpstream(mUpstream, inTime.Swapped(), inParams);
-    }
-
-    void GetFrameRate(mvxmediatypes::FrameRate& outRate) override
-    {
-        mUpstream->GetFrameRate(outRate);
-    }
-
-    void GetFieldRate(mvxmediatypes::FrameRate& outRate) override
-    {
-        mUpstream->GetFieldRate(outRate);
-    }
-
 private:
-    const QRT::InterfaceRef<IRenderableSource> mUpstream;
+    MF::FrameTime UpstreamTime(const MF::FrameTime& inTime, const CutlistRenderParams&) override
+    {
+        return inTime.Swapped();
+    }
+
+    FrameRef Filter(const FrameRef& inFrame, const MF::FrameTime&, const MF::FrameTime&,
+                    const CutlistRenderParams&) override
+    {
+        return inFrame;
+    }
 };
 
 } // namespace

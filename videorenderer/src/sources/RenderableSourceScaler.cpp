@@ -1,8 +1,8 @@
 #include "ML/RenderableSourceFilters.h"
 #include "QRT/Allocated.h"
-#include "QRT/QRTUnknown.h"
 #include "VF/VideoFrameManipulators.h"
 #include "sources/FieldFilterSteps.h"
+#include "sources/FilterSourceBase.h"
 
 namespace ML
 {
@@ -37,11 +37,11 @@ std::int32_t NearestField(const MF::FrameTime& inTime, mvxmediatypes::TickTime i
 // progressive request reducing interlaced material takes the single field
 // nearest to the requested time. Frames that already fit pass unchanged.
 // Immutable; called from render and prefetch threads at once.
-class RenderableSourceScaler : public QRT::Implements<IRenderableSource>
+class RenderableSourceScaler : public FilterSourceBase
 {
 public:
     explicit RenderableSourceScaler(const QRT::InterfaceRef<IRenderableSource>& inUpstream)
-        : mUpstream(inUpstream)
+        : FilterSourceBase(inUpstream, Output::kFieldsAsUpstream)
     {
     }
 
@@ -64,77 +64,47 @@ public:
         outConformed = MF::FrameTime(delivered.GetFieldTime(field));
     }
 
-    void CollectPrefetches(const MF::FrameTime& inTime, const CutlistRenderParams& inParams,
-                           RenderableNodePrefetchList& ioPrefetches) override
+private:
+    FrameRef Filter(const FrameRef& inFrame, const MF::FrameTime& inTime,
+                    const MF::FrameTime& inDelivered, const CutlistRenderParams& inParams) override
     {
-        mUpstream->CollectPrefetches(ConformUpstream(mUpstream, inTime, inParams), inParams,
-                                     ioPrefetches);
-    }
-
-    void RenderFrame(const MF::FrameTime& inTime, const CutlistRenderParams& inParams,
-                     QRT::InterfaceRef<MF::IVideoFrame>& outFrame) override
-    {
-        outFrame = nullptr;
-        const MF::FrameTime delivered = ConformUpstream(mUpstream, inTime, inParams);
-        FrameRef frame = RenderUpstream(mUpstream, delivered, inParams);
-        if (!frame)
-            return;
-
         std::uint32_t targetHeight = inParams.mHeight;
         // Two fields of equal height need an even number of rows.
-        if (inTime.IsInterlaced() && delivered.IsInterlaced() && targetHeight % 2 != 0)
+        if (inTime.IsInterlaced() && inDelivered.IsInterlaced() && targetHeight % 2 != 0)
             ++targetHeight;
 
         const QRT::ParamRect target(0, 0, static_cast<std::int32_t>(inParams.mWidth),
                                     static_cast<std::int32_t>(targetHeight));
-        if (frame->GetBounds() == target &&
-            frame->GetPixelAspectRatio() == inParams.mPixelAspectRatio &&
-            (delivered.IsProgressive() || delivered.GetFieldOrder() == inTime.GetFieldOrder()))
-        {
-            outFrame = frame;
-            return;
-        }
+        if (inFrame->GetBounds() == target &&
+            inFrame->GetPixelAspectRatio() == inParams.mPixelAspectRatio &&
+            (inDelivered.IsProgressive() || inDelivered.GetFieldOrder() == inTime.GetFieldOrder()))
+            return inFrame;
         // Draft renders keep a full-frame rendering whole; the consumer
         // reduces it together with the rest of the layer.
         if (inParams.mQuality < mvxmediatypes::kRenderQuality_Medium &&
-            IsFullFrameRendering(*frame, inParams) && delivered == inTime)
-        {
-            outFrame = frame;
-            return;
-        }
+            IsFullFrameRendering(*inFrame, inParams) && inDelivered == inTime)
+            return inFrame;
 
         CutlistRenderParams params = inParams;
         params.mHeight = targetHeight;
-        FrameRef scaled = CreateFrameForParams(params, frame);
+        FrameRef scaled = CreateFrameForParams(params, inFrame);
         scaled->SetFieldType(inTime.GetFieldOrder());
-        std::int32_t selection = delivered.GetFieldOrder();
-        if (inTime.IsProgressive() && delivered.IsInterlaced())
+        std::int32_t selection = inDelivered.GetFieldOrder();
+        if (inTime.IsProgressive() && inDelivered.IsInterlaced())
         {
             // CopyFrameWithFields counts fields by time (1 the earlier one):
             // translate the nearest slot into that numbering.
-            const std::int32_t slot = NearestField(delivered, inTime.GetSecondFieldTime());
-            const bool slotIsEarlier = delivered.GetFieldTime(slot) == delivered.GetTime();
+            const std::int32_t slot = NearestField(inDelivered, inTime.GetSecondFieldTime());
+            const bool slotIsEarlier = inDelivered.GetFieldTime(slot) == inDelivered.GetTime();
             selection = slotIsEarlier ? VF::kFieldSelection_First : VF::kFieldSelection_Second;
         }
         const QRT::Result status = VF::VideoFrameManipulators::CopyFrameWithFields(
-            frame, scaled, static_cast<mvxmediatypes::RenderQuality>(inParams.mQuality), selection);
+            inFrame, scaled, static_cast<mvxmediatypes::RenderQuality>(inParams.mQuality),
+            selection);
         if (status < 0)
-            return;
-        outFrame = scaled;
+            return {};
+        return scaled;
     }
-
-    void GetFrameRate(mvxmediatypes::FrameRate& outRate) override
-    {
-        mUpstream->GetFrameRate(outRate);
-    }
-
-    void GetFieldRate(mvxmediatypes::FrameRate& outRate) override
-    {
-        mUpstream->GetFieldRate(outRate);
-    }
-
-private:
-    const QRT::InterfaceRef<IRenderableSource> mUpstream;
 };
 
 } // namespace

@@ -1,0 +1,657 @@
+#pragma once
+
+// Test doubles of the source, filter and prefetcher tests, and their helpers:
+// pixel access of small BGRA 8-bit frames, render parameters, and two doubles.
+//
+// MarkedSource is a renderable source that conforms like a media adaptor (to
+// its frame grid, in its declared field order, or following the request's
+// order) and renders frames whose slot-1 rows (0, 2, 4, ...) hold
+// Marker(first field time, 1) and slot-2 rows Marker(second field time, 2) of
+// the conformed time; with a gradient, channel R of row y is 10 * y instead.
+// Its frames are marked shared, so a filter that writes into them fails its
+// contract.
+//
+// ScriptedVideoSource is a back-end video source (with media information and,
+// when enabled, asynchronous reads) whose answers the test sets and which
+// records every frame, prefetch and draw request.
+//
+// Settings are made before a double is used; the records are guarded by a
+// mutex, so the doubles may be used from several threads.
+
+#include "BE/IMediaInfo.h"
+#include "BE/IVideoSource.h"
+#include "ML/CutlistRenderParams.h"
+#include "ML/IRenderableSource.h"
+#include "QRT/Allocated.h"
+#include "VF/VideoFrame.h"
+#include "VF/VideoFrameManipulators.h"
+
+#include <atomic>
+#include <condition_variable>
+#include <cstring>
+#include <functional>
+#include <map>
+#include <memory>
+#include <mutex>
+#include <ostream>
+#include <stdexcept>
+#include <thread>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+namespace ML::Test
+{
+
+using FrameRef = QRT::InterfaceRef<MF::IVideoFrame>;
+using SourceRef = QRT::InterfaceRef<IRenderableSource>;
+using mvxcore::utility::Guid;
+using mvxmediatypes::FrameRate;
+using mvxmediatypes::TickTime;
+
+inline TickTime Ticks(std::int64_t inTicks)
+{
+    return TickTime::TicksToTime(inTicks);
+}
+
+// 29.97 and 25 frames per second: frame and field durations in ticks.
+inline constexpr std::int64_t kFrame = 23'543'520;
+inline constexpr std::int64_t kField = kFrame / 2;
+inline constexpr std::int64_t kFrame25 = 28'224'000;
+inline constexpr std::int64_t kField25 = kFrame25 / 2;
+
+// A BGRA 8-bit pixel as stored in memory.
+struct Pixel
+{
+    std::uint8_t mB = 0, mG = 0, mR = 0, mA = 0;
+    friend bool operator==(const Pixel&, const Pixel&) = default;
+    friend std::ostream& operator<<(std::ostream& ioStream, const Pixel& inPixel)
+    {
+        return ioStream << "BGRA(" << int(inPixel.mB) << ", " << int(inPixel.mG) << ", "
+                        << int(inPixel.mR) << ", " << int(inPixel.mA) << ")";
+    }
+};
+
+inline Pixel ReadPixel(const MF::IVideoFrame& inFrame, std::int32_t inX, std::int32_t inY)
+{
+    Pixel pixel;
+    std::memcpy(&pixel,
+                static_cast<const std::uint8_t*>(inFrame.GetBaseAddress()) +
+                    static_cast<std::ptrdiff_t>(inY) * inFrame.GetRowBytes() + inX * 4,
+                4);
+    return pixel;
+}
+
+// Sets every pixel of a BGRA 8-bit frame to inPixelAt(x, y).
+inline void Paint(MF::IVideoFrame& ioFrame,
+                  const std::function<Pixel(std::int32_t, std::int32_t)>& inPixelAt)
+{
+    const QRT::ParamRect bounds = ioFrame.GetBounds();
+    auto* base = static_cast<std::uint8_t*>(ioFrame.GetWritableBaseAddress());
+    for (std::int32_t y = 0; y < bounds.Height(); ++y)
+        for (std::int32_t x = 0; x < bounds.Width(); ++x)
+        {
+            const Pixel pixel = inPixelAt(x, y);
+            std::memcpy(base + static_cast<std::ptrdiff_t>(y) * ioFrame.GetRowBytes() + x * 4,
+                        &pixel, 4);
+        }
+}
+
+inline FrameRef
+MakeFrame(std::uint32_t inWidth, std::uint32_t inHeight,
+          const std::function<Pixel(std::int32_t, std::int32_t)>& inPixelAt,
+          mvxmediatypes::PixelAspectRatio inRatio = mvxmediatypes::kPixelAspectRatio_Square)
+{
+    FrameRef frame = VF::CreateVideoFrame(mvxmediatypes::kPixelFormat_BGRA_4444_8u, inWidth,
+                                          inHeight, inRatio, false, false);
+    Paint(*frame, inPixelAt);
+    return frame;
+}
+
+inline FrameRef MakeFilledFrame(std::uint32_t inWidth, std::uint32_t inHeight, Pixel inPixel)
+{
+    return MakeFrame(inWidth, inHeight, [inPixel](std::int32_t, std::int32_t) { return inPixel; });
+}
+
+// Checks every pixel of inFrame (rows and columns of its bounds) against inExpected(x, y).
+inline ::testing::AssertionResult
+PixelsAre(const FrameRef& inFrame,
+          const std::function<Pixel(std::int32_t, std::int32_t)>& inExpected)
+{
+    if (!inFrame)
+        return ::testing::AssertionFailure() << "no frame";
+    const QRT::ParamRect bounds = inFrame->GetBounds();
+    for (std::int32_t y = 0; y < bounds.Height(); ++y)
+        for (std::int32_t x = 0; x < bounds.Width(); ++x)
+            if (ReadPixel(*inFrame, x, y) != inExpected(x, y))
+                return ::testing::AssertionFailure()
+                       << "pixel (" << x << ", " << y << ") is " << ReadPixel(*inFrame, x, y)
+                       << ", expected " << inExpected(x, y);
+    return ::testing::AssertionSuccess();
+}
+
+inline ::testing::AssertionResult AllPixelsAre(const FrameRef& inFrame, Pixel inExpected)
+{
+    return PixelsAre(inFrame, [inExpected](std::int32_t, std::int32_t) { return inExpected; });
+}
+
+// Rows alternate between the two slots' pixels (slot 1 on even rows).
+inline ::testing::AssertionResult RowsAre(const FrameRef& inFrame, Pixel inFirst, Pixel inSecond)
+{
+    return PixelsAre(inFrame, [&](std::int32_t, std::int32_t inY)
+                     { return inY % 2 == 0 ? inFirst : inSecond; });
+}
+
+// A copy of inFrame in inFormat (BGRA 8-bit unless told), converted at high quality.
+inline FrameRef
+Converted(const FrameRef& inFrame,
+          mvxmediatypes::PixelFormat inFormat = mvxmediatypes::kPixelFormat_BGRA_4444_8u)
+{
+    const QRT::ParamRect bounds = inFrame->GetBounds();
+    FrameRef copy = VF::CreateVideoFrame(inFormat, static_cast<std::uint32_t>(bounds.Width()),
+                                         static_cast<std::uint32_t>(bounds.Height()),
+                                         inFrame->GetPixelAspectRatio(), false, false);
+    EXPECT_GE(
+        VF::VideoFrameManipulators::CopyFrame(inFrame, copy, mvxmediatypes::kRenderQuality_High),
+        0);
+    return copy;
+}
+
+// Render parameters for a frame of the given size (also the full frame) at
+// 29.97; the secondary quality is the quality.
+inline CutlistRenderParams
+MakeParams(std::uint32_t inWidth, std::uint32_t inHeight, std::uint32_t inQuality = 4,
+           mvxmediatypes::PixelFormat inFormat = mvxmediatypes::kPixelFormat_BGRA_4444_8u)
+{
+    CutlistRenderParams params;
+    params.mWidth = params.mFullFrameWidth = inWidth;
+    params.mHeight = params.mFullFrameHeight = inHeight;
+    params.mPixelAspectRatio = params.mFullFramePixelAspectRatio =
+        mvxmediatypes::kPixelAspectRatio_Square;
+    params.mPixelFormat = inFormat;
+    params.mQuality = params.mSecondaryQuality = inQuality;
+    params.mFrameRate = mvxmediatypes::kFrameRate_Video2997;
+    return params;
+}
+
+inline MF::FrameTime Conform(IRenderableSource& inSource, const MF::FrameTime& inTime,
+                             const CutlistRenderParams& inParams = {})
+{
+    MF::FrameTime conformed(Ticks(-1));
+    inSource.ConformFrameTime(inTime, inParams, conformed);
+    return conformed;
+}
+
+inline FrameRef Render(IRenderableSource& inSource, const MF::FrameTime& inTime,
+                       const CutlistRenderParams& inParams)
+{
+    FrameRef frame;
+    inSource.RenderFrame(inTime, inParams, frame);
+    return frame;
+}
+
+inline FrameRate RateOf(IRenderableSource& inSource)
+{
+    FrameRate rate;
+    inSource.GetFrameRate(rate);
+    return rate;
+}
+
+inline FrameRate FieldRateOf(IRenderableSource& inSource)
+{
+    FrameRate rate;
+    inSource.GetFieldRate(rate);
+    return rate;
+}
+
+// The marker of field slot inSlot of a frame whose slot holds inTime (a
+// multiple of kField, at most 15 fields).
+inline Pixel Marker(TickTime inTime, std::int32_t inSlot)
+{
+    const std::int64_t index = inTime.GetTicks() / kField;
+    if (inTime.GetTicks() % kField != 0 || index < 0 || index > 15)
+        throw std::logic_error("marker time off the test grid");
+    return Pixel{static_cast<std::uint8_t>(index * 16 + 8), static_cast<std::uint8_t>(inSlot * 64),
+                 static_cast<std::uint8_t>(index), 255};
+}
+
+// Marker(inTime, inSlot) with channel R set to 10 * inRow: the gradient rows.
+inline Pixel GradientMarker(TickTime inTime, std::int32_t inSlot, std::int32_t inRow)
+{
+    Pixel pixel = Marker(inTime, inSlot);
+    pixel.mR = static_cast<std::uint8_t>(10 * inRow);
+    return pixel;
+}
+
+// Base of the renderable test sources: logs prefetch requests and renders.
+class LoggingSource : public QRT::Implements<IRenderableSource>
+{
+public:
+    void CollectPrefetches(const MF::FrameTime& inTime, const CutlistRenderParams&,
+                           RenderableNodePrefetchList&) override
+    {
+        std::lock_guard lock(mLogLock);
+        mPrefetched.push_back(inTime);
+    }
+    std::vector<MF::FrameTime> Prefetched() const
+    {
+        std::lock_guard lock(mLogLock);
+        return mPrefetched;
+    }
+    std::vector<MF::FrameTime> Rendered() const
+    {
+        std::lock_guard lock(mLogLock);
+        return mRendered;
+    }
+    FrameRef LastFrame() const
+    {
+        std::lock_guard lock(mLogLock);
+        return mLastFrame;
+    }
+    // True when inFrame is the frame this source rendered last (the same object).
+    bool IsLastFrame(const FrameRef& inFrame) const { return inFrame == LastFrame(); }
+
+protected:
+    // Marks inFrame shared, logs it and hands it out.
+    void Deliver(const MF::FrameTime& inTime, const FrameRef& inFrame, FrameRef& outFrame)
+    {
+        inFrame->SetFieldType(inTime.GetFieldOrder());
+        inFrame->MarkShared(1);
+        std::lock_guard lock(mLogLock);
+        mRendered.push_back(inTime);
+        mLastFrame = outFrame = inFrame;
+    }
+
+private:
+    mutable std::mutex mLogLock; // guards the three logs
+    std::vector<MF::FrameTime> mPrefetched;
+    std::vector<MF::FrameTime> mRendered;
+    FrameRef mLastFrame;
+};
+
+enum class Delivery
+{
+    kProgressive,  // progressive frames on its frame grid
+    kUpperFirst,   // interlaced, first slot earlier, whatever the request
+    kLowerFirst,   // interlaced, first slot later, whatever the request
+    kFollowRequest // interlaced requests in their order; progressive ones on the field grid
+};
+
+class MarkedSource : public LoggingSource
+{
+public:
+    // inWidth/inHeight 0: frames at the requested size.
+    MarkedSource(Delivery inDelivery, FrameRate inRate, std::uint32_t inWidth,
+                 std::uint32_t inHeight, bool inGradient)
+        : mDelivery(inDelivery)
+        , mRate(inRate)
+        , mWidth(inWidth)
+        , mHeight(inHeight)
+        , mGradient(inGradient)
+    {
+    }
+
+    void ConformFrameTime(const MF::FrameTime& inRequested, const CutlistRenderParams&,
+                          MF::FrameTime& outConformed) override
+    {
+        const TickTime frame = inRequested.GetTime().AlignToFrame(mRate);
+        const TickTime half = (mRate * 2).GetFrameDuration();
+        switch (mDelivery)
+        {
+        case Delivery::kProgressive:
+            outConformed = MF::FrameTime(frame);
+            return;
+        case Delivery::kUpperFirst:
+        case Delivery::kLowerFirst:
+            outConformed = MF::FrameTime::Make(frame,
+                                               mDelivery == Delivery::kUpperFirst
+                                                   ? mvxmediatypes::kFieldType_UpperFirst
+                                                   : mvxmediatypes::kFieldType_LowerFirst,
+                                               half);
+            return;
+        case Delivery::kFollowRequest:
+            outConformed = inRequested.IsProgressive()
+                               ? MF::FrameTime(inRequested.GetTime().AlignToFrame(mRate * 2))
+                               : MF::FrameTime::Make(frame, inRequested.GetFieldOrder(), half);
+            return;
+        }
+    }
+
+    void RenderFrame(const MF::FrameTime& inTime, const CutlistRenderParams& inParams,
+                     FrameRef& outFrame) override
+    {
+        MF::FrameTime conformed;
+        ConformFrameTime(inTime, inParams, conformed);
+        const FrameRef frame = MakeFrame(
+            mWidth != 0 ? mWidth : inParams.mWidth, mHeight != 0 ? mHeight : inParams.mHeight,
+            [&](std::int32_t, std::int32_t inY)
+            {
+                const std::int32_t slot = inY % 2 == 0 ? 1 : 2;
+                const TickTime time = conformed.GetFieldTime(slot);
+                return mGradient ? GradientMarker(time, slot, inY) : Marker(time, slot);
+            });
+        Deliver(conformed, frame, outFrame);
+    }
+
+    void GetFrameRate(FrameRate& outRate) override { outRate = mRate; }
+    void GetFieldRate(FrameRate& outRate) override
+    {
+        outRate = mDelivery == Delivery::kProgressive ? mRate : mRate * 2;
+    }
+
+private:
+    const Delivery mDelivery;
+    const FrameRate mRate;
+    const std::uint32_t mWidth;
+    const std::uint32_t mHeight;
+    const bool mGradient;
+};
+
+inline QRT::InterfaceRef<MarkedSource> MakeMarkedSource(Delivery inDelivery,
+                                                        std::uint32_t inWidth = 0,
+                                                        std::uint32_t inHeight = 0,
+                                                        bool inGradient = false)
+{
+    return QRT::Allocated<MarkedSource>::CreateInstance(
+        inDelivery, mvxmediatypes::kFrameRate_Video2997, inWidth, inHeight, inGradient);
+}
+
+// A one-shot latch: Wait blocks until Open.
+class Gate
+{
+public:
+    void Open()
+    {
+        {
+            std::lock_guard lock(mMutex);
+            mOpen = true;
+        }
+        mChanged.notify_all();
+    }
+    void Wait()
+    {
+        std::unique_lock lock(mMutex);
+        mChanged.wait(lock, [this] { return mOpen; });
+    }
+
+private:
+    std::mutex mMutex; // guards mOpen
+    std::condition_variable mChanged;
+    bool mOpen = false;
+};
+
+// A frame key unique to this process run, so that tests never meet each
+// other's frames in the process-wide cache.
+inline Guid MakeKey()
+{
+    static std::atomic<std::uint32_t> sNext{1};
+    Guid key;
+    key.Data2 = 0x7e57;
+    const std::uint32_t serial = sNext.fetch_add(1);
+    for (int i = 0; i < 4; ++i)
+        key.Data4[4 + i] = static_cast<std::uint8_t>(serial >> (8 * i));
+    return key;
+}
+
+struct FrameCall
+{
+    TickTime mTime;
+    BE::VideoFrameRequest mRequest;
+    MF::BinaryData mBinaryData;
+    BE::ColorProfile mColorProfile;
+    std::int32_t mFlags = -1;
+    std::thread::id mThread;
+};
+
+struct PrefetchCall
+{
+    TickTime mTime;
+    BE::VideoFrameRequest mRequest;
+    MF::BinaryData mBinaryData;
+};
+
+struct DrawCall
+{
+    TickTime mTime;
+    MF::BinaryData mBinaryData;
+    TickTime mFrameGridOrigin;
+    TickTime mSecondTime;
+    // The destination's address only: holding a reference would make the
+    // adaptor copy the frame before it writes.
+    const void* mDestination = nullptr;
+    mvxmediatypes::PixelFormat mDestinationFormat;
+    QRT::ParamRect mDestinationBounds;
+    mvxmediatypes::PixelAspectRatio mDestinationRatio;
+    mvxmediatypes::FieldType mDestinationFieldType = mvxmediatypes::kFieldType_Invalid;
+    mvxmediatypes::RenderQuality mQuality = mvxmediatypes::kRenderQuality_Draft;
+    mvxmediatypes::FieldType mFieldType = mvxmediatypes::kFieldType_Invalid;
+    bool mProgressive = false;
+    bool mIgnoreAlpha = false;
+    bool mInvertAlpha = false;
+    bool mThirdFlag = false;
+    double mValue = 0.0;
+};
+
+class ScriptedVideoSource
+    : public QRT::Implements<BE::Deprecated::IVideoSource, BE::Deprecated::IMediaInfo,
+                             BE::Deprecated::IAsyncVideoSource>
+{
+public:
+    // --- Settings -------------------------------------------------------------
+    FrameRate mFrameRate = mvxmediatypes::kFrameRate_Video25;
+    bool mStill = false;
+    bool mImage = false;
+    mvxmediatypes::FieldType mFieldType = mvxmediatypes::kFieldType_Progressive;
+    std::int32_t mKind = BE::Deprecated::kMediaInfoKind_Clip;
+    std::vector<mvxmediatypes::PixelFormat> mPixelFormats = {
+        mvxmediatypes::kPixelFormat_BGRA_4444_8u};
+    // A read waits for mReadGate (when set), then answers mFrameStatus and on
+    // success mFrame, or with mNewFrames a new 4x2 frame per read. Frames read
+    // are held (when mHoldsReadFrames) and answer kFrameRequestFlag_NoBlock.
+    QRT::Result mFrameStatus = QRT::kResult_Success;
+    FrameRef mFrame;
+    bool mNewFrames = false;
+    bool mHoldsReadFrames = true;
+    std::shared_ptr<Gate> mReadGate;
+    // DrawVideoFrame answers mDrawStatus; on success it fills a BGRA 8-bit
+    // destination with mDrawPixel.
+    QRT::Result mDrawStatus = QRT::kResult_Success;
+    Pixel mDrawPixel{0, 0, 0, 255};
+    bool mPrefetchWanted = false;
+    // Keys are mKeySalt with the time in Data1, or null keys.
+    bool mNullKeys = false;
+    Guid mKeySalt = MakeKey();
+    // Asynchronous reads: off unless enabled. A wait answers true once
+    // CompleteRead ran, else mWaitAnswer.
+    std::atomic<bool> mAsyncEnabled{false};
+    std::atomic<QRT::Result> mStartStatus{QRT::kResult_Success};
+    std::atomic<bool> mWaitAnswer{true};
+    std::atomic<int> mStarts{0};
+    std::atomic<int> mWaits{0};
+    std::atomic<int> mCancels{0};
+
+    // --- Records --------------------------------------------------------------
+    std::vector<FrameCall> FrameCalls() const
+    {
+        std::lock_guard lock(mMutex);
+        return mFrameCalls;
+    }
+    // The times of the reads (requests with kFrameRequestFlag_Read), in order.
+    std::vector<std::int64_t> ReadTicks() const
+    {
+        std::vector<std::int64_t> ticks;
+        for (const FrameCall& call : FrameCalls())
+            if (call.mFlags == BE::Deprecated::kFrameRequestFlag_Read)
+                ticks.push_back(call.mTime.GetTicks());
+        return ticks;
+    }
+    std::vector<PrefetchCall> PrefetchCalls() const
+    {
+        std::lock_guard lock(mMutex);
+        return mPrefetchCalls;
+    }
+    std::vector<DrawCall> DrawCalls() const
+    {
+        std::lock_guard lock(mMutex);
+        return mDrawCalls;
+    }
+    int HoldCount() const { return mHolds.load(); }
+
+    Guid KeyFor(TickTime inTime) const
+    {
+        Guid key = mKeySalt;
+        key.Data1 = static_cast<std::uint32_t>(inTime.GetTicks());
+        return mNullKeys ? Guid() : key;
+    }
+
+    // Completes the started asynchronous read: the frame becomes held.
+    void CompleteRead(TickTime inTime)
+    {
+        FrameRef frame;
+        GetVideoFrame(inTime, {}, {}, {}, BE::Deprecated::kFrameRequestFlag_Read, frame);
+        mCompleted.store(true);
+    }
+
+    // --- IVideoSource -----------------------------------------------------------
+    FrameRate GetFrameRate() const noexcept override { return mFrameRate; }
+    bool IsStill() const noexcept override { return mStill; }
+    bool IsImage() const noexcept override { return mImage; }
+    mvxmediatypes::FieldType GetFieldType() const noexcept override { return mFieldType; }
+    QRT::ParamRect GetBounds() const noexcept override { return {0, 0, 4, 2}; }
+    mvxmediatypes::PixelAspectRatio GetPixelAspectRatio() const noexcept override
+    {
+        return mvxmediatypes::kPixelAspectRatio_Square;
+    }
+    mvxmediatypes::AlphaChannel GetAlphaChannel() const noexcept override
+    {
+        return mvxmediatypes::kAlphaChannel_None;
+    }
+    QRT::ParamColor GetMatteColor() const noexcept override { return {}; }
+    BE::ColorProfile GetColorProfile() const override { return {"sRGB", nullptr}; }
+    std::vector<mvxmediatypes::PixelFormat> GetPixelFormats() const override
+    {
+        return mPixelFormats;
+    }
+
+    QRT::Result GetVideoFrame(TickTime inTime, const BE::VideoFrameRequest& inRequest,
+                              const MF::BinaryData& inBinaryData,
+                              const BE::ColorProfile& inColorProfile, std::int32_t inFlags,
+                              FrameRef& outFrame) override
+    {
+        outFrame = nullptr;
+        if (inFlags == BE::Deprecated::kFrameRequestFlag_Read && mReadGate)
+            mReadGate->Wait();
+        std::lock_guard lock(mMutex);
+        mFrameCalls.push_back(
+            {inTime, inRequest, inBinaryData, inColorProfile, inFlags, std::this_thread::get_id()});
+        if (inFlags == BE::Deprecated::kFrameRequestFlag_NoBlock)
+        {
+            const auto found = mHeld.find(inTime.GetTicks());
+            if (found == mHeld.end())
+                return static_cast<QRT::Result>(0xA0100005u);
+            outFrame = found->second;
+            return QRT::kResult_Success;
+        }
+        if (QRT::Failed(mFrameStatus))
+            return mFrameStatus;
+        outFrame = mNewFrames ? MakeFilledFrame(4, 2, Pixel{}) : mFrame;
+        if (outFrame && mHoldsReadFrames)
+            mHeld[inTime.GetTicks()] = outFrame;
+        return QRT::kResult_Success;
+    }
+
+    void PrefetchVideoFrame(TickTime inTime, const BE::VideoFrameRequest& inRequest,
+                            const MF::BinaryData& inBinaryData) override
+    {
+        std::lock_guard lock(mMutex);
+        mPrefetchCalls.push_back({inTime, inRequest, inBinaryData});
+    }
+
+    QRT::Result DrawVideoFrame(TickTime inTime, const MF::BinaryData& inBinaryData,
+                               TickTime inFrameGridOrigin, TickTime inSecondTime,
+                               const FrameRef& ioDestination,
+                               mvxmediatypes::RenderQuality inQuality,
+                               mvxmediatypes::FieldType inFieldType, bool inProgressive,
+                               bool inIgnoreAlpha, bool inInvertAlpha, bool inThirdFlag,
+                               double inValue) override
+    {
+        {
+            std::lock_guard lock(mMutex);
+            mDrawCalls.push_back(
+                {inTime, inBinaryData, inFrameGridOrigin, inSecondTime, ioDestination.Get(),
+                 ioDestination->GetPixelFormat(), ioDestination->GetBounds(),
+                 ioDestination->GetPixelAspectRatio(), ioDestination->GetFieldType(), inQuality,
+                 inFieldType, inProgressive, inIgnoreAlpha, inInvertAlpha, inThirdFlag, inValue});
+        }
+        if (QRT::Failed(mDrawStatus))
+            return mDrawStatus;
+        if (ioDestination->GetPixelFormat() == mvxmediatypes::kPixelFormat_BGRA_4444_8u)
+            Paint(*ioDestination, [this](std::int32_t, std::int32_t) { return mDrawPixel; });
+        return QRT::kResult_Success;
+    }
+
+    bool IsPrefetchWanted(TickTime) const override { return mPrefetchWanted; }
+    Guid GetFrameKey(TickTime inTime, const BE::VideoFrameRequest&, const MF::BinaryData&,
+                     const BE::ColorProfile&) const override
+    {
+        return KeyFor(inTime);
+    }
+    BE::Deprecated::PrefetchHold GetPrefetchHold() override
+    {
+        mHolds.fetch_add(1);
+        return std::make_shared<int>(0);
+    }
+
+    // --- IMediaInfo -------------------------------------------------------------
+    std::int32_t GetKind() const noexcept override { return mKind; }
+    std::u16string GetName() const override { return u"scripted"; }
+    std::uint32_t GetStreamCount(std::int32_t inType) const override
+    {
+        return inType == BE::Deprecated::kMediaType_Video ? 1 : 0;
+    }
+    QRT::InterfaceRef<BE::Deprecated::IVideoSource> GetVideoSource(std::int32_t,
+                                                                   std::int32_t) override
+    {
+        return QRT::InterfaceRef<BE::Deprecated::IVideoSource>(this);
+    }
+    TickTime GetDuration() const noexcept override { return mvxmediatypes::kTime_Max; }
+    QRT::InterfaceRef<BE::Deprecated::IMediaInfo> Copy() const override { return {}; }
+
+    // --- IAsyncVideoSource ------------------------------------------------------
+    bool IsAsyncEnabled() const noexcept override { return mAsyncEnabled.load(); }
+    QRT::Result StartAsyncRead(TickTime, const BE::VideoFrameRequest&, const MF::BinaryData&,
+                               const BE::ColorProfile&) override
+    {
+        mStarts.fetch_add(1);
+        return mStartStatus.load();
+    }
+    bool WaitForAsyncRead(TickTime, const BE::VideoFrameRequest&, const MF::BinaryData&,
+                          const BE::ColorProfile&, double) override
+    {
+        mWaits.fetch_add(1);
+        return mCompleted.load() || mWaitAnswer.load();
+    }
+    void CancelAsyncRead(TickTime, const BE::VideoFrameRequest&, const MF::BinaryData&,
+                         const BE::ColorProfile&) override
+    {
+        mCancels.fetch_add(1);
+    }
+
+private:
+    mutable std::mutex mMutex; // guards the call records and mHeld
+    std::vector<FrameCall> mFrameCalls;
+    std::vector<PrefetchCall> mPrefetchCalls;
+    std::vector<DrawCall> mDrawCalls;
+    std::map<std::int64_t, FrameRef> mHeld;
+    std::atomic<int> mHolds{0};
+    std::atomic<bool> mCompleted{false};
+};
+
+using ScriptedSourceRef = QRT::InterfaceRef<ScriptedVideoSource>;
+
+inline ScriptedSourceRef MakeScriptedSource()
+{
+    return QRT::Allocated<ScriptedVideoSource>::CreateInstance();
+}
+
+} // namespace ML::Test
