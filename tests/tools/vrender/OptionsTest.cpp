@@ -5,7 +5,7 @@
 
 #include "VrenderTestSupport.h"
 
-#include <ranges>
+#include <sstream>
 #include <string>
 #include <string_view>
 #include <tuple>
@@ -45,9 +45,9 @@ auto Fields(const RenderOptions& inOptions)
 Args Words(std::string_view inText)
 {
     Args words;
-    for (const auto word : std::views::split(inText, ' '))
-        if (!word.empty())
-            words.emplace_back(word.begin(), word.end());
+    std::istringstream stream{std::string(inText)};
+    for (std::string word; stream >> word;)
+        words.push_back(word);
     return words;
 }
 
