@@ -86,7 +86,8 @@ TEST_F(EndToEndTest, Y4MStreamHoldsTheSameFramesInOrder)
     const std::string header = "YUV4MPEG2 W48 H32 F25:1 Ip A1:1 C444 XCOLORRANGE=LIMITED\n";
     ASSERT_EQ(run.mOut.substr(0, header.size()), header);
     EXPECT_EQ(run.mOut.size(), header.size() + 4 * (6 + 3 * 48 * 32));
-    EXPECT_NE(run.mErr.find("Rendered 4 frames"), std::string::npos);
+    EXPECT_EQ(run.mErr.rfind("Rendered 4 frames", 0), 0u) << run.mErr;
+    EXPECT_NE(run.mErr.find(" to standard output\n"), std::string::npos) << run.mErr;
 
     std::ofstream(mDirectory / "stream.y4m", std::ios::binary) << run.mOut;
     const BE::VideoSourceRef source = OpenY4M(mDirectory / "stream.y4m");

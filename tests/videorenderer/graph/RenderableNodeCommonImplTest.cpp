@@ -66,14 +66,8 @@ TEST_F(RenderableNodeCommonImplTest, InputsAndOperatorsAreHashedInOrderAndReadBa
     clip->AddOperator(second);
     clip->MakeImmutable();
 
-    ByteRuns runs{kSeed,
-                  "Input::",
-                  BytesOf<std::int64_t>(250),
-                  BytesOf(child->GetNodeHash()),
-                  "Input::",
-                  BytesOf<std::int64_t>(-7),
-                  "NodeType::",
-                  "Clip"};
+    ByteRuns runs({kSeed, "Input::", BytesOf<std::int64_t>(250), BytesOf(child->GetNodeHash()),
+                   "Input::", BytesOf<std::int64_t>(-7), "NodeType::", "Clip"});
     EXPECT_EQ(clip->GetInputSideHash(), HashOfRuns(runs));
     runs.insert(runs.end(), {"Operator::", BytesOf(first->GetNodeHash()),
                              "Operator::", BytesOf(second->GetNodeHash())});
