@@ -147,15 +147,17 @@ TEST_F(MutableCutlistTest, HashChangesWithEverySegmentField)
             << testing::PrintToString(changed);
 }
 
-TEST_F(MutableCutlistTest, NodeAtTimeHonoursHalfOpenBoundariesAndMapsBothFields)
+TEST_F(MutableCutlistTest, LookupsByTimeHonourHalfOpenBoundariesAndMapBothFields)
 {
     const CutlistRef list =
         Sealed({{100, 200, 1000, 'A'}, {200, 300, 0, 'B'}, {400, 500, -50, 'A'}});
-    // Time, node (0: none) and local time.
-    const std::tuple<std::int64_t, char, std::int64_t> cases[] = {
-        {-5, 0, 0},  {99, 0, 0},  {100, 'A', 1000}, {199, 'A', 1099}, {200, 'B', 0}, {299, 'B', 99},
-        {300, 0, 0}, {399, 0, 0}, {400, 'A', -50},  {499, 'A', 49},   {500, 0, 0}};
-    for (const auto& [time, name, localTicks] : cases)
+    const std::vector<Seg> segments = SegmentsOf(list);
+    // Time, node (0: none), local time and segment index.
+    const std::tuple<std::int64_t, char, std::int64_t, std::size_t> cases[] = {
+        {-5, 0, 0, 0},      {99, 0, 0, 0},     {100, 'A', 1000, 0}, {199, 'A', 1099, 0},
+        {200, 'B', 0, 1},   {299, 'B', 99, 1}, {300, 0, 0, 0},      {399, 0, 0, 0},
+        {400, 'A', -50, 2}, {499, 'A', 49, 2}, {500, 0, 0, 0}};
+    for (const auto& [time, name, localTicks, wantIndex] : cases)
     {
         SCOPED_TRACE(time);
         NodeRef node = Node('C');
@@ -164,7 +166,24 @@ TEST_F(MutableCutlistTest, NodeAtTimeHonoursHalfOpenBoundariesAndMapsBothFields)
                   QRT::kResult_Success);
         EXPECT_TRUE(node == (name ? Node(name) : NodeRef()));
         EXPECT_EQ(local, MF::FrameTime(Ticks(name ? localTicks : -12345)));
+
+        std::size_t index = 99;
+        TickTime start, end, offset;
+        QRT::Guid hash;
+        EXPECT_EQ(list->GetSegmentAtTime(Ticks(time), index, start, end, offset, hash),
+                  name ? QRT::kResult_Success : QRT::kResult_NotFound);
+        EXPECT_EQ(index, name ? wantIndex : 99u);
+        if (name)
+        {
+            EXPECT_EQ(Seg(start.GetTicks(), end.GetTicks(), offset.GetTicks(), name),
+                      segments[wantIndex]);
+            EXPECT_EQ(hash, Node(name)->GetNodeHash());
+        }
     }
+    TickTime start, end, offset;
+    QRT::Guid hash;
+    EXPECT_EQ(list->GetSegment(3, start, end, offset, hash), QRT::kResult_NotFound);
+
     // Interlaced: the earlier field picks the segment; both fields are mapped.
     ML::CutlistRenderParams params;
     params.SetFrameTime(MF::FrameTime(Ticks(210), Ticks(195)));
@@ -173,24 +192,6 @@ TEST_F(MutableCutlistTest, NodeAtTimeHonoursHalfOpenBoundariesAndMapsBothFields)
     EXPECT_EQ(list->GetNodeAtTime(params, node, local), QRT::kResult_Success);
     EXPECT_TRUE(node == Node('A'));
     EXPECT_EQ(local, MF::FrameTime(Ticks(1110), Ticks(1095)));
-}
-
-TEST_F(MutableCutlistTest, SegmentAtTimeAnswersIndexOrNotFound)
-{
-    const CutlistRef list = Sealed({{0, 10, 0, 'A'}, {10, 20, 3, 'B'}});
-    std::size_t index = 99;
-    TickTime start, end, offset;
-    QRT::Guid hash;
-    EXPECT_EQ(list->GetSegmentAtTime(Ticks(10), index, start, end, offset, hash),
-              QRT::kResult_Success);
-    EXPECT_EQ(index, 1u);
-    EXPECT_EQ(Seg(start.GetTicks(), end.GetTicks(), offset.GetTicks(), 'B'), Seg(10, 20, 3, 'B'));
-    EXPECT_EQ(hash, Node('B')->GetNodeHash());
-    index = 99;
-    EXPECT_EQ(list->GetSegmentAtTime(Ticks(20), index, start, end, offset, hash),
-              QRT::kResult_NotFound);
-    EXPECT_EQ(index, 99u);
-    EXPECT_EQ(list->GetSegment(2, start, end, offset, hash), QRT::kResult_NotFound);
 }
 
 TEST_F(MutableCutlistTest, ContractsGuardSealing)
