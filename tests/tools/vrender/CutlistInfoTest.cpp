@@ -1,3 +1,5 @@
+// `vrender info`: times, flags and the printed form of a cutlist.
+
 #include "CutlistInfo.h"
 
 #include "ML/IMutableCutlist.h"
@@ -12,14 +14,17 @@ namespace
 
 namespace mt = mvxmediatypes;
 
-class CutlistInfoTest : public ::testing::Test
+// The printed tree of a solid-colour node, inIndent spaces in.
+std::string SolidTree(std::size_t inIndent, const QRT::Guid& inHash, const std::string& inColor)
 {
-protected:
-    static mt::TickTime Seconds(std::int64_t inSeconds)
-    {
-        return mt::TickTime::TicksToTime(inSeconds * mt::kTicksPerSecond);
-    }
-};
+    const std::string pad(inIndent, ' ');
+    return pad + "RenderableNodeSolidColorImpl " + inHash.ToString() + "\n" + pad +
+           "  flags 0x00000000\n" + pad + "  properties:\n" + pad +
+           "    SolidColorNode::Color = \"" + inColor + "\"\n" + pad + "  inputs: none\n" + pad +
+           "  operators: none\n";
+}
+
+using CutlistInfoTest = ::testing::Test;
 
 TEST_F(CutlistInfoTest, TimesAndFlags)
 {
@@ -41,9 +46,7 @@ TEST_F(CutlistInfoTest, ExampleCutlistIsPrintedSegmentsThenTrees)
     QRT::Guid hashes[3];
     for (std::size_t i = 0; i < 3; ++i)
     {
-        mt::TickTime start;
-        mt::TickTime end;
-        mt::TickTime offset;
+        mt::TickTime start, end, offset;
         ASSERT_EQ(cutlist->GetSegment(i, start, end, offset, hashes[i]), QRT::kResult_Success);
     }
     QRT::InterfaceRef<MF::IRenderableNode> disabled;
@@ -52,66 +55,40 @@ TEST_F(CutlistInfoTest, ExampleCutlistIsPrintedSegmentsThenTrees)
     QRT::InterfaceRef<MF::IRenderableNode> green;
     ASSERT_EQ(disabled->GetInput(0, inputOffset, green), QRT::kResult_Success);
 
-    const std::string expected =
-        "Cutlist \"Example\" " + cutlist->GetCutlistHash().ToString() + "\n" +
-        "3 segments:\n"
-        "  [0] 0.000 s to 2.000 s, offset 0.000 s, node " +
-        hashes[0].ToString() + "\n" + "  [1] 2.000 s to 4.000 s, offset 0.000 s, node " +
-        hashes[1].ToString() + "\n" + "  [2] 4.000 s to 6.000 s, offset 1.000 s, node " +
-        hashes[2].ToString() + "\n" +
-        "Node trees:\n"
-        "  RenderableNodeSolidColorImpl " +
-        hashes[0].ToString() + "\n" +
-        "    flags 0x00000000\n"
-        "    properties:\n"
-        "      SolidColorNode::Color = \"4294901760\"\n"
-        "    inputs: none\n"
-        "    operators: none\n"
-        "  RenderableNodeDisabledImpl " +
-        hashes[1].ToString() + "\n" +
-        "    flags 0x00000000\n"
-        "    properties: none\n"
-        "    input 0 at 1.000 s:\n"
-        "      RenderableNodeSolidColorImpl " +
-        green->GetNodeHash().ToString() + "\n" +
-        "        flags 0x00000000\n"
-        "        properties:\n"
-        "          SolidColorNode::Color = \"4278255360\"\n"
-        "        inputs: none\n"
-        "        operators: none\n"
-        "    operators: none\n"
-        "  RenderableNodeSolidColorImpl " +
-        hashes[2].ToString() + "\n" +
-        "    flags 0x00000000\n"
-        "    properties:\n"
-        "      SolidColorNode::Color = \"4278190335\"\n"
-        "    inputs: none\n"
-        "    operators: none\n";
-    EXPECT_EQ(vrender::DescribeCutlist(*cutlist), expected);
+    EXPECT_EQ(vrender::DescribeCutlist(*cutlist),
+              "Cutlist \"Example\" " + cutlist->GetCutlistHash().ToString() +
+                  "\n3 segments:\n  [0] 0.000 s to 2.000 s, offset 0.000 s, node " +
+                  hashes[0].ToString() + "\n  [1] 2.000 s to 4.000 s, offset 0.000 s, node " +
+                  hashes[1].ToString() + "\n  [2] 4.000 s to 6.000 s, offset 1.000 s, node " +
+                  hashes[2].ToString() + "\nNode trees:\n" + SolidTree(2, hashes[0], "4294901760") +
+                  "  RenderableNodeDisabledImpl " + hashes[1].ToString() +
+                  "\n    flags 0x00000000\n    properties: none\n    input 0 at 1.000 s:\n" +
+                  SolidTree(6, green->GetNodeHash(), "4278255360") + "    operators: none\n" +
+                  SolidTree(2, hashes[2], "4278190335"));
 }
 
-TEST_F(CutlistInfoTest, ATreeUsedByTwoSegmentsIsPrintedOnce)
+TEST_F(CutlistInfoTest, ATreeUsedByTwoSegmentsIsPrintedOnceAndAnEmptyCutlistHasNone)
 {
     const auto red = ML::CreateSolidColorNode(0xFFFF0000u);
     auto cutlist = ML::CreateMutableCutlist(QRT::ImmutableString::CreateStatic("Twice"));
-    cutlist->AddSegment(mt::kTime_Zero, Seconds(1), mt::kTime_Zero, red);
-    cutlist->AddSegment(Seconds(5), Seconds(6), Seconds(3), red);
+    cutlist->AddSegment(mt::kTime_Zero, mt::TickTime::TicksToTime(mt::kTicksPerSecond),
+                        mt::kTime_Zero, red);
+    cutlist->AddSegment(mt::TickTime::TicksToTime(5 * mt::kTicksPerSecond),
+                        mt::TickTime::TicksToTime(6 * mt::kTicksPerSecond),
+                        mt::TickTime::TicksToTime(3 * mt::kTicksPerSecond), red);
     cutlist->MakeImmutable();
     const std::string text = vrender::DescribeCutlist(*cutlist);
     EXPECT_NE(text.find("2 segments:\n"), std::string::npos) << text;
-    const std::string header = "  RenderableNodeSolidColorImpl " + red->GetNodeHash().ToString();
-    const std::size_t first = text.find(header);
+    const std::string tree = SolidTree(2, red->GetNodeHash(), "4294901760");
+    const std::size_t first = text.find(tree);
     ASSERT_NE(first, std::string::npos) << text;
-    EXPECT_EQ(text.find(header, first + 1), std::string::npos) << text;
-}
+    EXPECT_EQ(text.find(tree, first + 1), std::string::npos) << text;
 
-TEST_F(CutlistInfoTest, EmptyCutlist)
-{
-    auto cutlist = ML::CreateMutableCutlist(QRT::ImmutableString::CreateStatic("Empty"));
-    cutlist->MakeImmutable();
-    EXPECT_EQ(vrender::DescribeCutlist(*cutlist), "Cutlist \"Empty\" " +
-                                                      cutlist->GetCutlistHash().ToString() +
-                                                      "\n0 segments:\nNode trees:\n");
+    auto empty = ML::CreateMutableCutlist(QRT::ImmutableString::CreateStatic("Empty"));
+    empty->MakeImmutable();
+    EXPECT_EQ(vrender::DescribeCutlist(*empty), "Cutlist \"Empty\" " +
+                                                    empty->GetCutlistHash().ToString() +
+                                                    "\n0 segments:\nNode trees:\n");
 }
 
 } // namespace

@@ -1,31 +1,29 @@
+// The progress line, the closing summary and the display that draws them.
+
 #include "Progress.h"
 
 #include <cstdio>
 #include <string>
+#include <tuple>
 
 #include <gtest/gtest.h>
 
 namespace
 {
 
-class ProgressTest : public ::testing::Test
-{
-};
+using ProgressTest = ::testing::Test;
 
-TEST_F(ProgressTest, LineShowsBarCountRateAndEta)
+TEST_F(ProgressTest, LineShowsBarCountRateAndEtaAndSurvivesOddInput)
 {
-    EXPECT_EQ(vrender::FormatProgressLine(0, 100, 0.0, 10), "[----------]   0/100");
-    EXPECT_EQ(vrender::FormatProgressLine(50, 100, 2.0, 10),
-              "[#####-----]  50/100    25.0 fps  ETA 2.0 s");
-    EXPECT_EQ(vrender::FormatProgressLine(100, 100, 4.0, 10),
-              "[##########] 100/100    25.0 fps  ETA 0.0 s");
-    EXPECT_EQ(vrender::FormatProgressLine(1, 3, 0.5, 3), "[#--] 1/3     2.0 fps  ETA 1.0 s");
-}
-
-TEST_F(ProgressTest, LineSurvivesOddInput)
-{
-    EXPECT_EQ(vrender::FormatProgressLine(5, 0, 1.0, 4), "[####] 5/0     1.0 fps  ETA 0.0 s");
-    EXPECT_EQ(vrender::FormatProgressLine(-1, 10, 1.0, 4), "[----] -1/10");
+    const std::tuple<int, int, double, int, const char*> cases[] = {
+        {0, 100, 0.0, 10, "[----------]   0/100"},
+        {50, 100, 2.0, 10, "[#####-----]  50/100    25.0 fps  ETA 2.0 s"},
+        {100, 100, 4.0, 10, "[##########] 100/100    25.0 fps  ETA 0.0 s"},
+        {1, 3, 0.5, 3, "[#--] 1/3     2.0 fps  ETA 1.0 s"},
+        {5, 0, 1.0, 4, "[####] 5/0     1.0 fps  ETA 0.0 s"},
+        {-1, 10, 1.0, 4, "[----] -1/10"}};
+    for (const auto& [done, total, seconds, width, line] : cases)
+        EXPECT_EQ(vrender::FormatProgressLine(done, total, seconds, width), line);
 }
 
 TEST_F(ProgressTest, Summary)
@@ -52,9 +50,8 @@ TEST_F(ProgressTest, DisabledDisplayWritesNothingEnabledOneErasesItsLine)
     shown.Clear();
     std::rewind(file);
     char text[256] = {};
-    const std::size_t size = std::fread(text, 1, sizeof(text) - 1, file);
+    const std::string written(text, std::fread(text, 1, sizeof(text) - 1, file));
     std::fclose(file);
-    const std::string written(text, size);
     EXPECT_EQ(written.rfind("\r[##############################] 10/10", 0), 0u) << written;
     EXPECT_EQ(written.substr(written.size() - 4), "\r\x1b[K");
 }

@@ -13,29 +13,18 @@ namespace
 {
 
 using mvxmediatypes::TickTime;
+using RenderablePropertyValueTest = ::testing::Test;
 
-class RenderablePropertyValueTest : public ::testing::Test
+TEST_F(RenderablePropertyValueTest, DoublesHaveSixSignificantDigitsLikeADefaultStream)
 {
-};
-
-TEST_F(RenderablePropertyValueTest, DoublesHaveSixSignificantDigits)
-{
-    EXPECT_EQ(ML::FormatPropertyValue(0.5), "0.5");
-    EXPECT_EQ(ML::FormatPropertyValue(1.0), "1");
-    EXPECT_EQ(ML::FormatPropertyValue(100.0), "100");
-    EXPECT_EQ(ML::FormatPropertyValue(1234567.0), "1.23457e+06");
-    EXPECT_EQ(ML::FormatPropertyValue(123456.0), "123456");
-    EXPECT_EQ(ML::FormatPropertyValue(0.0001), "0.0001");
-    EXPECT_EQ(ML::FormatPropertyValue(0.00001), "1e-05");
-    EXPECT_EQ(ML::FormatPropertyValue(-2.5), "-2.5");
-    EXPECT_EQ(ML::FormatPropertyValue(1.0 / 3.0), "0.333333");
-}
-
-TEST_F(RenderablePropertyValueTest, DoublesMatchADefaultStreamOverManyValues)
-{
-    const double values[] = {0.0,   -0.0,     3.14159265, 29.97002997, 59.94, 1e100, -1e-100,
-                             0.125, 999999.5, 1e6,        2.0 / 3.0,   12.5,  7e-7,  65535.0};
-    for (double value : values)
+    const std::pair<double, const char*> exact[] = {
+        {0.5, "0.5"},           {1.0, "1"},         {100.0, "100"},     {1234567.0, "1.23457e+06"},
+        {123456.0, "123456"},   {0.0001, "0.0001"}, {0.00001, "1e-05"}, {-2.5, "-2.5"},
+        {1.0 / 3.0, "0.333333"}};
+    for (const auto& [value, text] : exact)
+        EXPECT_EQ(ML::FormatPropertyValue(value), text);
+    for (double value : {0.0, -0.0, 3.14159265, 29.97002997, 59.94, 1e100, -1e-100, 0.125, 999999.5,
+                         1e6, 2.0 / 3.0, 12.5, 7e-7, 65535.0})
     {
         std::ostringstream stream;
         stream.imbue(std::locale::classic());
@@ -69,16 +58,13 @@ TEST_F(RenderablePropertyValueTest, ParsingRoundTripsAndRefusesOtherText)
         EXPECT_FALSE(ML::ParsePropertyValue(bad, color)) << '"' << bad << '"';
         EXPECT_EQ(color, 7u);
     }
-
     TickTime time;
     EXPECT_TRUE(ML::ParsePropertyValue("-705600000", time));
     EXPECT_EQ(time.GetTicks(), -705600000);
-
     bool flag = false;
     EXPECT_TRUE(ML::ParsePropertyValue("1", flag));
     EXPECT_TRUE(flag);
     EXPECT_FALSE(ML::ParsePropertyValue("true", flag));
-
     double number = 0;
     EXPECT_TRUE(ML::ParsePropertyValue(ML::FormatPropertyValue(1234567.0), number));
     EXPECT_EQ(number, 1234570.0);

@@ -1,12 +1,15 @@
-// The solid-colour node, its producer's pixels and hash, and the disabled node.
+// The solid-colour node, its producer's pixels and frame hash, and the disabled node.
 
 #include "IR/ImageRenderer.h"
 #include "ML/RenderableNodes.h"
+#include "QRT/Exception.h"
 #include "TestNodeKinds.h"
 #include "graph/RenderableNodeDisabledImpl.h"
 #include "graph/RenderableNodeSolidColorImpl.h"
 
-#include <cstring>
+#include <algorithm>
+#include <tuple>
+#include <vector>
 
 #include <gtest/gtest.h>
 
@@ -15,202 +18,148 @@ namespace graphtest
 namespace
 {
 
+namespace mt = mvxmediatypes;
+using FrameRef = QRT::InterfaceRef<MF::IVideoFrame>;
+
 const QRT::ImmutableString kColorKey =
     QRT::ImmutableString::CreateStatic(ML::kSolidColorNodeColorKey);
 
-class SolidColorNodeTest : public ::testing::Test
+ML::CutlistRenderParams Params(std::uint32_t inWidth, std::uint32_t inHeight,
+                               mt::PixelFormat inFormat = mt::kPixelFormat_BGRA_4444_8u)
 {
-protected:
-    static ML::CutlistRenderParams
-    Params(std::uint32_t inWidth, std::uint32_t inHeight,
-           mvxmediatypes::PixelFormat inFormat = mvxmediatypes::kPixelFormat_BGRA_4444_8u)
-    {
-        ML::CutlistRenderParams params;
-        params.mWidth = inWidth;
-        params.mHeight = inHeight;
-        params.mPixelFormat = inFormat;
-        params.mPixelAspectRatio = mvxmediatypes::PixelAspectRatio(1, 1);
-        return params;
-    }
+    ML::CutlistRenderParams params;
+    params.mWidth = inWidth;
+    params.mHeight = inHeight;
+    params.mPixelFormat = inFormat;
+    params.mPixelAspectRatio = mt::PixelAspectRatio(1, 1);
+    return params;
+}
 
-    static QRT::InterfaceRef<ML::IRenderableNodeProducer>
-    ProducerOf(const QRT::InterfaceRef<MF::IRenderableNode>& inNode,
-               const ML::CutlistRenderParams& inParams)
-    {
-        const QRT::InterfaceRef<ML::IRenderableNodeProducerProvider> provider(inNode);
-        QRT::InterfaceRef<ML::IRenderableNodeProducer> producer;
-        provider->GetProducer(producer, inParams.GetFrameTime(), inParams);
-        return producer;
-    }
+QRT::InterfaceRef<ML::IRenderableNodeProducer> ProducerOf(const NodeRef& inNode,
+                                                          const ML::CutlistRenderParams& inParams)
+{
+    QRT::InterfaceRef<ML::IRenderableNodeProducer> producer;
+    QRT::InterfaceRef<ML::IRenderableNodeProducerProvider>(inNode)->GetProducer(
+        producer, inParams.GetFrameTime(), inParams);
+    return producer;
+}
 
-    // Every pixel of a BGRA 8-bit frame, checked against one B, G, R, A quadruple.
-    static void ExpectAllPixels(const QRT::InterfaceRef<MF::IVideoFrame>& inFrame, std::uint8_t inB,
-                                std::uint8_t inG, std::uint8_t inR, std::uint8_t inA)
-    {
-        const QRT::ParamRect bounds = inFrame->GetBounds();
-        const auto* base = static_cast<const std::uint8_t*>(inFrame->GetBaseAddress());
-        int mismatches = 0;
-        for (int y = 0; y < bounds.Height(); ++y)
-        {
-            const std::uint8_t* row = base + y * inFrame->GetRowBytes();
-            for (int x = 0; x < bounds.Width(); ++x)
-            {
-                const std::uint8_t* pixel = row + 4 * x;
-                if (pixel[0] != inB || pixel[1] != inG || pixel[2] != inR || pixel[3] != inA)
-                    ++mismatches;
-            }
-        }
-        EXPECT_EQ(mismatches, 0);
-    }
+QRT::Result Produce(const NodeRef& inNode, const ML::CutlistRenderParams& inParams,
+                    FrameRef& outFrame)
+{
+    outFrame.Reset();
+    return ProducerOf(inNode, inParams)->ProduceFrame(inParams.GetFrameTime(), inParams, outFrame);
+}
 
-    static QRT::InterfaceRef<MF::IRenderableNode> NodeWithColorText(const char* inText)
-    {
-        auto node = MakeMutable<ML::RenderableNodeSolidColorImpl>();
-        if (inText)
-            node->SetProperty(kColorKey, inText, true);
-        node->MakeImmutable();
-        return node->GetSelfReference();
-    }
-};
+QRT::Guid FrameHashOf(const NodeRef& inNode, const ML::CutlistRenderParams& inParams)
+{
+    QRT::Guid hash;
+    ProducerOf(inNode, inParams)->GetFrameHash(hash, inParams.GetFrameTime(), inParams);
+    return hash;
+}
+
+NodeRef NodeWithColorText(const char* inText)
+{
+    auto node = MakeMutable<ML::RenderableNodeSolidColorImpl>();
+    if (inText)
+        node->SetProperty(kColorKey, inText, true);
+    node->MakeImmutable();
+    return node->GetSelfReference();
+}
+
+using SolidColorNodeTest = ::testing::Test;
 
 TEST_F(SolidColorNodeTest, NodeStoresTheColourAsHashedDecimal)
 {
-    const QRT::InterfaceRef<MF::IRenderableNode> node = ML::CreateSolidColorNode(0x80FF4010u);
-    EXPECT_EQ(node->GetNodeType(), std::string_view("RenderableNodeSolidColorImpl"));
+    const NodeRef node = ML::CreateSolidColorNode(0x80FF4010u);
     MF::RenderablePropertyValue value;
     ASSERT_EQ(node->GetProperty(kColorKey, value), QRT::kResult_Success);
     EXPECT_EQ(value, "2164211728");
     EXPECT_EQ(node->GetRenderFlags(), 0u);
-    EXPECT_NE(node->GetNodeHash(), ML::CreateSolidColorNode(0x80FF4011u)->GetNodeHash());
-    EXPECT_EQ(node->GetNodeHash(), ML::CreateSolidColorNode(0x80FF4010u)->GetNodeHash());
+    EXPECT_EQ(node->GetNodeHash(),
+              HashOfRuns(
+                  {"ML::RenderableNodeCommonImpl", "PropertyName::", ML::kSolidColorNodeColorKey,
+                   "PropertyValue::", "2164211728", "NodeType::", "RenderableNodeSolidColorImpl"}));
+    EXPECT_EQ(node->GetNodeHash(), NodeWithColorText("2164211728")->GetNodeHash());
 }
 
-TEST_F(SolidColorNodeTest, ProducerFillsEveryPixelWithTheColour)
+TEST_F(SolidColorNodeTest, ProducerFillsEveryPixelWithTheColourTheDefaultOrZero)
 {
-    const ML::CutlistRenderParams params = Params(37, 5);
-    const auto producer = ProducerOf(ML::CreateSolidColorNode(0xFF204060u), params);
-    ASSERT_TRUE(producer);
-    QRT::InterfaceRef<MF::IVideoFrame> frame;
-    ASSERT_EQ(producer->ProduceFrame(params.GetFrameTime(), params, frame), QRT::kResult_Success);
-    ASSERT_TRUE(frame);
-    EXPECT_EQ(frame->GetPixelFormat(), mvxmediatypes::kPixelFormat_BGRA_4444_8u);
-    EXPECT_EQ(frame->GetBounds().Width(), 37);
-    EXPECT_EQ(frame->GetBounds().Height(), 5);
-    ExpectAllPixels(frame, 0x60, 0x40, 0x20, 0xFF);
-}
-
-TEST_F(SolidColorNodeTest, AbsentColourIsOpaqueWhiteAndUnreadableColourIsZero)
-{
-    const ML::CutlistRenderParams params = Params(8, 3);
-    QRT::InterfaceRef<MF::IVideoFrame> frame;
-
-    ASSERT_EQ(ProducerOf(NodeWithColorText(nullptr), params)
-                  ->ProduceFrame(params.GetFrameTime(), params, frame),
-              QRT::kResult_Success);
-    ExpectAllPixels(frame, 0xFF, 0xFF, 0xFF, 0xFF);
-
-    for (const char* bad : {"red", "-1", "4294967296", "12 "})
-    {
-        frame.Reset();
-        ASSERT_EQ(ProducerOf(NodeWithColorText(bad), params)
-                      ->ProduceFrame(params.GetFrameTime(), params, frame),
-                  QRT::kResult_Success);
-        ExpectAllPixels(frame, 0, 0, 0, 0);
-    }
-}
-
-TEST_F(SolidColorNodeTest, UnmakeableFrameAnswersNotFoundAndNoFrame)
-{
-    const ML::CutlistRenderParams params = Params(0, 4);
-    QRT::InterfaceRef<MF::IVideoFrame> frame;
-    EXPECT_EQ(ProducerOf(ML::CreateSolidColorNode(0xFF000000u), params)
-                  ->ProduceFrame(params.GetFrameTime(), params, frame),
-              QRT::kResult_NotFound);
-    EXPECT_FALSE(frame);
-
-    const ML::CutlistRenderParams invalid = Params(4, 4, mvxmediatypes::kPixelFormat_Invalid);
-    EXPECT_EQ(ProducerOf(ML::CreateSolidColorNode(0xFF000000u), invalid)
-                  ->ProduceFrame(invalid.GetFrameTime(), invalid, frame),
-              QRT::kResult_NotFound);
-    EXPECT_FALSE(frame);
-}
-
-TEST_F(SolidColorNodeTest, FormatTheFillCannotWriteIsRefusedWithoutAFrame)
-{
-    const ML::CutlistRenderParams params = Params(4, 4, mvxmediatypes::kPixelFormat_BGRA_4444_16u);
-    QRT::InterfaceRef<MF::IVideoFrame> frame;
-    EXPECT_EQ(ProducerOf(ML::CreateSolidColorNode(0xFF000000u), params)
-                  ->ProduceFrame(params.GetFrameTime(), params, frame),
-              kIR_UnsupportedFormat);
-    EXPECT_FALSE(frame);
-}
-
-TEST_F(SolidColorNodeTest, YuvFramesMatchTheImageRendererFill)
-{
-    const ML::CutlistRenderParams params = Params(6, 2, mvxmediatypes::kPixelFormat_VUYA_4444_8u);
-    QRT::InterfaceRef<MF::IVideoFrame> frame;
-    ASSERT_EQ(ProducerOf(ML::CreateSolidColorNode(0xFF336699u), params)
-                  ->ProduceFrame(params.GetFrameTime(), params, frame),
-              QRT::kResult_Success);
-    std::uint8_t expected[4 * 6];
-    ASSERT_EQ(IR_FillWithColor(expected, sizeof(expected), kIR_PixelFormat_VUYA_4444_8u, 6, 1,
-                               0xFF336699u, 0),
+    // YUV pixels are whatever the image renderer's fill makes of the colour.
+    std::uint8_t filled[4];
+    ASSERT_EQ(IR_FillWithColor(filled, 4, kIR_PixelFormat_VUYA_4444_8u, 1, 1, 0xFF336699u, 0),
               kIR_NoError);
-    for (int y = 0; y < 2; ++y)
+    const std::vector<int> yuv(filled, filled + 4);
+    const mt::PixelFormat bgra = mt::kPixelFormat_BGRA_4444_8u;
+    const std::tuple<const char*, mt::PixelFormat, std::vector<int>> cases[] = {
+        {"4280303712", bgra, {0x60, 0x40, 0x20, 0xFF}}, // 0xFF204060, B G R A in memory
+        {nullptr, bgra, {0xFF, 0xFF, 0xFF, 0xFF}},      // absent: opaque white
+        {"red", bgra, {0, 0, 0, 0}},                    // unreadable: all zero
+        {"-1", bgra, {0, 0, 0, 0}},
+        {"4294967296", bgra, {0, 0, 0, 0}},
+        {"12 ", bgra, {0, 0, 0, 0}},
+        {"4281558681", mt::kPixelFormat_VUYA_4444_8u, yuv}}; // 0xFF336699
+    for (const auto& [text, format, pixel] : cases)
     {
-        const auto* row =
-            static_cast<const std::uint8_t*>(frame->GetBaseAddress()) + y * frame->GetRowBytes();
-        EXPECT_EQ(std::memcmp(row, expected, sizeof(expected)), 0) << "row " << y;
+        SCOPED_TRACE(text ? text : "absent");
+        FrameRef frame;
+        ASSERT_EQ(Produce(NodeWithColorText(text), Params(37, 5, format), frame),
+                  QRT::kResult_Success);
+        ASSERT_TRUE(frame);
+        EXPECT_EQ(frame->GetPixelFormat(), format);
+        ASSERT_EQ(frame->GetBounds().Width(), 37);
+        ASSERT_EQ(frame->GetBounds().Height(), 5);
+        int mismatches = 0;
+        for (int y = 0; y < 5; ++y)
+            for (int x = 0; x < 37; ++x)
+            {
+                const auto* got = static_cast<const std::uint8_t*>(frame->GetBaseAddress()) +
+                                  y * frame->GetRowBytes() + 4 * x;
+                mismatches += !std::equal(pixel.begin(), pixel.end(), got);
+            }
+        EXPECT_EQ(mismatches, 0);
     }
 }
 
-TEST_F(SolidColorNodeTest, FrameHashFollowsColourAndFormatButNotTime)
+TEST_F(SolidColorNodeTest, FramesThatCannotBeMadeOrFilledAnswerAStatusAndNoFrame)
 {
-    ML::CutlistRenderParams params = Params(16, 9);
-    QRT::Guid base;
-    ProducerOf(ML::CreateSolidColorNode(0xFF0000FFu), params)
-        ->GetFrameHash(base, params.GetFrameTime(), params);
-
-    auto hashWith = [&](std::uint32_t inColor, const ML::CutlistRenderParams& inParams)
+    const std::tuple<std::uint32_t, mt::PixelFormat, QRT::Result> cases[] = {
+        {0, mt::kPixelFormat_BGRA_4444_8u, QRT::kResult_NotFound},
+        {4, mt::kPixelFormat_Invalid, QRT::kResult_NotFound},
+        {4, mt::kPixelFormat_BGRA_4444_16u, kIR_UnsupportedFormat}};
+    for (const auto& [width, format, status] : cases)
     {
-        QRT::Guid hash;
-        ProducerOf(ML::CreateSolidColorNode(inColor), inParams)
-            ->GetFrameHash(hash, inParams.GetFrameTime(), inParams);
-        return hash;
-    };
+        FrameRef frame;
+        EXPECT_EQ(Produce(ML::CreateSolidColorNode(0xFF000000u), Params(width, 4, format), frame),
+                  status);
+        EXPECT_FALSE(frame);
+    }
+}
 
+TEST_F(SolidColorNodeTest, FrameHashIsColourFormatSizeAndAspectButNotTime)
+{
+    ML::CutlistRenderParams params = Params(16, 9, mt::kPixelFormat_VUYA_4444_8u);
+    params.mPixelAspectRatio = mt::PixelAspectRatio(10, 11);
+    const QRT::Guid hash = FrameHashOf(ML::CreateSolidColorNode(0xFF0000FFu), params);
+    EXPECT_EQ(hash, HashOfRuns({"RenderableNodeSolidColorImpl FrameHash",
+                                BytesOf<std::uint32_t>(0xFF0000FFu),
+                                BytesOf(mt::kPixelFormat_VUYA_4444_8u.GetValue()),
+                                BytesOf<std::uint32_t>(16), BytesOf<std::uint32_t>(9),
+                                BytesOf<std::uint32_t>(10), BytesOf<std::uint32_t>(11)}));
     ML::CutlistRenderParams later = params;
     later.SetFrameTime(MF::FrameTime(Ticks(705600000)));
-    EXPECT_EQ(hashWith(0xFF0000FFu, later), base);
-
-    EXPECT_NE(hashWith(0xFF0000FEu, params), base);
-    ML::CutlistRenderParams changed = params;
-    changed.mWidth = 17;
-    EXPECT_NE(hashWith(0xFF0000FFu, changed), base);
-    changed = params;
-    changed.mHeight = 10;
-    EXPECT_NE(hashWith(0xFF0000FFu, changed), base);
-    changed = params;
-    changed.mPixelFormat = mvxmediatypes::kPixelFormat_VUYA_4444_8u;
-    EXPECT_NE(hashWith(0xFF0000FFu, changed), base);
-    changed = params;
-    changed.mPixelAspectRatio = mvxmediatypes::PixelAspectRatio(10, 11);
-    EXPECT_NE(hashWith(0xFF0000FFu, changed), base);
-
+    EXPECT_EQ(FrameHashOf(ML::CreateSolidColorNode(0xFF0000FFu), later), hash);
     // An absent colour and an explicit opaque white give interchangeable frames.
-    QRT::Guid white;
-    ProducerOf(NodeWithColorText(nullptr), params)->GetFrameHash(white, params, params);
-    EXPECT_EQ(white, hashWith(0xFFFFFFFFu, params));
+    EXPECT_EQ(FrameHashOf(NodeWithColorText(nullptr), params),
+              FrameHashOf(ML::CreateSolidColorNode(0xFFFFFFFFu), params));
 }
 
-class RenderableNodeDisabledImplTest : public ::testing::Test
-{
-};
+using RenderableNodeDisabledImplTest = ::testing::Test;
 
 TEST_F(RenderableNodeDisabledImplTest, TakesItsFirstInputsFlagsAndRendersNothing)
 {
-    const QRT::InterfaceRef<MF::IRenderableNode> child = MakeLeaf("Media", 93u);
-    const QRT::InterfaceRef<MF::IRenderableNode> node = ML::CreateDisabledNode(child, Ticks(12));
+    const NodeRef child = MakeLeaf("Media", 93u);
+    const NodeRef node = ML::CreateDisabledNode(child, Ticks(12));
     EXPECT_EQ(node->GetNodeType(), std::string_view("RenderableNodeDisabledImpl"));
     EXPECT_EQ(node->GetRenderFlags(), 93u);
     EXPECT_FALSE(QRT::QueryRef<ML::IRenderableNodeProducerProvider>(node));
@@ -222,10 +171,11 @@ TEST_F(RenderableNodeDisabledImplTest, TakesItsFirstInputsFlagsAndRendersNothing
 TEST_F(RenderableNodeDisabledImplTest, WithoutInputsFlagsAreZeroAndEmptyFirstInputFails)
 {
     EXPECT_EQ(Seal(MakeMutable<ML::RenderableNodeDisabledImpl>())->GetRenderFlags(), 0u);
-
     auto broken = MakeMutable<ML::RenderableNodeDisabledImpl>();
     broken->AddInput(nullptr, Ticks(0));
+    // The flag rule fails before anything is sealed.
     EXPECT_THROW(broken->MakeImmutable(), QRT::NullInterfaceException);
+    EXPECT_TRUE(broken->IsMutable());
     EXPECT_THROW(ML::CreateDisabledNode(nullptr, Ticks(0)), QRT::NullInterfaceException);
 }
 

@@ -1,33 +1,42 @@
 #pragma once
 
-// Node kinds used only by the graph tests: a plain kind with a chosen type
-// name and flags, a compositor-style and a transition-style kind that apply
-// the flag rules of their real counterparts, and a kind that answers
-// IRenderableNodeProducerProvider with scripted still ranges and smart-render
-// times and records what it was asked.
+// The graph tests' doubles and hash helpers: a plain node kind with a chosen
+// type name and flags that records its prefetch ranges; a kind that also
+// answers IRenderableNodeProducerProvider with scripted still ranges and
+// smart-render times and records what it was asked; and an independent
+// re-computation of hashes from their byte runs, so the tests check the exact
+// order and length of every run mixed, not merely that a hash changed.
 
 #include "ML/IRenderableNodeProducerProvider.h"
-#include "ML/RenderFlags.h"
 #include "ML/RenderableNodeCommonImpl.h"
 #include "QRT/Allocated.h"
-#include "QRT/Exception.h"
+#include "QRT/Guid.h"
+#include "QRT/Hash.h"
 
 #include <cstdint>
+#include <cstring>
 #include <set>
 #include <string>
+#include <type_traits>
 #include <vector>
 
 namespace graphtest
 {
 
 using mvxmediatypes::TickTime;
+using NodeRef = QRT::InterfaceRef<MF::IRenderableNode>;
+using ByteRuns = std::vector<std::string>;
 
 inline TickTime Ticks(std::int64_t inTicks)
 {
     return TickTime::TicksToTime(inTicks);
 }
 
-// A kind with a chosen type name and fixed render flags.
+inline MF::TickTimeRange Range(std::int64_t inStart, std::int64_t inEnd)
+{
+    return {Ticks(inStart), Ticks(inEnd)};
+}
+
 class TestNode : public ML::RenderableNodeCommonImpl
 {
 public:
@@ -41,8 +50,6 @@ public:
         return QRT::ImmutableString::CreateDynamic(mType);
     }
     std::uint32_t ComputeRenderFlags() const override { return mFlags; }
-
-    // Records every PrefetchSelf range, so the walk through inputs can be checked.
     void PrefetchSelf(const MF::TickTimeRange& inRange, const ML::CutlistRenderParams&,
                       ML::RenderableNodePrefetchList&) const override
     {
@@ -50,12 +57,8 @@ public:
     }
     QRT::InterfaceRef<MF::ITimeTransform> GetTimeTransform() const override { return mTransform; }
 
-    void SetTimeTransform(QRT::InterfaceRef<MF::ITimeTransform> inTransform)
-    {
-        mTransform = std::move(inTransform);
-    }
-
     mutable std::vector<MF::TickTimeRange> mPrefetchRanges;
+    QRT::InterfaceRef<MF::ITimeTransform> mTransform;
 
 protected:
     ~TestNode() = default;
@@ -63,72 +66,14 @@ protected:
 private:
     std::string mType;
     std::uint32_t mFlags;
-    QRT::InterfaceRef<MF::ITimeTransform> mTransform;
 };
 
-// Compositor rule: the AND of all inputs' flags with 92; 92 without inputs;
-// an empty input is an error.
-class TestCompositorNode : public ML::RenderableNodeCommonImpl
-{
-public:
-    QRT::ImmutableString GetNodeType() const override
-    {
-        return QRT::ImmutableString::CreateStatic("TestCompositorNode");
-    }
-    std::uint32_t ComputeRenderFlags() const override
-    {
-        std::uint32_t flags = ML::kRenderFlagMask_Compositor;
-        for (const Input& input : GetInputs())
-            flags &= input.first->GetRenderFlags();
-        return flags;
-    }
-
-protected:
-    ~TestCompositorNode() = default;
-};
-
-// Transition rule: the AND of the non-empty inputs' flags with 68; 68 without inputs.
-class TestTransitionNode : public ML::RenderableNodeCommonImpl
-{
-public:
-    QRT::ImmutableString GetNodeType() const override
-    {
-        return QRT::ImmutableString::CreateStatic("TestTransitionNode");
-    }
-    std::uint32_t ComputeRenderFlags() const override
-    {
-        std::uint32_t flags = ML::kRenderFlagMask_Transition;
-        for (const Input& input : GetInputs())
-            if (input.first)
-                flags &= input.first->GetRenderFlags();
-        return flags;
-    }
-
-protected:
-    ~TestTransitionNode() = default;
-};
-
-// Answers scripted still ranges and smart-render times (in node time) and
-// records the ranges it was asked about.
+// Still ranges and smart-render times are scripted in node time.
 class ScriptedProviderNode
-    : public ML::RenderableNodeWithInterfaces<ML::RenderableNodeCommonImpl,
-                                              ML::IRenderableNodeProducerProvider>
+    : public ML::RenderableNodeWithInterfaces<TestNode, ML::IRenderableNodeProducerProvider>
 {
 public:
-    ScriptedProviderNode(std::uint32_t inFlags, MF::TickTimeRangeList inStillRanges,
-                         std::set<TickTime> inSmartTimes)
-        : mFlags(inFlags)
-        , mStillRanges(std::move(inStillRanges))
-        , mSmartTimes(std::move(inSmartTimes))
-    {
-    }
-
-    QRT::ImmutableString GetNodeType() const override
-    {
-        return QRT::ImmutableString::CreateStatic("ScriptedProviderNode");
-    }
-    std::uint32_t ComputeRenderFlags() const override { return mFlags; }
-
+    using RenderableNodeWithInterfaces::RenderableNodeWithInterfaces;
     void GetProducer(QRT::InterfaceRef<ML::IRenderableNodeProducer>& outProducer,
                      const MF::FrameTime&, const ML::CutlistRenderParams&) const override
     {
@@ -148,17 +93,14 @@ public:
         ioTimes.insert(mSmartTimes.begin(), mSmartTimes.end());
     }
 
+    MF::TickTimeRangeList mStillRanges;
+    std::set<TickTime> mSmartTimes;
     mutable MF::TickTimeRangeList mStillQuestions;
     mutable MF::TickTimeRangeList mSmartQuestions;
     mutable std::vector<bool> mSmartFlags;
 
 protected:
     ~ScriptedProviderNode() = default;
-
-private:
-    std::uint32_t mFlags;
-    MF::TickTimeRangeList mStillRanges;
-    std::set<TickTime> mSmartTimes;
 };
 
 template <class Kind, class... Args>
@@ -167,19 +109,42 @@ QRT::InterfaceRef<Kind> MakeMutable(Args&&... inArgs)
     return QRT::Allocated<Kind>::CreateInstance(std::forward<Args>(inArgs)...);
 }
 
-// A sealed node as the node interface.
+// Seals the node and answers it as the node interface.
 template <class Kind>
-QRT::InterfaceRef<MF::IRenderableNode> Seal(const QRT::InterfaceRef<Kind>& inNode)
+NodeRef Seal(const QRT::InterfaceRef<Kind>& inNode)
 {
     inNode->MakeImmutable();
-    return QRT::InterfaceRef<MF::IRenderableNode>(static_cast<MF::IRenderableNode*>(inNode.Get()));
+    return NodeRef(static_cast<MF::IRenderableNode*>(inNode.Get()));
 }
 
-// A sealed TestNode with no properties.
-inline QRT::InterfaceRef<MF::IRenderableNode> MakeLeaf(const std::string& inType,
-                                                       std::uint32_t inFlags = 0)
+inline NodeRef MakeLeaf(const std::string& inType, std::uint32_t inFlags = 0)
 {
     return Seal(MakeMutable<TestNode>(inType, inFlags));
+}
+
+// The object bytes of a value, as MixHash::MixInValue mixes them; give the
+// type explicitly where a literal would otherwise pick int.
+template <class T>
+std::string BytesOf(const T& inValue)
+{
+    static_assert(std::is_trivially_copyable_v<T>);
+    std::string bytes(sizeof(T), '\0');
+    std::memcpy(bytes.data(), &inValue, sizeof(T));
+    return bytes;
+}
+
+inline std::string BytesOf(const QRT::Guid& inGuid)
+{
+    const auto bytes = QRT::GuidToBytes(inGuid);
+    return std::string(reinterpret_cast<const char*>(bytes.data()), bytes.size());
+}
+
+inline QRT::Guid HashOfRuns(const ByteRuns& inRuns)
+{
+    QRT::HashValue hash;
+    for (const std::string& run : inRuns)
+        QRT::MixHash::MixInData(hash, run.data(), run.size());
+    return QRT::HashValueToGuid(hash);
 }
 
 } // namespace graphtest
