@@ -22,8 +22,8 @@ inline constexpr IR_PixelFormat kBGRP8 = kIR_PixelFormat_BGRP_8u;
 inline constexpr IR_PixelFormat kBGRA32f = kIR_PixelFormat_BGRA_32f;
 inline constexpr IR_PixelFormat kBGRP32f = kIR_PixelFormat_BGRP_32f;
 
-// A pixel buffer whose first byte sits at a chosen misalignment inside its storage,
-// with kPadding bytes after every row so that row padding is exercised.
+// A pixel buffer whose first byte sits at a chosen misalignment inside its storage, with
+// kPadding bytes after every row so that row padding is exercised.
 class Image
 {
 public:
@@ -42,27 +42,27 @@ public:
     }
 
     bool IsFloat() const { return (mFormat & kIR_FormatBit_Float) != 0; }
-    std::uint8_t* Data() { return mStorage.data() + mMisalign; }
-    const std::uint8_t* Data() const { return mStorage.data() + mMisalign; }
+    std::uint8_t* Data() const { return const_cast<std::uint8_t*>(mStorage.data()) + mMisalign; }
+    std::uint8_t* Row(std::int32_t inY) const { return Data() + std::ptrdiff_t{inY} * mRowBytes; }
     std::int32_t RowBytes() const { return mRowBytes; }
     std::int32_t Width() const { return mWidth; }
     std::int32_t Height() const { return mHeight; }
     IR_PixelFormat Format() const { return mFormat; }
-    std::uint8_t* Row(std::int32_t inY) { return Data() + std::ptrdiff_t{inY} * mRowBytes; }
-    const std::uint8_t* Row(std::int32_t inY) const
-    {
-        return Data() + std::ptrdiff_t{inY} * mRowBytes;
-    }
 
     Pixel Get(std::int32_t inX, std::int32_t inY) const { return Read<Pixel>(inX, inY); }
-    void Set(std::int32_t inX, std::int32_t inY, Pixel inP) { Write(inX, inY, inP); }
     PixelF GetF(std::int32_t inX, std::int32_t inY) const { return Read<PixelF>(inX, inY); }
-    void SetF(std::int32_t inX, std::int32_t inY, PixelF inP) { Write(inX, inY, inP); }
+    void Set(std::int32_t inX, std::int32_t inY, Pixel inP)
+    {
+        std::memcpy(Row(inY) + 4 * inX, &inP, 4);
+    }
+    void SetF(std::int32_t inX, std::int32_t inY, PixelF inP)
+    {
+        std::memcpy(Row(inY) + 16 * inX, &inP, 16);
+    }
     void Fill(Pixel inP)
     {
-        for (std::int32_t y = 0; y < mHeight; ++y)
-            for (std::int32_t x = 0; x < mWidth; ++x)
-                Set(x, y, inP);
+        for (std::int32_t i = 0; i < mWidth * mHeight; ++i)
+            Set(i % mWidth, i / mWidth, inP);
     }
 
     // Random pixels; premultiplied formats get colour <= alpha, a quarter are opaque.
@@ -71,22 +71,18 @@ public:
         std::uniform_int_distribution<int> byte(0, 255);
         std::uniform_real_distribution<float> unit(0.0f, 1.0f);
         const bool premultiplied = (mFormat & kIR_FormatBit_PremultipliedAlpha) != 0;
-        for (std::int32_t y = 0; y < mHeight; ++y)
-            for (std::int32_t x = 0; x < mWidth; ++x)
-            {
-                if (IsFloat())
-                {
-                    const float a = unit(ioRandom), k = premultiplied ? a : 1.0f;
-                    SetF(x, y, {unit(ioRandom) * k, unit(ioRandom) * k, unit(ioRandom) * k, a});
-                    continue;
-                }
-                const int a = byte(ioRandom) < 64 ? 255 : byte(ioRandom);
-                auto c = [&] {
-                    return static_cast<std::uint8_t>(premultiplied ? byte(ioRandom) * a / 255
-                                                                   : byte(ioRandom));
-                };
-                Set(x, y, {c(), c(), c(), static_cast<std::uint8_t>(a)});
-            }
+        for (std::int32_t i = 0; i < mWidth * mHeight; ++i)
+        {
+            const float a = IsFloat() ? unit(ioRandom) : byte(ioRandom) < 64 ? 255 : byte(ioRandom);
+            const float k = premultiplied ? a / (IsFloat() ? 1.0f : 255.0f) : 1.0f;
+            if (IsFloat())
+                SetF(i % mWidth, i / mWidth,
+                     {unit(ioRandom) * k, unit(ioRandom) * k, unit(ioRandom) * k, a});
+            else
+                Set(i % mWidth, i / mWidth,
+                    {std::uint8_t(byte(ioRandom) * k), std::uint8_t(byte(ioRandom) * k),
+                     std::uint8_t(byte(ioRandom) * k), std::uint8_t(a)});
+        }
     }
 
 private:
@@ -94,13 +90,8 @@ private:
     P Read(std::int32_t inX, std::int32_t inY) const
     {
         P p;
-        std::memcpy(p.data(), Row(inY) + sizeof(P) * inX, sizeof(P));
+        std::memcpy(&p, Row(inY) + sizeof(P) * inX, sizeof(P));
         return p;
-    }
-    template <typename P>
-    void Write(std::int32_t inX, std::int32_t inY, const P& inP)
-    {
-        std::memcpy(Row(inY) + sizeof(P) * inX, inP.data(), sizeof(P));
     }
 
     IR_PixelFormat mFormat;
@@ -125,36 +116,27 @@ inline Image OneF(IR_PixelFormat inFormat, PixelF inP)
     return image;
 }
 
-// Largest difference between two images' components (padding ignored), in code values
-// for 8-bit images and in component values for float ones.
-inline double MaxDifference(const Image& inA, const Image& inB)
+// Largest difference between two images' components (padding ignored): code values for
+// 8-bit images, component values for float ones. With inWeighByAlpha straight 8-bit colour
+// differences are weighed by the expected alpha, since un-premultiplying magnifies the
+// error of small alphas.
+inline double MaxDifference(const Image& inGot, const Image& inExpected,
+                            bool inWeighByAlpha = false)
 {
     double worst = 0.0;
-    for (std::int32_t y = 0; y < inA.Height(); ++y)
-        for (std::int32_t x = 0; x < inA.Width(); ++x)
-            for (int c = 0; c < 4; ++c)
-                worst = std::max(
-                    worst, inA.IsFloat() ? std::fabs(double{inA.GetF(x, y)[c]} - inB.GetF(x, y)[c])
-                                         : std::abs(inA.Get(x, y)[c] - inB.Get(x, y)[c]));
-    return worst;
-}
-
-// The largest difference of an 8-bit motion result from the reference; straight colour is
-// weighed by alpha, since un-premultiplying magnifies the error of small alphas.
-inline int MotionDifference(const Image& inGot, const Image& inExpected, bool inStraight)
-{
-    int worst = 0;
-    for (std::int32_t y = 0; y < inGot.Height(); ++y)
-        for (std::int32_t x = 0; x < inGot.Width(); ++x)
+    for (std::int32_t i = 0; i < inGot.Width() * inGot.Height(); ++i)
+        for (int c = 0; c < 4; ++c)
         {
-            const Pixel a = inGot.Get(x, y), b = inExpected.Get(x, y);
-            const int alpha = std::max<int>(b[3], 1);
-            for (int c = 0; c < 4; ++c)
+            const std::int32_t x = i % inGot.Width(), y = i / inGot.Width();
+            if (inGot.IsFloat())
             {
-                const int diff = std::abs(a[c] - b[c]);
-                worst =
-                    std::max(worst, c < 3 && inStraight && alpha < 255 ? diff * alpha / 255 : diff);
+                worst = std::max(worst,
+                                 std::fabs(double{inGot.GetF(x, y)[c]} - inExpected.GetF(x, y)[c]));
+                continue;
             }
+            const int diff = std::abs(inGot.Get(x, y)[c] - inExpected.Get(x, y)[c]);
+            const int alpha = std::max<int>(inExpected.Get(x, y)[3], 1);
+            worst = std::max<double>(worst, c < 3 && inWeighByAlpha ? diff * alpha / 255 : diff);
         }
     return worst;
 }
@@ -162,8 +144,7 @@ inline int MotionDifference(const Image& inGot, const Image& inExpected, bool in
 inline Image Copy(const Image& inImage, std::int32_t inMisalign)
 {
     Image out(inImage.Format(), inImage.Width(), inImage.Height(), inMisalign);
-    const auto bytes =
-        static_cast<std::size_t>(IR_MinimumRowBytes(inImage.Format(), inImage.Width()));
+    const auto bytes = std::size_t(IR_MinimumRowBytes(inImage.Format(), inImage.Width()));
     for (std::int32_t y = 0; y < inImage.Height(); ++y)
         std::memcpy(out.Row(y), inImage.Row(y), bytes);
     return out;
