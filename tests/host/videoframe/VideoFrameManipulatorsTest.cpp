@@ -262,30 +262,17 @@ TEST_F(VideoFrameManipulatorsTest, FieldSelectionPicksRowsByFieldOrderAndScaling
         int32_t selection;
         std::vector<int> expected;
     };
+    const mt::FieldType upper = mt::kFieldType_UpperFirst, lower = mt::kFieldType_LowerFirst,
+                        progressive = mt::kFieldType_Progressive;
     const Case cases[] = {
         // Interlaced to interlaced keeps each field's rows apart; as a whole frame it mixes them.
-        {mt::kFieldType_UpperFirst,
-         mt::kFieldType_UpperFirst,
-         VF::kFieldSelection_First,
-         {15, 115, 35, 135}},
-        {mt::kFieldType_UpperFirst,
-         mt::kFieldType_UpperFirst,
-         VF::kFieldSelection_Frame,
-         {60, 70, 80, 90}},
+        {upper, upper, VF::kFieldSelection_First, {15, 115, 35, 135}},
+        {upper, upper, VF::kFieldSelection_Frame, {60, 70, 80, 90}},
         // A progressive destination takes the selected field in time: lower first starts with
         // rows 1, 3, 5, 7.
-        {mt::kFieldType_LowerFirst,
-         mt::kFieldType_Progressive,
-         VF::kFieldSelection_First,
-         {110, 120, 130, 140}},
-        {mt::kFieldType_LowerFirst,
-         mt::kFieldType_Progressive,
-         VF::kFieldSelection_Second,
-         {10, 20, 30, 40}},
-        {mt::kFieldType_UpperFirst,
-         mt::kFieldType_Progressive,
-         VF::kFieldSelection_First,
-         {10, 20, 30, 40}},
+        {lower, progressive, VF::kFieldSelection_First, {110, 120, 130, 140}},
+        {lower, progressive, VF::kFieldSelection_Second, {10, 20, 30, 40}},
+        {upper, progressive, VF::kFieldSelection_First, {10, 20, 30, 40}},
     };
     const Frame destination = MakeFrame(kBGRA8, 2, 4);
     for (const Case& c : cases)

@@ -60,23 +60,20 @@ TEST_F(VideoFrameTest, NewFrameHasRequestedAttributesAndDefaults)
     ASSERT_EQ(
         VF::CreateVideoFrame(kBGRA8, 100, 3, mt::kPixelAspectRatio_D1PAL, false, false, frame),
         QRT::kResult_Success);
-    EXPECT_EQ(frame->GetPixelFormat(), kBGRA8);
-    EXPECT_EQ(frame->GetBounds(), ParamRect(0, 0, 100, 3));
-    EXPECT_EQ(frame->GetRowBytes(), 448); // 400 rounded up to 64
-    EXPECT_EQ(frame->GetDataSize(), 448u * 3);
-    EXPECT_EQ(frame->GetPixelAspectRatio().GetNumerator(), 59u);
-    EXPECT_EQ(frame->GetPixelAspectRatio().GetDenominator(), 54u);
-    EXPECT_EQ(frame->GetFieldType(), mt::kFieldType_Progressive);
-    EXPECT_EQ(frame->GetAlphaChannel(), mt::kAlphaChannel_Straight);
-    EXPECT_TRUE(frame->HasAlpha());
-    EXPECT_EQ(frame->GetRenderTime(), 0u);
-    EXPECT_EQ(OriginOf(*frame), std::pair(0xFFFFFFFFu, 0xFFFFFFFFu));
-    EXPECT_FALSE(frame->HasFullFrame(0));
-    EXPECT_EQ(frame->GetFullFrameRect(), ParamRect());
-    EXPECT_FALSE(frame->TracksVisibleContent());
-    EXPECT_EQ(frame->GetVisibleContentRect(), ParamRect(0, 0, 100, 3));
-    EXPECT_FALSE(frame->IsShared());
-    EXPECT_EQ(frame->GetPlaneCount(), 1u);
+    // Row bytes: 400 rounded up to 64.
+    EXPECT_EQ(std::tuple(frame->GetPixelFormat(), frame->GetBounds(), frame->GetRowBytes(),
+                         frame->GetDataSize(), frame->GetPlaneCount()),
+              std::tuple(kBGRA8, ParamRect(0, 0, 100, 3), 448, size_t{448 * 3}, 1u));
+    EXPECT_EQ(
+        std::tuple(frame->GetPixelAspectRatio().GetNumerator(),
+                   frame->GetPixelAspectRatio().GetDenominator(), frame->GetFieldType(),
+                   frame->GetAlphaChannel(), frame->HasAlpha(), frame->GetRenderTime()),
+        std::tuple(59u, 54u, mt::kFieldType_Progressive, mt::kAlphaChannel_Straight, true, 0u));
+    EXPECT_EQ(std::tuple(OriginOf(*frame), frame->HasFullFrame(0), frame->GetFullFrameRect(),
+                         frame->TracksVisibleContent(), frame->GetVisibleContentRect(),
+                         frame->IsShared()),
+              std::tuple(std::pair(0xFFFFFFFFu, 0xFFFFFFFFu), false, ParamRect(), false,
+                         ParamRect(0, 0, 100, 3), false));
     // Ignored alpha does not count as alpha.
     frame->SetAlphaChannel(mt::kAlphaChannel_Ignore);
     EXPECT_FALSE(frame->HasAlpha());
