@@ -14,15 +14,8 @@ using CompositeTest = ::testing::Test;
 
 TEST_F(CompositeTest, OverMatchesHandValuesAndBlendsInLinearLightAtQualityFive)
 {
-    struct Case
-    {
-        IR_PixelFormat format;
-        Pixel src, dst;
-        float opacity;
-        std::int32_t quality;
-        Pixel expected;
-    };
-    const Case cases[] = {
+    // (format, source, destination, opacity, quality, result)
+    const std::tuple<IR_PixelFormat, Pixel, Pixel, float, std::int32_t, Pixel> cases[] = {
         // s * 0.5 + d * (1 - 128 * 0.5 / 255) = 50 + 149.8, 25 + 149.8, 0 + 149.8.
         {kBGRP8, {100, 50, 0, 128}, {200, 200, 200, 255}, 0.5f, 4, {200, 175, 150, 255}},
         {kBGRA8, {255, 0, 0, 128}, {0, 0, 255, 255}, 1.0f, 4, {128, 0, 127, 255}},
@@ -34,11 +27,11 @@ TEST_F(CompositeTest, OverMatchesHandValuesAndBlendsInLinearLightAtQualityFive)
         {kBGRP8, {128, 128, 128, 128}, {0, 0, 0, 255}, 1.0f, 5, {188, 188, 188, 255}},
         {kBGRP8, {128, 128, 128, 128}, {0, 0, 0, 255}, 1.0f, 9, {188, 188, 188, 255}},
     };
-    for (const Case& c : cases)
+    for (const auto& [format, source, destination, opacity, quality, result] : cases)
     {
-        Image dst = One(c.format, c.dst);
-        ASSERT_EQ(Composite(One(c.format, c.src), dst, c.opacity, c.quality), kIR_NoError);
-        EXPECT_EQ(dst.Get(0, 0), c.expected) << int{c.src[0]} << " q" << c.quality;
+        Image dst = One(format, destination);
+        ASSERT_EQ(Composite(One(format, source), dst, opacity, quality), kIR_NoError);
+        EXPECT_EQ(dst.Get(0, 0), result) << int{source[0]} << " q" << quality;
     }
     Image dst = OneF(kBGRP32f, {1.0f, 0.0f, 0.5f, 1.0f});
     ASSERT_EQ(Composite(OneF(kBGRP32f, {0.25f, 0.5f, 0.0f, 0.5f}), dst), kIR_NoError);
@@ -179,14 +172,8 @@ using MixTest = ::testing::Test;
 
 TEST_F(MixTest, CrossDissolveWeighsBothSourcesAndAtQualityFiveInLinearLight)
 {
-    struct Case
-    {
-        Pixel a, b;
-        float weight;
-        std::int32_t quality;
-        Pixel expected;
-    };
-    const Case cases[] = {
+    // (a, b, weight, quality, result)
+    const std::tuple<Pixel, Pixel, float, std::int32_t, Pixel> cases[] = {
         {{0, 100, 200, 255}, {200, 100, 0, 55}, 0.0f, 4, {0, 100, 200, 255}},
         {{0, 100, 200, 255}, {200, 100, 0, 55}, 1.0f, 4, {200, 100, 0, 55}},
         {{0, 100, 200, 255}, {200, 100, 0, 55}, 0.25f, 4, {50, 100, 150, 205}},
@@ -194,12 +181,12 @@ TEST_F(MixTest, CrossDissolveWeighsBothSourcesAndAtQualityFiveInLinearLight)
         {{0, 0, 0, 255}, {255, 255, 255, 255}, 0.5f, 5, {188, 188, 188, 255}},
     };
     Image d(kBGRA8, 1, 1);
-    for (const Case& c : cases)
+    for (const auto& [a, b, weight, quality, result] : cases)
     {
-        ASSERT_EQ(IR_CrossDissolve(One(kBGRA8, c.a).Data(), 4, One(kBGRA8, c.b).Data(), 4, d.Data(),
-                                   4, kBGRA8, 1, 1, c.weight, c.quality),
+        ASSERT_EQ(IR_CrossDissolve(One(kBGRA8, a).Data(), 4, One(kBGRA8, b).Data(), 4, d.Data(), 4,
+                                   kBGRA8, 1, 1, weight, quality),
                   kIR_NoError);
-        EXPECT_EQ(d.Get(0, 0), c.expected) << c.weight << " q" << c.quality;
+        EXPECT_EQ(d.Get(0, 0), result) << weight << " q" << quality;
     }
     EXPECT_INPUT_CONTRACT(
         IR_CrossDissolve(d.Data(), 4, d.Data(), 4, d.Data(), 4, kBGRA8, 1, 1, -0.1f, 4),

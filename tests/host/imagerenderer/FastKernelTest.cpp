@@ -227,57 +227,45 @@ TEST_F(FastKernelTest, YUV420MatchesReferenceAtEveryTailLength)
 
 TEST_F(FastKernelTest, MotionMatchesReference)
 {
-    struct Case
-    {
-        IR_AffineMatrix matrix;
-        std::int32_t quality;
-        float opacity;
-        // Bilinear weights are 8-bit: two roundings and the weight step stay within 2.
-        int tolerance;
-    };
     const std::int32_t srcW = 37, srcH = 23, dstW = 41, dstH = 27;
-    auto geometry = [&](float inScaleX, float inScaleY, float inX, float inY, double inDegrees)
+    auto motion = [&](const IR_MotionGeometry& inGeometry)
     {
-        IR_MotionGeometry g;
-        g.scaleX = inScaleX;
-        g.scaleY = inScaleY;
-        g.positionX = inX;
-        g.positionY = inY;
-        g.rotationDegrees = inDegrees;
         IR_AffineMatrix matrix;
-        IR_BuildMotionMatrix(g, srcW, srcH, dstW, dstH, &matrix);
+        IR_BuildMotionMatrix(inGeometry, srcW, srcH, dstW, dstH, &matrix);
         return matrix;
     };
-    const IR_AffineMatrix shrunk = geometry(0.75f, 0.75f, 0.45f, 0.5f, 0.0);
-    // Nearest sampling of a rotation is left to the exact quarter turns of MotionTest: at
-    // pixel boundaries fixed and double positions may pick neighbours.
-    std::vector<Case> cases{{shrunk, 0, 0.8f, 1},
-                            {shrunk, 3, 0.8f, 2},
-                            {geometry(1.3f, 0.8f, 0.5f, 0.5f, 17.0), 3, 0.8f, 2}};
+    const IR_AffineMatrix shrunk = motion({.positionX = 0.45f, .scaleX = 0.75f, .scaleY = 0.75f});
+    // (matrix, quality, opacity, tolerance). Bilinear weights are 8-bit: two roundings and the
+    // weight step stay within 2. Nearest sampling of a rotation is left to the exact quarter
+    // turns of MotionTest: at pixel boundaries fixed and double positions may pick neighbours.
+    std::vector<std::tuple<IR_AffineMatrix, std::int32_t, float, double>> cases{
+        {shrunk, 0, 0.8f, 1},
+        {shrunk, 3, 0.8f, 2},
+        {motion({.scaleX = 1.3f, .scaleY = 0.8f, .rotationDegrees = 17.0}), 3, 0.8f, 2}};
     // Shrinking, enlarging, unequal axes, mirrored, and a source hanging over every edge.
     for (const auto& [sx, sy, x, y] :
          {std::array{0.5f, 0.5f, 0.37f, 0.41f}, std::array{1.7f, 1.3f, 0.5f, 0.5f},
           std::array{0.33f, 0.9f, 0.1f, 0.9f}, std::array{-0.8f, 0.6f, 0.5f, 0.5f},
           std::array{1.0f, 1.0f, 0.52f, 0.47f}, std::array{2.5f, 2.5f, 0.0f, 1.0f}})
         for (float opacity : {1.0f, 0.55f})
-            cases.push_back({geometry(sx, sy, x, y, 0.0), 4, opacity, 2});
+            cases.emplace_back(motion({.positionX = x, .positionY = y, .scaleX = sx, .scaleY = sy}),
+                               4, opacity, 2);
     // Whole-pixel translations, some leaving the destination.
     for (const auto& [tx, ty] :
          {std::pair{0, 0}, std::pair{3, -2}, std::pair{-5, 4}, std::pair{40, 0}, std::pair{0, -30}})
         for (std::int32_t quality : {0, 4})
-            cases.push_back(
-                {IR_AffineMatrix{1, 0, 0, 1, double(tx), double(ty)}, quality, 0.7f, 1});
-
+            cases.emplace_back(IR_AffineMatrix{.tx = double(tx), .ty = double(ty)}, quality, 0.7f,
+                               1);
     std::mt19937 random(11);
     for (std::size_t i = 0; i < cases.size(); ++i)
         for (IR_PixelFormat format : {kBGRP8, kBGRA8})
             for (bool lower : {false, true})
             {
-                const Case& c = cases[i];
+                const auto& [matrix, quality, opacity, tolerance] = cases[i];
                 EXPECT_LE(MotionAgainstReference(random, format, Image(format, srcW, srcH, 3),
-                                                 Image(format, dstW, dstH, 1), c.matrix, c.opacity,
-                                                 c.quality, lower),
-                          c.tolerance)
+                                                 Image(format, dstW, dstH, 1), matrix, opacity,
+                                                 quality, lower),
+                          tolerance)
                     << "case " << i << " format " << format << " lower " << lower;
             }
 }

@@ -41,8 +41,7 @@ TEST_F(MotionTest, NinetyDegreeRotationLandsPixelsClockwise)
     for (std::int32_t y = 0; y < 2; ++y)
         for (std::int32_t x = 0; x < 3; ++x)
             src.Set(x, y, {static_cast<std::uint8_t>(10 * x + y), 0, 0, 255});
-    IR_MotionGeometry geometry;
-    geometry.rotationDegrees = 90.0;
+    const IR_MotionGeometry geometry{.rotationDegrees = 90.0};
     for (std::int32_t quality : {0, 4})
     {
         Image dst(kBGRP8, 2, 3);
@@ -61,9 +60,7 @@ TEST_F(MotionTest, TwiceTheSizeIsNearestBelowQualityThreeAndBilinearAtThreeAndFo
     src.Set(1, 0, {0, 255, 0, 255});
     src.Set(0, 1, {0, 0, 255, 255});
     src.Set(1, 1, {40, 40, 40, 255});
-    IR_MotionGeometry geometry;
-    geometry.scaleX = geometry.scaleY = 2.0f;
-    const IR_AffineMatrix matrix = Matrix(geometry, src, dst);
+    const IR_AffineMatrix matrix = Matrix({.scaleX = 2.0f, .scaleY = 2.0f}, src, dst);
     EXPECT_EQ(matrix.a, 2.0);
     EXPECT_EQ(matrix.tx, 0.0);
     for (std::int32_t quality : {0, 2})
@@ -93,21 +90,14 @@ TEST_F(MotionTest, FieldPassTouchesOnlyItsRowsAndClearsThemWithoutALowerFrame)
     Image src(kBGRP8, 4, 4);
     src.Fill({80, 80, 80, 255});
     const Pixel sentinel{1, 2, 3, 4};
-    IR_AffineMatrix shift, flat;
-    shift.tx = shift.ty = 1.0;
-    flat.a = 0.0;
-    struct Case
-    {
-        IR_AffineMatrix matrix;
-        std::int32_t quality;
-        float opacity;
-    };
-    const Case cases[] = {{IR_AffineMatrix{}, 3, 1.0f},
-                          {shift, 0, 1.0f},
-                          {shift, 0, 0.5f},
-                          {shift, 3, 1.0f},
-                          {shift, 4, 1.0f},
-                          {flat, 3, 1.0f}};
+    const IR_AffineMatrix shift{.tx = 1.0, .ty = 1.0}, flat{.a = 0.0};
+    // (matrix, quality, opacity)
+    const std::tuple<IR_AffineMatrix, std::int32_t, float> cases[] = {{IR_AffineMatrix{}, 3, 1.0f},
+                                                                      {shift, 0, 1.0f},
+                                                                      {shift, 0, 0.5f},
+                                                                      {shift, 3, 1.0f},
+                                                                      {shift, 4, 1.0f},
+                                                                      {flat, 3, 1.0f}};
     for (const auto& [matrix, quality, opacity] : cases)
         for (std::int32_t field : {kIR_Field_All, kIR_Field_First, kIR_Field_Second})
             for (bool lower : {false, true})
@@ -149,8 +139,7 @@ TEST_F(MotionTest, AlignedHalfSizeAveragesEachTwoByTwoBlock)
     src.Set(1, 1, {40, 130, 12, 255});
     Image dst(kBGRP8, 4, 3, 2);
     dst.Fill({9, 9, 9, 9});
-    IR_AffineMatrix half;
-    half.a = half.d = 0.5;
+    const IR_AffineMatrix half{.a = 0.5, .d = 0.5};
     ASSERT_EQ(Draw(src, dst, half, 4), kIR_NoError);
     EXPECT_EQ(dst.Get(0, 0), (Pixel{25, 115, 6, 255}));
     EXPECT_EQ(dst.Get(1, 0), (Pixel{200, 200, 200, 255}));
@@ -196,8 +185,7 @@ TEST_F(MotionTest, BadInputIsRefused)
     EXPECT_INPUT_CONTRACT(IR_Motion(src.Data(), src.RowBytes(), src.Format(), 2, 2, dst.Data(),
                                     dst.RowBytes(), dst.Format(), 2, 2, nullptr, 1.0f, 3, 0, true),
                           "inCall.matrix != nullptr");
-    IR_AffineMatrix broken;
-    broken.tx = std::numeric_limits<double>::infinity();
+    const IR_AffineMatrix broken{.tx = std::numeric_limits<double>::infinity()};
     EXPECT_INPUT_CONTRACT(Draw(src, dst, broken, 3),
                           "std::isfinite(m.a) && std::isfinite(m.b) && std::isfinite(m.c) && "
                           "std::isfinite(m.d) && std::isfinite(m.tx) && std::isfinite(m.ty)");
