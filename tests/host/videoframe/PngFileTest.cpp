@@ -36,31 +36,27 @@ bool SamePixels(const Frame& inA, const Frame& inB)
     return same;
 }
 
+void WriteBytes(const std::string& inPath, const std::vector<char>& inBytes)
+{
+    std::ofstream(inPath, std::ios::binary).write(inBytes.data(), std::streamsize(inBytes.size()));
+}
+
+// Reads the file; the frame must be left empty unless the read succeeds.
+VF::PngStatus Read(const std::string& inPath, Frame& outFrame)
+{
+    outFrame = MakePattern(1, 1);
+    const VF::PngStatus status = VF::ReadPngFile(inPath, outFrame);
+    EXPECT_EQ(bool(outFrame), status.Succeeded()) << status.mMessage;
+    return status;
+}
+
+// Each case works in its own temporary directory.
 class PngFileTest : public ::testing::Test
 {
 protected:
     void SetUp() override { std::filesystem::create_directories(mDirectory); }
     void TearDown() override { std::filesystem::remove_all(mDirectory); }
-
     std::string PathOf(const std::string& inName) const { return (mDirectory / inName).string(); }
-    static void WriteBytes(const std::string& inPath, const std::vector<char>& inBytes)
-    {
-        std::ofstream(inPath, std::ios::binary)
-            .write(inBytes.data(), static_cast<std::streamsize>(inBytes.size()));
-    }
-    static std::vector<char> ReadBytes(const std::string& inPath)
-    {
-        std::ifstream in(inPath, std::ios::binary);
-        return std::vector<char>(std::istreambuf_iterator<char>(in), {});
-    }
-    // Reads the file; the frame must be left empty unless the read succeeds.
-    static VF::PngStatus Read(const std::string& inPath, Frame& outFrame)
-    {
-        outFrame = MakePattern(1, 1);
-        const VF::PngStatus status = VF::ReadPngFile(inPath, outFrame);
-        EXPECT_EQ(bool(outFrame), status.Succeeded()) << status.mMessage;
-        return status;
-    }
 
     const std::filesystem::path mDirectory =
         std::filesystem::temp_directory_path() /
@@ -94,7 +90,8 @@ TEST_F(PngFileTest, TruncatedOrCorruptedFileIsMalformedNotACrash)
 {
     const std::string path = PathOf("whole.png");
     ASSERT_TRUE(VF::WritePngFile(path, MakePattern(64, 64)).Succeeded());
-    const std::vector<char> bytes = ReadBytes(path);
+    std::ifstream in(path, std::ios::binary);
+    const std::vector<char> bytes{std::istreambuf_iterator<char>(in), {}};
     ASSERT_GT(bytes.size(), 100u);
     Frame read;
     for (const size_t keep : {bytes.size() / 2, size_t{40}, bytes.size() * 3 / 4})

@@ -27,6 +27,18 @@ void SetPixel8(const Frame& inFrame, int32_t inX, int32_t inY, std::array<uint8_
     std::memcpy(Row(inFrame, inY, inX), inBGRA.data(), 4);
 }
 
+// A one-row 8-bit frame holding the bytes, and the bytes of such a row.
+Frame Row8(const std::vector<uint8_t>& inBytes)
+{
+    const Frame frame = MakeFrame(kBGRA8, uint32_t(inBytes.size() / 4), 1);
+    std::memcpy(Row(frame, 0), inBytes.data(), inBytes.size());
+    return frame;
+}
+std::vector<uint8_t> Bytes8(const Frame& inFrame)
+{
+    return std::vector<uint8_t>(Row(inFrame, 0), Row(inFrame, 0, inFrame->GetBounds().Width()));
+}
+
 // An 8-bit frame whose row y is opaque grey inRowValues[y].
 Frame GreyRows(const std::vector<uint8_t>& inRowValues, uint32_t inWidth = 2)
 {
@@ -198,9 +210,7 @@ TEST_F(VideoFrameManipulatorsTest, StagedFormatsConvertExactly)
 
 TEST_F(VideoFrameManipulatorsTest, FloatYCbCrRoundTripsAndStoresFullRangeLuma)
 {
-    const Frame source = MakeFrame(kBGRA8, 2, 1);
-    SetPixel8(source, 0, 0, {255, 255, 255, 255});
-    SetPixel8(source, 1, 0, {30, 160, 220, 128});
+    const Frame source = Row8({255, 255, 255, 255, 30, 160, 220, 128});
     const Frame yuv = MakeFrame(mt::kPixelFormat_VUYA_4444_32f, 2, 1),
                 back = MakeFrame(kBGRA8, 2, 1);
     ASSERT_EQ(Copy(source, yuv), QRT::kResult_Success);
@@ -363,17 +373,13 @@ TEST_F(VideoFrameManipulatorsTest, CopyRectScalesIntoTheRectangleAndKeepsTheRest
 
 TEST_F(VideoFrameManipulatorsTest, CopyRectCanCopyAlphaAlone)
 {
-    const Frame source = MakeFrame(kBGRA8, 2, 1), destination = MakeFrame(kBGRA8, 2, 1);
-    SetPixel8(source, 0, 0, {1, 2, 3, 40});
-    SetPixel8(source, 1, 0, {4, 5, 6, 80});
-    SetPixel8(destination, 0, 0, {100, 101, 102, 255});
-    SetPixel8(destination, 1, 0, {103, 104, 105, 255});
+    const Frame source = Row8({1, 2, 3, 40, 4, 5, 6, 80});
+    const Frame destination = Row8({100, 101, 102, 255, 103, 104, 105, 255});
     ASSERT_EQ(VideoFrameManipulators::CopyRect(source, source->GetBounds(), destination,
                                                destination->GetBounds(), mt::kRenderQuality_High,
                                                VF::kCopyChannels_Alpha),
               QRT::kResult_Success);
-    const uint8_t expected[8] = {100, 101, 102, 40, 103, 104, 105, 80};
-    EXPECT_EQ(std::memcmp(Row(destination, 0), expected, 8), 0);
+    EXPECT_EQ(Bytes8(destination), (std::vector<uint8_t>{100, 101, 102, 40, 103, 104, 105, 80}));
     EXPECT_INPUT_CONTRACT(VideoFrameManipulators::CopyRect(
                               source, ParamRect(0, 0, 3, 1), destination, destination->GetBounds(),
                               mt::kRenderQuality_High, VF::kCopyChannels_All),
@@ -382,17 +388,12 @@ TEST_F(VideoFrameManipulatorsTest, CopyRectCanCopyAlphaAlone)
 
 TEST_F(VideoFrameManipulatorsTest, OpaqueAndInvertAlphaChangeOnlyAlpha)
 {
-    const Frame frame = MakeFrame(kBGRA8, 3, 1);
-    SetPixel8(frame, 0, 0, {1, 2, 3, 0});
-    SetPixel8(frame, 1, 0, {4, 5, 6, 100});
-    SetPixel8(frame, 2, 0, {7, 8, 9, 255});
+    const Frame frame = Row8({1, 2, 3, 0, 4, 5, 6, 100, 7, 8, 9, 255});
     ASSERT_EQ(VideoFrameManipulators::InvertAlpha(frame), QRT::kResult_Success);
-    const uint8_t inverted[12] = {1, 2, 3, 255, 4, 5, 6, 155, 7, 8, 9, 0};
-    EXPECT_EQ(std::memcmp(Row(frame, 0), inverted, 12), 0);
+    EXPECT_EQ(Bytes8(frame), (std::vector<uint8_t>{1, 2, 3, 255, 4, 5, 6, 155, 7, 8, 9, 0}));
     EXPECT_FALSE(frame->IsAlphaOpaque());
     ASSERT_EQ(VideoFrameManipulators::OpaqueAlpha(frame), QRT::kResult_Success);
-    const uint8_t opaque[12] = {1, 2, 3, 255, 4, 5, 6, 255, 7, 8, 9, 255};
-    EXPECT_EQ(std::memcmp(Row(frame, 0), opaque, 12), 0);
+    EXPECT_EQ(Bytes8(frame), (std::vector<uint8_t>{1, 2, 3, 255, 4, 5, 6, 255, 7, 8, 9, 255}));
     EXPECT_TRUE(frame->IsAlphaOpaque()); // the remembered analysis was dropped
 
     // Premultiplied colour is reassociated; colour under alpha 0 comes out as 0.
