@@ -1,65 +1,60 @@
 #include "VF/FrameMemoryPool.h"
 
 #include "ContractExpect.h"
-#include "VF/VideoFrame.h"
+#include "FrameTestSupport.h"
 
-#include <cstring>
 #include <thread>
-#include <vector>
 
 #include <gtest/gtest.h>
 
 namespace
 {
 
-namespace mt = mvxmediatypes;
+using namespace vftest;
 
-class FrameMemoryPoolTest : public ::testing::Test
+// System allocations, reuses, system releases, buffers pooled, bytes pooled, bytes in use.
+auto Counts(const VF::FrameMemoryPool& inPool)
 {
-};
+    const VF::FrameMemoryPoolStatistics s = inPool.GetStatistics();
+    return std::tuple(s.mSystemAllocations, s.mReuses, s.mSystemReleases, s.mBuffersPooled,
+                      s.mBytesPooled, s.mBytesInUse);
+}
+using Expected = std::tuple<uint64_t, uint64_t, uint64_t, uint64_t, uint64_t, uint64_t>;
+
+using FrameMemoryPoolTest = ::testing::Test;
 
 TEST_F(FrameMemoryPoolTest, SizeClassesRoundUpWithBoundedWaste)
 {
-    EXPECT_EQ(VF::FrameMemoryPool::SizeClassFor(1), 4096u);
-    EXPECT_EQ(VF::FrameMemoryPool::SizeClassFor(4096), 4096u);
-    EXPECT_EQ(VF::FrameMemoryPool::SizeClassFor(4097), 8192u);
-    EXPECT_EQ(VF::FrameMemoryPool::SizeClassFor(32768), 32768u);
-    EXPECT_EQ(VF::FrameMemoryPool::SizeClassFor(33000), 36864u); // 32 KiB + 4 KiB steps
-    EXPECT_EQ(VF::FrameMemoryPool::SizeClassFor(1920 * 4 * 1080), 8388608u);
+    // Whole pages up to 32 KiB, then 4 KiB steps, then bounded steps.
+    const std::pair<size_t, size_t> classes[] = {{1, 4096},      {4096, 4096},
+                                                 {4097, 8192},   {32768, 32768},
+                                                 {33000, 36864}, {1920 * 4 * 1080, 8388608}};
+    for (const auto& [bytes, sizeClass] : classes)
+        EXPECT_EQ(VF::FrameMemoryPool::SizeClassFor(bytes), sizeClass) << bytes;
     for (size_t bytes = 40000; bytes < 100'000'000; bytes = bytes * 3 / 2 + 7)
     {
         const size_t sizeClass = VF::FrameMemoryPool::SizeClassFor(bytes);
-        EXPECT_GE(sizeClass, bytes);
-        EXPECT_LE(sizeClass - bytes, bytes / 8);
+        EXPECT_TRUE(sizeClass >= bytes && sizeClass - bytes <= bytes / 8) << bytes;
     }
 }
 
 TEST_F(FrameMemoryPoolTest, ReturnedBufferIsReusedForTheSameClass)
 {
     VF::FrameMemoryPool pool(size_t{64} << 20);
-    VF::PoolBuffer first = pool.Acquire(100'000);
+    const VF::PoolBuffer first = pool.Acquire(100'000);
+    const uint64_t capacity = VF::FrameMemoryPool::SizeClassFor(100'000);
     ASSERT_NE(first.mData, nullptr);
     EXPECT_EQ(reinterpret_cast<uintptr_t>(first.mData) % 64, 0u);
-    EXPECT_EQ(first.mCapacity, VF::FrameMemoryPool::SizeClassFor(100'000));
+    EXPECT_EQ(first.mCapacity, capacity);
     pool.Return(first);
-    auto statistics = pool.GetStatistics();
-    EXPECT_EQ(statistics.mBuffersPooled, 1u);
-    EXPECT_EQ(statistics.mBytesPooled, first.mCapacity);
-    EXPECT_EQ(statistics.mBytesInUse, 0u);
-
-    // Another size of the same class gets the same buffer.
-    VF::PoolBuffer second = pool.Acquire(99'000);
+    EXPECT_EQ(Counts(pool), (Expected{1, 0, 0, 1, capacity, 0}));
+    // Another size of the same class gets the same buffer; a different class does not.
+    const VF::PoolBuffer second = pool.Acquire(99'000);
     EXPECT_EQ(second.mData, first.mData);
-    statistics = pool.GetStatistics();
-    EXPECT_EQ(statistics.mSystemAllocations, 1u);
-    EXPECT_EQ(statistics.mReuses, 1u);
-    EXPECT_EQ(statistics.mBuffersPooled, 0u);
-    EXPECT_EQ(statistics.mBytesInUse, second.mCapacity);
-
-    // A different class does not.
-    VF::PoolBuffer other = pool.Acquire(10'000);
+    EXPECT_EQ(Counts(pool), (Expected{1, 1, 0, 0, 0, capacity}));
+    const VF::PoolBuffer other = pool.Acquire(10'000);
     EXPECT_NE(other.mData, second.mData);
-    EXPECT_EQ(pool.GetStatistics().mSystemAllocations, 2u);
+    EXPECT_EQ(std::get<0>(Counts(pool)), 2u);
     pool.Return(second);
     pool.Return(other);
 }
@@ -67,103 +62,79 @@ TEST_F(FrameMemoryPoolTest, ReturnedBufferIsReusedForTheSameClass)
 TEST_F(FrameMemoryPoolTest, CapTrimsLeastRecentlyReturnedFirst)
 {
     VF::FrameMemoryPool pool(8192);
-    VF::PoolBuffer a = pool.Acquire(4096);
-    VF::PoolBuffer b = pool.Acquire(4096);
-    VF::PoolBuffer c = pool.Acquire(4096);
-    void* const bData = b.mData;
-    void* const cData = c.mData;
+    const VF::PoolBuffer a = pool.Acquire(4096), b = pool.Acquire(4096), c = pool.Acquire(4096);
     pool.Return(a);
     pool.Return(b);
     pool.Return(c); // a, the oldest, goes back to the system
-    auto statistics = pool.GetStatistics();
-    EXPECT_EQ(statistics.mBytesPooled, 8192u);
-    EXPECT_EQ(statistics.mSystemReleases, 1u);
+    EXPECT_EQ(Counts(pool), (Expected{3, 0, 1, 2, 8192, 0}));
     // The most recent return is handed out first, then the next.
-    EXPECT_EQ(pool.Acquire(4096).mData, cData);
-    VF::PoolBuffer next = pool.Acquire(4096);
-    EXPECT_EQ(next.mData, bData);
-    EXPECT_EQ(pool.GetStatistics().mReuses, 2u);
-    pool.Return(VF::PoolBuffer{cData, 4096});
-    pool.Return(next);
+    EXPECT_EQ(pool.Acquire(4096).mData, c.mData);
+    EXPECT_EQ(pool.Acquire(4096).mData, b.mData);
+    EXPECT_EQ(std::get<1>(Counts(pool)), 2u);
+    pool.Return(c);
+    pool.Return(b);
 }
 
 TEST_F(FrameMemoryPoolTest, BufferLargerThanCapIsNotKeptAndLoweringTheCapTrims)
 {
     VF::FrameMemoryPool pool(16384);
     pool.Return(pool.Acquire(40000));
-    EXPECT_EQ(pool.GetStatistics().mBuffersPooled, 0u);
-    EXPECT_EQ(pool.GetStatistics().mSystemReleases, 1u);
-    VF::PoolBuffer a = pool.Acquire(4096);
-    VF::PoolBuffer b = pool.Acquire(8192);
+    EXPECT_EQ(Counts(pool), (Expected{1, 0, 1, 0, 0, 0}));
+    const VF::PoolBuffer a = pool.Acquire(4096), b = pool.Acquire(8192);
     pool.Return(a);
     pool.Return(b);
-    EXPECT_EQ(pool.GetStatistics().mBytesPooled, 12288u);
+    EXPECT_EQ(std::get<4>(Counts(pool)), 12288u);
     pool.SetByteCap(8192);
-    EXPECT_EQ(pool.GetStatistics().mBytesPooled, 8192u); // a (older) left
+    EXPECT_EQ(std::get<4>(Counts(pool)), 8192u); // a (older) left
     pool.Trim();
-    EXPECT_EQ(pool.GetStatistics().mBytesPooled, 0u);
-    EXPECT_EQ(pool.GetStatistics().mBuffersPooled, 0u);
-}
-
-TEST_F(FrameMemoryPoolTest, ZeroBytesIsAContractErrorAndEmptyReturnIsIgnored)
-{
-    VF::FrameMemoryPool pool(8192);
+    EXPECT_EQ(Counts(pool), (Expected{3, 0, 3, 0, 0, 0}));
+    // Zero bytes is a contract error; returning an empty buffer is ignored.
     EXPECT_INPUT_CONTRACT(pool.Acquire(0), "inBytes > 0");
     pool.Return(VF::PoolBuffer{});
-    EXPECT_EQ(pool.GetStatistics().mBuffersPooled, 0u);
+    EXPECT_EQ(std::get<3>(Counts(pool)), 0u);
 }
 
 TEST_F(FrameMemoryPoolTest, ConcurrentAcquireAndReturnKeepExactCounts)
 {
     VF::FrameMemoryPool pool(size_t{256} << 20);
-    constexpr int kThreads = 4;
-    constexpr int kRounds = 2000;
+    constexpr int kThreads = 4, kRounds = 2000;
     std::vector<std::thread> threads;
     for (int t = 0; t < kThreads; ++t)
-    {
         threads.emplace_back(
             [&pool, t]
             {
                 for (int round = 0; round < kRounds; ++round)
                 {
-                    const size_t bytes = size_t(4096) * (1 + (round + t) % 5);
-                    VF::PoolBuffer buffer = pool.Acquire(bytes);
+                    const VF::PoolBuffer buffer =
+                        pool.Acquire(size_t(4096) * (1 + (round + t) % 5));
                     ASSERT_NE(buffer.mData, nullptr);
-                    // Writing the whole buffer catches two owners of one buffer
-                    // under the sanitizers and through the check below.
+                    // Writing the whole buffer catches two owners of one buffer under the
+                    // sanitizers and through the check below.
                     std::memset(buffer.mData, t, buffer.mCapacity);
-                    const auto* bytesOut = static_cast<const unsigned char*>(buffer.mData);
-                    ASSERT_EQ(bytesOut[buffer.mCapacity - 1], t);
+                    ASSERT_EQ(static_cast<const uint8_t*>(buffer.mData)[buffer.mCapacity - 1], t);
                     pool.Return(buffer);
                 }
             });
-    }
     for (auto& thread : threads)
         thread.join();
-    const auto statistics = pool.GetStatistics();
-    EXPECT_EQ(statistics.mSystemAllocations + statistics.mReuses, uint64_t(kThreads) * kRounds);
-    EXPECT_LE(statistics.mSystemAllocations, uint64_t(kThreads) * 5);
-    EXPECT_EQ(statistics.mBytesInUse, 0u);
-    EXPECT_EQ(statistics.mBuffersPooled, statistics.mSystemAllocations);
+    const auto [allocations, reuses, releases, pooled, bytesPooled, inUse] = Counts(pool);
+    EXPECT_EQ(allocations + reuses, uint64_t(kThreads) * kRounds);
+    EXPECT_LE(allocations, uint64_t(kThreads) * 5);
+    EXPECT_EQ(inUse, 0u);
+    EXPECT_EQ(pooled, allocations);
 }
 
 TEST_F(FrameMemoryPoolTest, SecondFrameOfTheSameSizeGetsTheRecycledBuffer)
 {
-    VF::FrameMemoryPool& pool = VF::FrameMemoryPool::GetShared();
-    const void* address = nullptr;
-    {
-        auto frame = VF::CreateVideoFrame(mt::kPixelFormat_BGRA_4444_8u, 1920, 1080,
-                                          mt::kPixelAspectRatio_Square, false, false);
-        ASSERT_TRUE(frame);
-        address = frame->GetBaseAddress();
-    }
-    const auto before = pool.GetStatistics();
-    auto frame = VF::CreateVideoFrame(mt::kPixelFormat_BGRA_4444_8u, 1920, 1080,
-                                      mt::kPixelAspectRatio_Square, false, false);
-    const auto after = pool.GetStatistics();
+    const VF::FrameMemoryPool& pool = VF::FrameMemoryPool::GetShared();
+    const void* const address =
+        MakeFrame(mt::kPixelFormat_BGRA_4444_8u, 1920, 1080)->GetBaseAddress();
+    const auto before = Counts(pool);
+    const Frame frame = MakeFrame(mt::kPixelFormat_BGRA_4444_8u, 1920, 1080, false);
+    const auto after = Counts(pool);
     EXPECT_EQ(frame->GetBaseAddress(), address);
-    EXPECT_EQ(after.mSystemAllocations, before.mSystemAllocations);
-    EXPECT_EQ(after.mReuses, before.mReuses + 1);
+    EXPECT_EQ(std::get<0>(after), std::get<0>(before));
+    EXPECT_EQ(std::get<1>(after), std::get<1>(before) + 1);
 }
 
 } // namespace

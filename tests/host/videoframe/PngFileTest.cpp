@@ -1,185 +1,135 @@
 #include "VF/PngFile.h"
 
-#include "VF/VideoFrame.h"
+#include "FrameTestSupport.h"
 #include "VF/VideoFrameManipulators.h"
 
-#include <cstring>
 #include <filesystem>
 #include <fstream>
 #include <unistd.h>
-#include <vector>
 
 #include <gtest/gtest.h>
 
 namespace
 {
 
-namespace mt = mvxmediatypes;
-using Frame = QRT::InterfaceRef<MF::IVideoFrame>;
+using namespace vftest;
 
-class PngFileTest : public ::testing::Test
+// A straight BGRA frame with every channel varying and translucent alpha.
+Frame MakePattern(uint32_t inWidth, uint32_t inHeight)
 {
-protected:
-    void SetUp() override
-    {
-        mDirectory = std::filesystem::temp_directory_path() /
-                     ("vf_png_test_" + std::to_string(::getpid()) + "_" +
-                      ::testing::UnitTest::GetInstance()->current_test_info()->name());
-        std::filesystem::create_directories(mDirectory);
-    }
-    void TearDown() override { std::filesystem::remove_all(mDirectory); }
-
-    std::string PathOf(const std::string& inName) const { return (mDirectory / inName).string(); }
-
-    static Frame MakePattern(uint32_t inWidth, uint32_t inHeight)
-    {
-        Frame frame = VF::CreateVideoFrame(mt::kPixelFormat_BGRA_4444_8u, inWidth, inHeight,
-                                           mt::kPixelAspectRatio_Square, true, false);
-        for (uint32_t y = 0; y < inHeight; ++y)
+    const Frame frame = MakeFrame(mt::kPixelFormat_BGRA_4444_8u, inWidth, inHeight);
+    for (uint32_t y = 0; y < inHeight; ++y)
+        for (uint32_t x = 0; x < inWidth; ++x)
         {
-            auto* row = static_cast<uint8_t*>(frame->GetWritableBaseAddress()) +
-                        y * static_cast<size_t>(frame->GetRowBytes());
-            for (uint32_t x = 0; x < inWidth; ++x)
-            {
-                row[4 * x + 0] = static_cast<uint8_t>(x * 13 + y);
-                row[4 * x + 1] = static_cast<uint8_t>(y * 29);
-                row[4 * x + 2] = static_cast<uint8_t>(255 - x);
-                row[4 * x + 3] = static_cast<uint8_t>(x * 40 + y * 3);
-            }
+            const uint8_t pixel[4] = {uint8_t(x * 13 + y), uint8_t(y * 29), uint8_t(255 - x),
+                                      uint8_t(x * 40 + y * 3)};
+            std::memcpy(Row(frame, int32_t(y), int32_t(x)), pixel, 4);
         }
-        return frame;
-    }
-
-    static void WriteBytes(const std::string& inPath, const std::vector<char>& inBytes)
-    {
-        std::ofstream out(inPath, std::ios::binary);
-        out.write(inBytes.data(), static_cast<std::streamsize>(inBytes.size()));
-    }
-
-    static std::vector<char> ReadBytes(const std::string& inPath)
-    {
-        std::ifstream in(inPath, std::ios::binary);
-        return std::vector<char>(std::istreambuf_iterator<char>(in), {});
-    }
-
-    std::filesystem::path mDirectory;
-};
+    return frame;
+}
 
 bool SamePixels(const Frame& inA, const Frame& inB)
 {
-    if (inA->GetBounds() != inB->GetBounds())
-        return false;
-    const size_t rowBytes = static_cast<size_t>(inA->GetBounds().Width()) * 4;
-    for (int32_t y = 0; y < inA->GetBounds().Height(); ++y)
-        if (std::memcmp(static_cast<const uint8_t*>(inA->GetBaseAddress()) + y * inA->GetRowBytes(),
-                        static_cast<const uint8_t*>(inB->GetBaseAddress()) + y * inB->GetRowBytes(),
-                        rowBytes) != 0)
-            return false;
-    return true;
+    bool same = inA->GetBounds() == inB->GetBounds();
+    for (int32_t y = 0; same && y < inA->GetBounds().Height(); ++y)
+        same = std::memcmp(Row(inA, y), Row(inB, y), size_t(inA->GetBounds().Width()) * 4) == 0;
+    return same;
 }
 
-TEST_F(PngFileTest, RGBAWriteThenReadIsExact)
+void WriteBytes(const std::string& inPath, const std::vector<char>& inBytes)
+{
+    std::ofstream(inPath, std::ios::binary).write(inBytes.data(), std::streamsize(inBytes.size()));
+}
+
+// Reads the file; the frame must be left empty unless the read succeeds.
+VF::PngStatus Read(const std::string& inPath, Frame& outFrame)
+{
+    outFrame = MakePattern(1, 1);
+    const VF::PngStatus status = VF::ReadPngFile(inPath, outFrame);
+    EXPECT_EQ(bool(outFrame), status.Succeeded()) << status.mMessage;
+    return status;
+}
+
+// Each case works in its own temporary directory.
+class PngFileTest : public ::testing::Test
+{
+protected:
+    void SetUp() override { std::filesystem::create_directories(mDirectory); }
+    void TearDown() override { std::filesystem::remove_all(mDirectory); }
+    std::string PathOf(const std::string& inName) const { return (mDirectory / inName).string(); }
+
+    const std::filesystem::path mDirectory =
+        std::filesystem::temp_directory_path() /
+        ("vf_png_test_" + std::to_string(::getpid()) + "_" +
+         ::testing::UnitTest::GetInstance()->current_test_info()->name());
+};
+
+TEST_F(PngFileTest, WriteThenReadIsExactForRGBAOpaqueForRGBAndConvertsFloat)
 {
     const Frame frame = MakePattern(7, 5);
-    const std::string path = PathOf("pattern.png");
-    const VF::PngStatus written = VF::WritePngFile(path, frame);
-    ASSERT_TRUE(written.Succeeded()) << written.mMessage;
-    Frame read;
-    const VF::PngStatus status = VF::ReadPngFile(path, read);
-    ASSERT_TRUE(status.Succeeded()) << status.mMessage;
-    EXPECT_TRUE(status.mMessage.empty());
-    ASSERT_TRUE(read);
-    EXPECT_EQ(read->GetPixelFormat(), mt::kPixelFormat_BGRA_4444_8u);
-    EXPECT_EQ(read->GetAlphaChannel(), mt::kAlphaChannel_Straight);
-    EXPECT_TRUE(SamePixels(read, frame));
-}
-
-TEST_F(PngFileTest, RGBFileReadsOpaque)
-{
-    const Frame frame = MakePattern(3, 2);
-    const std::string path = PathOf("opaque.png");
-    ASSERT_TRUE(VF::WritePngFile(path, frame, VF::PngChannels::kRGB).Succeeded());
-    Frame read;
-    ASSERT_TRUE(VF::ReadPngFile(path, read).Succeeded());
-    const auto* pixel =
-        static_cast<const uint8_t*>(read->GetBaseAddress()) + read->GetRowBytes() + 8;
-    const auto* original =
-        static_cast<const uint8_t*>(frame->GetBaseAddress()) + frame->GetRowBytes() + 8;
-    EXPECT_EQ(std::memcmp(pixel, original, 3), 0);
-    EXPECT_EQ(pixel[3], 255);
-}
-
-TEST_F(PngFileTest, FloatFramesAreConvertedBeforeWriting)
-{
-    const Frame frame = MakePattern(4, 4);
-    const Frame floats = VF::CreateVideoFrame(mt::kPixelFormat_BGRA_4444_32f, 4, 4,
-                                              mt::kPixelAspectRatio_Square, false, false);
+    const Frame floats = MakeFrame(mt::kPixelFormat_BGRA_4444_32f, 7, 5);
     ASSERT_EQ(VF::VideoFrameManipulators::CopyFrame(frame, floats, mt::kRenderQuality_Max),
               QRT::kResult_Success);
-    const std::string path = PathOf("float.png");
-    ASSERT_TRUE(VF::WritePngFile(path, floats).Succeeded());
     Frame read;
-    ASSERT_TRUE(VF::ReadPngFile(path, read).Succeeded());
-    EXPECT_TRUE(SamePixels(read, frame));
+    for (const Frame& written : {frame, floats})
+    {
+        const VF::PngStatus status = VF::WritePngFile(PathOf("pattern.png"), written);
+        ASSERT_TRUE(status.Succeeded()) << status.mMessage;
+        ASSERT_EQ(Read(PathOf("pattern.png"), read).mMessage, "");
+        EXPECT_EQ(read->GetPixelFormat(), mt::kPixelFormat_BGRA_4444_8u);
+        EXPECT_EQ(read->GetAlphaChannel(), mt::kAlphaChannel_Straight);
+        EXPECT_TRUE(SamePixels(read, frame));
+    }
+    ASSERT_TRUE(VF::WritePngFile(PathOf("rgb.png"), frame, VF::PngChannels::kRGB).Succeeded());
+    ASSERT_TRUE(Read(PathOf("rgb.png"), read).Succeeded());
+    EXPECT_EQ(std::memcmp(Row(read, 1, 2), Row(frame, 1, 2), 3), 0);
+    EXPECT_EQ(Row(read, 1, 2)[3], 255);
 }
 
-TEST_F(PngFileTest, TruncatedFileIsMalformedNotACrash)
+TEST_F(PngFileTest, TruncatedOrCorruptedFileIsMalformedNotACrash)
 {
     const std::string path = PathOf("whole.png");
     ASSERT_TRUE(VF::WritePngFile(path, MakePattern(64, 64)).Succeeded());
-    const std::vector<char> bytes = ReadBytes(path);
+    std::ifstream in(path, std::ios::binary);
+    const std::vector<char> bytes{std::istreambuf_iterator<char>(in), {}};
     ASSERT_GT(bytes.size(), 100u);
+    Frame read;
     for (const size_t keep : {bytes.size() / 2, size_t{40}, bytes.size() * 3 / 4})
     {
         const std::string cut = PathOf("cut" + std::to_string(keep) + ".png");
         WriteBytes(cut, std::vector<char>(bytes.begin(), bytes.begin() + keep));
-        Frame read = MakePattern(1, 1);
-        const VF::PngStatus status = VF::ReadPngFile(cut, read);
+        const VF::PngStatus status = Read(cut, read);
         EXPECT_EQ(status.mResult, VF::kResult_PngMalformed) << keep;
         EXPECT_EQ(status.mMessage.rfind(cut + ": ", 0), 0u) << status.mMessage;
         EXPECT_GT(status.mMessage.size(), cut.size() + 2);
-        EXPECT_FALSE(read);
     }
+    // Everything after the signature and header chunk scrambled.
+    std::vector<char> scrambled = bytes;
+    for (size_t i = 40; i < scrambled.size(); ++i)
+        scrambled[i] = static_cast<char>(scrambled[i] ^ 0x5A);
+    WriteBytes(path, scrambled);
+    EXPECT_EQ(Read(path, read).mResult, VF::kResult_PngMalformed);
 }
 
-TEST_F(PngFileTest, GarbageAndMissingFilesCannotBeOpened)
+TEST_F(PngFileTest, GarbageEmptyAndMissingFilesCannotBeOpened)
 {
-    const std::string garbage = PathOf("garbage.png");
-    WriteBytes(garbage, std::vector<char>(300, 'x'));
-    Frame read;
-    VF::PngStatus status = VF::ReadPngFile(garbage, read);
-    EXPECT_EQ(status.mResult, VF::kResult_PngCannotOpen);
-    EXPECT_EQ(status.mMessage, garbage + ": not a PNG file");
-    const std::string empty = PathOf("empty.png");
-    WriteBytes(empty, {});
-    EXPECT_EQ(VF::ReadPngFile(empty, read).mResult, VF::kResult_PngCannotOpen);
+    const std::string garbage = PathOf("garbage.png"), empty = PathOf("empty.png");
     const std::string missing = PathOf("missing.png");
-    status = VF::ReadPngFile(missing, read);
-    EXPECT_EQ(status.mResult, VF::kResult_PngCannotOpen);
-    EXPECT_EQ(status.mMessage, missing + ": No such file or directory");
-    EXPECT_FALSE(read);
-}
-
-TEST_F(PngFileTest, CorruptedDataAfterAValidSignatureIsMalformed)
-{
-    const std::string path = PathOf("corrupt.png");
-    ASSERT_TRUE(VF::WritePngFile(path, MakePattern(16, 16)).Succeeded());
-    std::vector<char> bytes = ReadBytes(path);
-    // Scramble everything after the signature and header chunk.
-    for (size_t i = 40; i < bytes.size(); ++i)
-        bytes[i] = static_cast<char>(bytes[i] ^ 0x5A);
-    WriteBytes(path, bytes);
+    WriteBytes(garbage, std::vector<char>(300, 'x'));
+    WriteBytes(empty, {});
     Frame read;
-    EXPECT_EQ(VF::ReadPngFile(path, read).mResult, VF::kResult_PngMalformed);
-    EXPECT_FALSE(read);
-}
-
-TEST_F(PngFileTest, UnwritablePathFails)
-{
-    const std::string path = PathOf("no/such/directory/out.png");
-    const VF::PngStatus status = VF::WritePngFile(path, MakePattern(2, 2));
+    for (const auto& [path, message] :
+         {std::pair{garbage, garbage + ": not a PNG file"}, std::pair{empty, std::string()},
+          std::pair{missing, missing + ": No such file or directory"}})
+    {
+        const VF::PngStatus status = Read(path, read);
+        EXPECT_EQ(status.mResult, VF::kResult_PngCannotOpen) << path;
+        EXPECT_TRUE(message.empty() || status.mMessage == message) << status.mMessage;
+    }
+    const std::string unwritable = PathOf("no/such/directory/out.png");
+    const VF::PngStatus status = VF::WritePngFile(unwritable, MakePattern(2, 2));
     EXPECT_EQ(status.mResult, VF::kResult_PngWriteFailed);
-    EXPECT_EQ(status.mMessage.rfind(path + ": ", 0), 0u);
+    EXPECT_EQ(status.mMessage.rfind(unwritable + ": ", 0), 0u);
 }
 
 } // namespace

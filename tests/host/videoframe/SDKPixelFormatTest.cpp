@@ -1,119 +1,102 @@
 #include "VF/SDKPixelFormat.h"
 
+#include "FrameTestSupport.h"
 #include "VF/OvPix.h"
-#include "VF/VideoFrame.h"
 
 #include <atomic>
 #include <thread>
-#include <vector>
 
 #include <gtest/gtest.h>
 
 namespace
 {
 
-namespace mt = mvxmediatypes;
-using Frame = QRT::InterfaceRef<MF::IVideoFrame>;
+using namespace vftest;
 
-uint32_t ReferenceCount(const Frame& inFrame)
+// A code from its four characters, the first in the lowest byte.
+constexpr VF::OvPixelFormat Code(const char (&inChars)[5])
 {
-    const uint32_t count = inFrame->AddRef();
-    inFrame->Release();
-    return count - 1;
+    return uint32_t(uint8_t(inChars[0])) | uint32_t(uint8_t(inChars[1])) << 8 |
+           uint32_t(uint8_t(inChars[2])) << 16 | uint32_t(uint8_t(inChars[3])) << 24;
 }
 
-Frame MakeFrame(mt::PixelFormat inFormat, uint32_t inWidth, uint32_t inHeight)
-{
-    return VF::CreateVideoFrame(inFormat, inWidth, inHeight, mt::kPixelAspectRatio_Square, true,
-                                false);
-}
+using SDKPixelFormatTest = ::testing::Test;
 
-class SDKPixelFormatTest : public ::testing::Test
+TEST_F(SDKPixelFormatTest, EveryRasterCatalogueFormatHasItsCodeBothWays)
 {
-};
-
-TEST_F(SDKPixelFormatTest, EveryRasterCatalogueFormatRoundTrips)
-{
-    size_t mapped = 0;
-    for (const mt::PixelFormat format : mt::GetPixelFormatCatalogue())
+    const std::pair<mt::PixelFormat, VF::OvPixelFormat> table[] = {
+        {mt::kPixelFormat_BGRA_4444_8u, Code("BGRA")},
+        {mt::kPixelFormat_BGRA_4444_16u, Code("B16u")},
+        {mt::kPixelFormat_BGRA_4444_16f, Code("B16f")},
+        {mt::kPixelFormat_BGRA_4444_32f, Code("B32f")},
+        {mt::kPixelFormat_BGRP_4444_32f_Linear, Code("BPLf")},
+        {mt::kPixelFormat_VUYA_4444_8u, Code("VUYA")},
+        {mt::kPixelFormat_VUYA_4444_32f, Code("V32f")},
+        {mt::kPixelFormat_YUYV_422_8u, Code("YUY2")},
+        {mt::kPixelFormat_YUYV_422_8u_Fields, Code("YUYF")},
+        {mt::kPixelFormat_YUYV_422_8u_HalfWidthFields, Code("YUYH")},
+        {mt::kPixelFormat_MJPG_422_Compressed, Code("MJPG")},
+    };
+    EXPECT_EQ(VF::kOvPixelFormat_BGRA_4444_8u, 0x41524742u);
+    for (const auto& [format, code] : table)
     {
-        const VF::OvPixelFormat code = VF::BEToSDKPixelFormat(format);
-        if (!format.IsValid())
-        {
-            EXPECT_EQ(code, VF::kOvPixelFormat_Invalid) << mt::GetPixelFormatName(format);
-            continue;
-        }
-        ++mapped;
-        EXPECT_TRUE(VF::IsValidSDKPixelFormat(code)) << mt::GetPixelFormatName(format);
+        EXPECT_EQ(VF::BEToSDKPixelFormat(format), code) << mt::GetPixelFormatName(format);
         EXPECT_EQ(VF::SDKToBEPixelFormat(code), format) << mt::GetPixelFormatName(format);
+        EXPECT_TRUE(VF::IsValidSDKPixelFormat(code)) << mt::GetPixelFormatName(format);
     }
-    EXPECT_EQ(mapped, 11u);
-}
-
-TEST_F(SDKPixelFormatTest, CodesAreTheirFourCharacters)
-{
-    EXPECT_EQ(VF::kOvPixelFormat_BGRA_4444_8u, 0x41524742u); // "BGRA", B in the lowest byte
-    EXPECT_EQ(VF::SDKToBEPixelFormat(0x41524742u), mt::kPixelFormat_BGRA_4444_8u);
-    EXPECT_EQ(VF::SDKToBEPixelFormat(VF::MakeOvPixelFormat('V', '3', '2', 'f')),
-              mt::kPixelFormat_VUYA_4444_32f);
-}
-
-TEST_F(SDKPixelFormatTest, UnknownCodesAreInvalid)
-{
+    // The rest of the catalogue has no code.
+    for (const mt::PixelFormat format : mt::GetPixelFormatCatalogue())
+        EXPECT_TRUE(std::any_of(std::begin(table), std::end(table),
+                                [&](const auto& inRow) { return inRow.first == format; }) ||
+                    VF::BEToSDKPixelFormat(format) == VF::kOvPixelFormat_Invalid)
+            << mt::GetPixelFormatName(format);
+    for (const mt::PixelFormat format : {mt::kPixelFormat_Any, mt::PixelFormat(0x1234)})
+        EXPECT_EQ(VF::BEToSDKPixelFormat(format), VF::kOvPixelFormat_Invalid);
     for (const VF::OvPixelFormat code : {VF::kOvPixelFormat_Invalid, VF::kOvPixelFormat_Unset,
-                                         VF::MakeOvPixelFormat('A', 'R', 'G', 'B'), 0xFFFFFFFFu,
-                                         VF::MakeOvPixelFormat('*', '*', '*', '*')})
+                                         Code("ARGB"), 0xFFFFFFFFu, Code("****")})
     {
         EXPECT_FALSE(VF::IsValidSDKPixelFormat(code)) << code;
         EXPECT_EQ(VF::SDKToBEPixelFormat(code), mt::kPixelFormat_Invalid) << code;
     }
-    EXPECT_EQ(VF::BEToSDKPixelFormat(mt::kPixelFormat_Any), VF::kOvPixelFormat_Invalid);
-    EXPECT_EQ(VF::BEToSDKPixelFormat(mt::PixelFormat(0x1234)), VF::kOvPixelFormat_Invalid);
 }
 
-class OvPixTest : public ::testing::Test
-{
-};
+using OvPixTest = ::testing::Test;
 
-TEST_F(OvPixTest, HandleDescribesTheFramesPixels)
+TEST_F(OvPixTest, HandleDescribesTheFramesPixelsReadOnlyWhenShared)
 {
-    const Frame frame = MakeFrame(mt::kPixelFormat_BGRA_4444_32f, 5, 3);
-    const VF::OvPix handle = VF::NewOvPixFromVideoFrame(frame);
-    ASSERT_NE(handle, nullptr);
-    EXPECT_EQ(handle->mLeft, 0);
-    EXPECT_EQ(handle->mTop, 0);
-    EXPECT_EQ(handle->mRight, 5);
-    EXPECT_EQ(handle->mBottom, 3);
-    EXPECT_EQ(handle->mRowBytes, frame->GetRowBytes());
-    EXPECT_EQ(handle->mPixelFormat, VF::kOvPixelFormat_BGRA_4444_32f);
-    EXPECT_EQ(handle->mPixels, frame->GetBaseAddress());
-    EXPECT_EQ(handle->mReadOnly, 0);
-    EXPECT_EQ(VF::GetVideoFrameFromOvPix(handle).Get(), frame.Get());
-    const QRT::InterfaceRef<QRT::QRTUnknown> mapped = VF::GetOvPixHandFrameMapping(handle);
-    EXPECT_EQ(QRT::QueryRef<MF::IVideoFrame>(mapped).Get(), frame.Get());
-    EXPECT_TRUE(VF::DisposeOvPixFromVideoFrame(handle));
-}
-
-TEST_F(OvPixTest, HandleOfASharedFrameIsReadOnly)
-{
-    const Frame frame = MakeFrame(mt::kPixelFormat_BGRA_4444_8u, 2, 2);
-    frame->MarkShared(1);
-    const VF::OvPix handle = VF::NewOvPixFromVideoFrame(frame);
-    ASSERT_NE(handle, nullptr);
-    EXPECT_EQ(handle->mReadOnly, 1);
-    EXPECT_EQ(handle->mPixels, frame->GetBaseAddress());
-    EXPECT_TRUE(VF::DisposeOvPixFromVideoFrame(handle));
+    for (const bool shared : {false, true})
+    {
+        const Frame frame = MakeFrame(mt::kPixelFormat_BGRA_4444_32f, 5, 3);
+        frame->MarkShared(shared);
+        const VF::OvPix handle = VF::NewOvPixFromVideoFrame(frame);
+        ASSERT_NE(handle, nullptr);
+        EXPECT_EQ(std::tuple(handle->mLeft, handle->mTop, handle->mRight, handle->mBottom),
+                  std::tuple(0, 0, 5, 3));
+        EXPECT_EQ(handle->mRowBytes, frame->GetRowBytes());
+        EXPECT_EQ(handle->mPixelFormat, VF::kOvPixelFormat_BGRA_4444_32f);
+        EXPECT_EQ(handle->mPixels, frame->GetBaseAddress());
+        EXPECT_EQ(handle->mReadOnly, shared ? 1 : 0);
+        EXPECT_EQ(VF::GetVideoFrameFromOvPix(handle).Get(), frame.Get());
+        EXPECT_EQ(QRT::QueryRef<MF::IVideoFrame>(VF::GetOvPixHandFrameMapping(handle)).Get(),
+                  frame.Get());
+        EXPECT_TRUE(VF::DisposeOvPixFromVideoFrame(handle));
+    }
 }
 
 TEST_F(OvPixTest, HandleHoldsTheFrameUntilDisposed)
 {
     Frame frame = MakeFrame(mt::kPixelFormat_BGRA_4444_8u, 2, 2);
-    ASSERT_EQ(ReferenceCount(frame), 1u);
+    MF::IVideoFrame* const raw = frame.Get();
     const size_t liveBefore = VF::GetLiveOvPixCount();
     const VF::OvPix handle = VF::NewOvPixFromVideoFrame(frame);
     ASSERT_NE(handle, nullptr);
     EXPECT_EQ(ReferenceCount(frame), 2u);
     EXPECT_EQ(VF::GetLiveOvPixCount(), liveBefore + 1);
+    // The handle keeps the frame alive after the caller lets go.
+    frame.Reset();
+    frame = VF::GetVideoFrameFromOvPix(handle);
+    ASSERT_EQ(frame.Get(), raw);
+    EXPECT_EQ(ReferenceCount(frame), 2u);
     EXPECT_TRUE(VF::DisposeOvPixFromVideoFrame(handle));
     EXPECT_EQ(ReferenceCount(frame), 1u);
     EXPECT_EQ(VF::GetLiveOvPixCount(), liveBefore);
@@ -123,28 +106,15 @@ TEST_F(OvPixTest, HandleHoldsTheFrameUntilDisposed)
     EXPECT_FALSE(VF::DisposeOvPixFromVideoFrame(handle));
 }
 
-TEST_F(OvPixTest, HandleKeepsTheFrameAliveAfterTheCallerLetsGo)
-{
-    Frame frame = MakeFrame(mt::kPixelFormat_BGRA_4444_8u, 2, 2);
-    auto* raw = frame.Get();
-    const VF::OvPix handle = VF::NewOvPixFromVideoFrame(frame);
-    frame.Reset();
-    const Frame again = VF::GetVideoFrameFromOvPix(handle);
-    ASSERT_TRUE(again);
-    EXPECT_EQ(again.Get(), raw);
-    EXPECT_EQ(ReferenceCount(again), 2u);
-    EXPECT_TRUE(VF::DisposeOvPixFromVideoFrame(handle));
-    EXPECT_EQ(ReferenceCount(again), 1u);
-}
-
 TEST_F(OvPixTest, NullUnknownAndUnmappableAnswerNothing)
 {
     EXPECT_EQ(VF::NewOvPixFromVideoFrame(Frame()), nullptr);
-    EXPECT_FALSE(VF::GetVideoFrameFromOvPix(nullptr));
-    EXPECT_FALSE(VF::DisposeOvPixFromVideoFrame(nullptr));
     VF::OvPixRecord notAHandle;
-    EXPECT_FALSE(VF::GetVideoFrameFromOvPix(&notAHandle));
-    EXPECT_FALSE(VF::DisposeOvPixFromVideoFrame(&notAHandle));
+    for (VF::OvPix handle : {VF::OvPix(nullptr), VF::OvPix(&notAHandle)})
+    {
+        EXPECT_FALSE(VF::GetVideoFrameFromOvPix(handle));
+        EXPECT_FALSE(VF::DisposeOvPixFromVideoFrame(handle));
+    }
 }
 
 TEST_F(OvPixTest, ConcurrentCreationAndDisposalLeavesNoHandleAndNoReference)
@@ -160,9 +130,8 @@ TEST_F(OvPixTest, ConcurrentCreationAndDisposalLeavesNoHandleAndNoReference)
                 for (int i = 0; i < 500; ++i)
                 {
                     const VF::OvPix handle = VF::NewOvPixFromVideoFrame(frame);
-                    if (VF::GetVideoFrameFromOvPix(handle).Get() != frame.Get() ||
-                        !VF::DisposeOvPixFromVideoFrame(handle))
-                        ++failures;
+                    failures += VF::GetVideoFrameFromOvPix(handle).Get() != frame.Get() ||
+                                !VF::DisposeOvPixFromVideoFrame(handle);
                 }
             });
     for (std::thread& thread : threads)

@@ -1,23 +1,19 @@
 #include "VF/SharedVideoFrameCache.h"
 
 #include "ContractExpect.h"
-#include "VF/VideoFrame.h"
+#include "FrameTestSupport.h"
 
 #include <atomic>
 #include <cstdlib>
-#include <cstring>
 #include <thread>
-#include <vector>
 
 #include <gtest/gtest.h>
 
 namespace
 {
 
-namespace mt = mvxmediatypes;
+using namespace vftest;
 using mvxcore::utility::Guid;
-using QRT::InterfaceRef;
-using FrameRef = InterfaceRef<MF::IVideoFrame>;
 
 // 64 x 16 BGRA 8u: 4096 bytes of pixel memory.
 constexpr size_t kFrameBytes = 4096;
@@ -27,85 +23,83 @@ Guid KeyFor(uint32_t inIndex)
     return Guid(inIndex + 1, 0x1234, 0x5678, {1, 2, 3, 4, 5, 6, 7, uint8_t(inIndex)});
 }
 
-// A frame whose first byte tells which key it was made for.
-FrameRef MakeFrame(uint8_t inTag)
+// A frame of inUnits * 4096 bytes whose first byte tells which key it was made for.
+Frame MakeTagged(uint8_t inTag, uint32_t inUnits = 1)
 {
-    FrameRef frame = VF::CreateVideoFrame(mt::kPixelFormat_BGRA_4444_8u, 64, 16,
-                                          mt::kPixelAspectRatio_Square, true, false);
-    static_cast<uint8_t*>(frame->GetWritableBaseAddress())[0] = inTag;
+    const Frame frame = MakeFrame(mt::kPixelFormat_BGRA_4444_8u, 64, 16 * inUnits);
+    Row(frame, 0)[0] = inTag;
     return frame;
 }
 
-uint8_t TagOf(const FrameRef& inFrame)
+uint8_t TagOf(const Frame& inFrame)
 {
     return static_cast<const uint8_t*>(inFrame->GetBaseAddress())[0];
 }
+
+// Hits, misses, insertions, refused, evictions, bytes, frames.
+auto Counts(const VF::VideoFrameCache& inCache)
+{
+    const VF::FrameCacheStatistics s = inCache.GetStatistics();
+    return std::tuple(s.mHits, s.mMisses, s.mInsertions, s.mRefused, s.mEvictions, s.mBytes,
+                      s.mFrames);
+}
+using Expected = std::tuple<uint64_t, uint64_t, uint64_t, uint64_t, uint64_t, uint64_t, uint64_t>;
 
 class SharedVideoFrameCacheTest : public ::testing::Test
 {
 protected:
     VF::VideoFrameCache mCache{3 * kFrameBytes, true};
 
-    bool Holds(uint32_t inIndex) { return bool(mCache.RetrieveFromCache(KeyFor(inIndex))); }
+    void Insert(uint32_t inIndex, int32_t inPriority)
+    {
+        mCache.InsertIntoCache(MakeTagged(uint8_t(inIndex)), KeyFor(inIndex), inPriority);
+    }
+    // The keys of [0, inCount) held now, in order (retrieving refreshes their recency).
+    std::vector<uint32_t> Held(uint32_t inCount)
+    {
+        std::vector<uint32_t> held;
+        for (uint32_t i = 0; i < inCount; ++i)
+            if (const Frame frame = mCache.RetrieveFromCache(KeyFor(i)))
+            {
+                EXPECT_EQ(TagOf(frame), i);
+                held.push_back(i);
+            }
+        return held;
+    }
 };
 
 TEST_F(SharedVideoFrameCacheTest, MissThenHitAndInsertionMarksShared)
 {
     EXPECT_FALSE(mCache.RetrieveFromCache(KeyFor(0)));
-    FrameRef frame = MakeFrame(7);
+    const Frame frame = MakeTagged(7);
     ASSERT_EQ(frame->GetDataSize(), kFrameBytes);
     mCache.InsertIntoCache(frame, KeyFor(0), VF::kCachePriority_Low);
     EXPECT_TRUE(frame->IsShared());
-    FrameRef found = mCache.RetrieveFromCache(KeyFor(0));
-    EXPECT_EQ(found.Get(), frame.Get());
-    const auto statistics = mCache.GetStatistics();
-    EXPECT_EQ(statistics.mHits, 1u);
-    EXPECT_EQ(statistics.mMisses, 1u);
-    EXPECT_EQ(statistics.mInsertions, 1u);
-    EXPECT_EQ(statistics.mBytes, kFrameBytes);
-    EXPECT_EQ(statistics.mFrames, 1u);
-}
-
-TEST_F(SharedVideoFrameCacheTest, ReinsertionReplacesTheFrameAndKeepsBytesExact)
-{
-    mCache.InsertIntoCache(MakeFrame(1), KeyFor(0), 0);
-    mCache.InsertIntoCache(MakeFrame(2), KeyFor(0), 10);
+    EXPECT_EQ(mCache.RetrieveFromCache(KeyFor(0)).Get(), frame.Get());
+    EXPECT_EQ(Counts(mCache), (Expected{1, 1, 1, 0, 0, kFrameBytes, 1}));
+    // Reinsertion under the same key replaces the frame and keeps the bytes exact.
+    mCache.InsertIntoCache(MakeTagged(2), KeyFor(0), 10);
     EXPECT_EQ(TagOf(mCache.RetrieveFromCache(KeyFor(0))), 2);
-    EXPECT_EQ(mCache.GetStatistics().mBytes, kFrameBytes);
-    EXPECT_EQ(mCache.GetStatistics().mFrames, 1u);
+    EXPECT_EQ(Counts(mCache), (Expected{2, 1, 2, 0, 0, kFrameBytes, 1}));
 }
 
-TEST_F(SharedVideoFrameCacheTest, EvictsLowPriorityBeforeHighPriority)
+TEST_F(SharedVideoFrameCacheTest, EvictsPriorityZeroBeforeTenThenTheLeastRecentlyUsed)
 {
-    mCache.InsertIntoCache(MakeFrame(0), KeyFor(0), VF::kCachePriority_High);
-    mCache.InsertIntoCache(MakeFrame(1), KeyFor(1), VF::kCachePriority_Low);
-    mCache.InsertIntoCache(MakeFrame(2), KeyFor(2), VF::kCachePriority_High);
-    mCache.InsertIntoCache(MakeFrame(3), KeyFor(3), VF::kCachePriority_High);
-    EXPECT_FALSE(Holds(1)); // the only low-priority frame, though not the oldest
-    EXPECT_TRUE(Holds(0));
-    EXPECT_TRUE(Holds(2));
-    EXPECT_TRUE(Holds(3));
-    EXPECT_EQ(mCache.GetStatistics().mEvictions, 1u);
-    // With only high-priority frames left, the least recently used goes:
-    // 0, 2, 3 were just retrieved in that order, so 0 is the oldest.
-    mCache.InsertIntoCache(MakeFrame(4), KeyFor(4), VF::kCachePriority_High);
-    EXPECT_FALSE(Holds(0));
-    EXPECT_TRUE(Holds(4));
-}
-
-TEST_F(SharedVideoFrameCacheTest, RetrieveRefreshesRecencyWithinAPriority)
-{
-    mCache.InsertIntoCache(MakeFrame(0), KeyFor(0), 0);
-    mCache.InsertIntoCache(MakeFrame(1), KeyFor(1), 0);
-    mCache.InsertIntoCache(MakeFrame(2), KeyFor(2), 0);
-    ASSERT_TRUE(mCache.RetrieveFromCache(KeyFor(0))); // 0 is now the most recent
-    mCache.InsertIntoCache(MakeFrame(3), KeyFor(3), 0);
-    const auto after = mCache.GetStatistics();
-    EXPECT_EQ(after.mEvictions, 1u);
-    EXPECT_FALSE(Holds(1));
-    EXPECT_TRUE(Holds(0));
-    EXPECT_TRUE(Holds(2));
-    EXPECT_TRUE(Holds(3));
+    Insert(0, VF::kCachePriority_High);
+    Insert(1, VF::kCachePriority_Low);
+    Insert(2, VF::kCachePriority_High);
+    Insert(3, VF::kCachePriority_High);
+    // The only low-priority frame goes, though not the oldest; retrieving 0, 2, 3 in that
+    // order leaves 0 the least recently used, so it goes next.
+    EXPECT_EQ(Held(4), (std::vector<uint32_t>{0, 2, 3}));
+    EXPECT_EQ(std::get<4>(Counts(mCache)), 1u);
+    Insert(4, VF::kCachePriority_High);
+    EXPECT_EQ(Held(5), (std::vector<uint32_t>{2, 3, 4}));
+    // Within one priority a retrieval refreshes recency: 2 was retrieved before 3 and 4, but
+    // is retrieved again now, so 3 goes.
+    ASSERT_TRUE(mCache.RetrieveFromCache(KeyFor(2)));
+    Insert(5, VF::kCachePriority_High);
+    EXPECT_EQ(Held(6), (std::vector<uint32_t>{2, 4, 5}));
 }
 
 TEST_F(SharedVideoFrameCacheTest, BudgetHoldsAfterEveryInsertion)
@@ -113,37 +107,31 @@ TEST_F(SharedVideoFrameCacheTest, BudgetHoldsAfterEveryInsertion)
     VF::VideoFrameCache cache(10 * kFrameBytes + 100, true);
     for (uint32_t i = 0; i < 200; ++i)
     {
-        // Frames of 1, 2 and 3 units (64 x 16, 32, 48 rows).
-        const uint32_t rows = 16 * (1 + i % 3);
-        FrameRef frame = VF::CreateVideoFrame(mt::kPixelFormat_BGRA_4444_8u, 64, rows,
-                                              mt::kPixelAspectRatio_Square, false, false);
-        cache.InsertIntoCache(frame, KeyFor(i), (i % 4 == 0) ? 10 : 0);
-        const auto statistics = cache.GetStatistics();
-        ASSERT_LE(statistics.mBytes, cache.GetByteBudget()) << i;
+        // Frames of 1, 2 and 3 units; every fourth of priority 10 and so never evicted first.
+        cache.InsertIntoCache(MakeTagged(0, 1 + i % 3), KeyFor(i), (i % 4 == 0) ? 10 : 0);
+        ASSERT_LE(cache.GetStatistics().mBytes, cache.GetByteBudget()) << i;
         ASSERT_TRUE(cache.RetrieveFromCache(KeyFor(i)) || i % 4 != 0) << i;
     }
-    const auto statistics = cache.GetStatistics();
-    EXPECT_EQ(statistics.mInsertions, 200u);
-    EXPECT_GT(statistics.mEvictions, 150u);
+    EXPECT_EQ(cache.GetStatistics().mInsertions, 200u);
+    EXPECT_GT(cache.GetStatistics().mEvictions, 150u);
     cache.SetByteBudget(2 * kFrameBytes);
     EXPECT_LE(cache.GetStatistics().mBytes, 2 * kFrameBytes);
 }
 
-TEST_F(SharedVideoFrameCacheTest, FrameHeldElsewhereSurvivesEviction)
+TEST_F(SharedVideoFrameCacheTest, FrameHeldElsewhereSurvivesEvictionAndClear)
 {
-    FrameRef held = MakeFrame(42);
+    const Frame held = MakeTagged(42);
     mCache.InsertIntoCache(held, KeyFor(0), 0);
     for (uint32_t i = 1; i <= 5; ++i)
-        mCache.InsertIntoCache(MakeFrame(uint8_t(i)), KeyFor(i), 0);
-    EXPECT_FALSE(Holds(0));
+        Insert(i, 0);
+    EXPECT_EQ(Held(1), std::vector<uint32_t>{});
     // The cache dropped only its own reference: ours is the last one.
-    EXPECT_EQ(held->AddRef(), 2u);
-    held->Release();
+    EXPECT_EQ(ReferenceCount(held), 1u);
     EXPECT_EQ(TagOf(held), 42);
     EXPECT_TRUE(held->IsShared());
     mCache.Clear();
-    EXPECT_EQ(mCache.GetStatistics().mBytes, 0u);
-    EXPECT_EQ(mCache.GetStatistics().mFrames, 0u);
+    EXPECT_EQ(std::get<5>(Counts(mCache)), 0u);
+    EXPECT_EQ(std::get<6>(Counts(mCache)), 0u);
     EXPECT_EQ(TagOf(held), 42);
 }
 
@@ -154,108 +142,92 @@ TEST_F(SharedVideoFrameCacheTest, DependencyPinsAFrameUntilUnregistered)
     mCache.RegisterDependencyOnFrame(KeyFor(0));
     EXPECT_EQ(mCache.GetDependencyCount(KeyFor(0)), 2u);
     EXPECT_FALSE(mCache.RetrieveFromCache(KeyFor(0)));
-    mCache.InsertIntoCache(MakeFrame(0), KeyFor(0), 0);
+    Insert(0, 0);
     for (uint32_t i = 1; i <= 6; ++i)
-        mCache.InsertIntoCache(MakeFrame(uint8_t(i)), KeyFor(i), 10);
-    EXPECT_TRUE(Holds(0)); // low priority and oldest, yet pinned
+        Insert(i, 10);
+    EXPECT_EQ(Held(1), std::vector<uint32_t>{0}); // low priority and oldest, yet pinned
     mCache.UnregisterDependencyOnFrame(KeyFor(0));
-    EXPECT_TRUE(Holds(0)); // still one dependency
     EXPECT_EQ(mCache.GetDependencyCount(KeyFor(0)), 1u);
+    EXPECT_EQ(Held(1), std::vector<uint32_t>{0}); // still one dependency
     mCache.UnregisterDependencyOnFrame(KeyFor(0));
     EXPECT_EQ(mCache.GetDependencyCount(KeyFor(0)), 0u);
-    mCache.InsertIntoCache(MakeFrame(7), KeyFor(7), 10);
-    EXPECT_FALSE(Holds(0));
+    Insert(7, 10);
+    EXPECT_EQ(Held(1), std::vector<uint32_t>{});
     EXPECT_LE(mCache.GetStatistics().mBytes, mCache.GetByteBudget());
 }
 
-TEST_F(SharedVideoFrameCacheTest, PinnedFramesMayExceedTheBudgetUntilUnpinned)
+TEST_F(SharedVideoFrameCacheTest, PinnedFramesMayExceedTheBudgetUntilUnpinnedAndSurviveClear)
 {
     for (uint32_t i = 0; i < 4; ++i)
     {
         mCache.RegisterDependencyOnFrame(KeyFor(i));
-        mCache.InsertIntoCache(MakeFrame(uint8_t(i)), KeyFor(i), 0);
+        Insert(i, 0);
     }
-    EXPECT_EQ(mCache.GetStatistics().mBytes, 4 * kFrameBytes);
-    mCache.UnregisterDependencyOnFrame(KeyFor(2));
+    EXPECT_EQ(std::get<5>(Counts(mCache)), 4 * kFrameBytes);
     // Unpinning restores the budget at once.
-    EXPECT_EQ(mCache.GetStatistics().mBytes, 3 * kFrameBytes);
-    EXPECT_FALSE(Holds(2));
-    for (uint32_t i : {0u, 1u, 3u})
-        mCache.UnregisterDependencyOnFrame(KeyFor(i));
-}
-
-TEST_F(SharedVideoFrameCacheTest, ClearKeepsRegisteredDependencies)
-{
-    mCache.RegisterDependencyOnFrame(KeyFor(0));
-    mCache.InsertIntoCache(MakeFrame(0), KeyFor(0), 0);
+    mCache.UnregisterDependencyOnFrame(KeyFor(2));
+    EXPECT_EQ(std::get<5>(Counts(mCache)), 3 * kFrameBytes);
+    EXPECT_EQ(Held(4), (std::vector<uint32_t>{0, 1, 3}));
+    // Clear drops the frames but keeps the registered dependencies.
     mCache.Clear();
-    EXPECT_FALSE(Holds(0));
-    EXPECT_EQ(mCache.GetDependencyCount(KeyFor(0)), 1u);
-    mCache.UnregisterDependencyOnFrame(KeyFor(0));
+    EXPECT_EQ(Held(4), std::vector<uint32_t>{});
+    for (uint32_t i : {0u, 1u, 3u})
+    {
+        EXPECT_EQ(mCache.GetDependencyCount(KeyFor(i)), 1u);
+        mCache.UnregisterDependencyOnFrame(KeyFor(i));
+    }
 }
 
 TEST_F(SharedVideoFrameCacheTest, FrameLargerThanTheBudgetIsNotStoredButNotified)
 {
     VF::VideoFrameCache cache(kFrameBytes, true);
-    int notified = 0;
-    cache.SetNotificationFunction(
-        [&](const Guid& inKey)
-        {
-            EXPECT_EQ(inKey, KeyFor(9));
-            ++notified;
-        });
-    FrameRef big = VF::CreateVideoFrame(mt::kPixelFormat_BGRA_4444_8u, 64, 17,
-                                        mt::kPixelAspectRatio_Square, false, false);
-    cache.InsertIntoCache(big, KeyFor(9), 10);
-    EXPECT_EQ(notified, 1);
+    std::vector<Guid> notified;
+    cache.SetNotificationFunction([&](const Guid& inKey) { notified.push_back(inKey); });
+    cache.InsertIntoCache(MakeFrame(mt::kPixelFormat_BGRA_4444_8u, 64, 17), KeyFor(9), 10);
+    EXPECT_EQ(notified, std::vector<Guid>{KeyFor(9)});
     EXPECT_FALSE(cache.RetrieveFromCache(KeyFor(9)));
-    EXPECT_EQ(cache.GetStatistics().mRefused, 1u);
-    EXPECT_EQ(cache.GetStatistics().mBytes, 0u);
+    EXPECT_EQ(Counts(cache), (Expected{0, 1, 0, 1, 0, 0, 0}));
 }
 
 TEST_F(SharedVideoFrameCacheTest, BadInputIsAContractError)
 {
-    EXPECT_INPUT_CONTRACT(mCache.InsertIntoCache(FrameRef(), KeyFor(0), 0), "inFrame != nullptr");
-    EXPECT_INPUT_CONTRACT(mCache.InsertIntoCache(MakeFrame(0), Guid(), 0), "!inKey.IsNil()");
-    EXPECT_INPUT_CONTRACT(mCache.InsertIntoCache(MakeFrame(0), KeyFor(0), -1), "inPriority >= 0");
+    EXPECT_INPUT_CONTRACT(mCache.InsertIntoCache(Frame(), KeyFor(0), 0), "inFrame != nullptr");
+    EXPECT_INPUT_CONTRACT(mCache.InsertIntoCache(MakeTagged(0), Guid(), 0), "!inKey.IsNil()");
+    EXPECT_INPUT_CONTRACT(mCache.InsertIntoCache(MakeTagged(0), KeyFor(0), -1), "inPriority >= 0");
     EXPECT_INPUT_CONTRACT(mCache.RetrieveFromCache(Guid()), "!inKey.IsNil()");
     EXPECT_INPUT_CONTRACT(mCache.RegisterDependencyOnFrame(Guid()), "!inKey.IsNil()");
     EXPECT_INPUT_CONTRACT(mCache.UnregisterDependencyOnFrame(KeyFor(3)), "registered");
     // Nothing was stored or lost.
-    const auto statistics = mCache.GetStatistics();
-    EXPECT_EQ(statistics.mInsertions, 0u);
-    EXPECT_EQ(statistics.mBytes, 0u);
+    EXPECT_EQ(Counts(mCache), (Expected{0, 0, 0, 0, 0, 0, 0}));
     EXPECT_EQ(mCache.GetDependencyCount(KeyFor(3)), 0u);
 }
 
 TEST_F(SharedVideoFrameCacheTest, NotificationRunsOncePerInsertionAndMayReenterTheCache)
 {
     std::vector<Guid> keys;
-    bool hitInsideNotification = false;
+    std::vector<bool> retrievable;
     mCache.SetNotificationFunction(
         [&](const Guid& inKey)
         {
             keys.push_back(inKey);
             // The frame is retrievable by the time the notification runs.
-            hitInsideNotification = bool(mCache.RetrieveFromCache(inKey));
+            retrievable.push_back(bool(mCache.RetrieveFromCache(inKey)));
             if (inKey == KeyFor(0))
-                mCache.InsertIntoCache(MakeFrame(1), KeyFor(1), 0);
+                Insert(1, 0);
         });
-    mCache.InsertIntoCache(MakeFrame(0), KeyFor(0), 0);
-    ASSERT_EQ(keys.size(), 2u);
-    EXPECT_EQ(keys[0], KeyFor(0));
-    EXPECT_EQ(keys[1], KeyFor(1));
-    EXPECT_TRUE(hitInsideNotification);
+    Insert(0, 0);
+    EXPECT_EQ(keys, (std::vector<Guid>{KeyFor(0), KeyFor(1)}));
+    EXPECT_EQ(retrievable, (std::vector<bool>{true, true}));
     mCache.SetNotificationFunction(nullptr);
-    mCache.InsertIntoCache(MakeFrame(2), KeyFor(2), 0);
+    Insert(2, 0);
     EXPECT_EQ(keys.size(), 2u);
 }
 
 TEST_F(SharedVideoFrameCacheTest, NotificationIsCalledOutsideEveryLock)
 {
-    // While the notification runs, another thread uses keys of every shard,
-    // inserts past the budget (evicting) and replaces the notification. It
-    // would block forever if the inserting thread still held any cache lock.
+    // While the notification runs, another thread uses keys of every shard, inserts past the
+    // budget (evicting) and replaces the notification. It would block forever if the
+    // inserting thread still held any cache lock.
     std::atomic<int> calls{0};
     mCache.SetNotificationFunction(
         [&](const Guid&)
@@ -268,7 +240,7 @@ TEST_F(SharedVideoFrameCacheTest, NotificationIsCalledOutsideEveryLock)
                     for (uint32_t i = 100; i < 164; ++i)
                     {
                         mCache.RetrieveFromCache(KeyFor(i));
-                        mCache.InsertIntoCache(MakeFrame(uint8_t(i)), KeyFor(i), 0);
+                        Insert(i, 0);
                         mCache.RegisterDependencyOnFrame(KeyFor(i));
                         mCache.UnregisterDependencyOnFrame(KeyFor(i));
                     }
@@ -276,73 +248,66 @@ TEST_F(SharedVideoFrameCacheTest, NotificationIsCalledOutsideEveryLock)
                 });
             other.join();
         });
-    mCache.InsertIntoCache(MakeFrame(0), KeyFor(0), 0);
+    Insert(0, 0);
     EXPECT_EQ(calls.load(), 1 + 64);
-    mCache.InsertIntoCache(MakeFrame(1), KeyFor(1), 0);
+    Insert(1, 0);
     EXPECT_EQ(calls.load(), 1 + 64 + 1);
 }
 
 TEST_F(SharedVideoFrameCacheTest, ConcurrentInsertAndRetrieveStayConsistent)
 {
     VF::VideoFrameCache cache(40 * kFrameBytes, true);
-    std::atomic<uint64_t> notifications{0};
-    cache.SetNotificationFunction([&](const Guid&) { notifications.fetch_add(1); });
-    constexpr int kThreads = 4;
-    constexpr uint32_t kOperations = 3000;
     constexpr uint32_t kKeys = 120;
-    std::atomic<uint64_t> retrieves{0};
-    std::atomic<uint64_t> inserts{0};
-    std::atomic<uint64_t> wrongFrames{0};
-    std::vector<std::thread> threads;
-    for (int t = 0; t < kThreads; ++t)
+    std::atomic<uint64_t> notifications{0}, retrieves{0}, inserts{0}, wrongFrames{0};
+    cache.SetNotificationFunction([&](const Guid&) { ++notifications; });
+    auto retrieve = [&](uint32_t inKey)
     {
+        if (const Frame frame = cache.RetrieveFromCache(KeyFor(inKey)))
+            wrongFrames += TagOf(frame) != uint8_t(inKey);
+        ++retrieves;
+    };
+    std::vector<std::thread> threads;
+    for (uint32_t t = 0; t < 4; ++t)
         threads.emplace_back(
             [&, t]
             {
-                uint32_t state = 12345u + uint32_t(t) * 7919u;
-                for (uint32_t n = 0; n < kOperations; ++n)
+                uint32_t state = 12345u + t * 7919u;
+                for (uint32_t n = 0; n < 3000; ++n)
                 {
                     state = state * 1664525u + 1013904223u;
-                    const uint32_t key = (state >> 8) % kKeys;
-                    switch ((state >> 20) % 4)
+                    const uint32_t key = (state >> 8) % kKeys, action = (state >> 20) % 4;
+                    if (action == 0)
                     {
-                    case 0:
-                        cache.InsertIntoCache(MakeFrame(uint8_t(key)), KeyFor(key), (key % 2) * 10);
-                        inserts.fetch_add(1);
-                        break;
-                    case 1:
-                        cache.RegisterDependencyOnFrame(KeyFor(key));
-                        if (FrameRef frame = cache.RetrieveFromCache(KeyFor(key)))
-                            wrongFrames += TagOf(frame) != uint8_t(key);
-                        cache.UnregisterDependencyOnFrame(KeyFor(key));
-                        retrieves.fetch_add(1);
-                        break;
-                    default:
-                        if (FrameRef frame = cache.RetrieveFromCache(KeyFor(key)))
-                            wrongFrames += TagOf(frame) != uint8_t(key);
-                        retrieves.fetch_add(1);
-                        break;
+                        cache.InsertIntoCache(MakeTagged(uint8_t(key)), KeyFor(key),
+                                              (key % 2) * 10);
+                        ++inserts;
+                        continue;
                     }
+                    if (action == 1)
+                        cache.RegisterDependencyOnFrame(KeyFor(key));
+                    retrieve(key);
+                    if (action == 1)
+                        cache.UnregisterDependencyOnFrame(KeyFor(key));
                 }
             });
-    }
     for (auto& thread : threads)
         thread.join();
-    const auto statistics = cache.GetStatistics();
+    const auto [hits, misses, insertions, refused, evictions, bytes, frames] = Counts(cache);
     EXPECT_EQ(wrongFrames.load(), 0u);
-    EXPECT_EQ(statistics.mHits + statistics.mMisses, retrieves.load());
-    EXPECT_EQ(statistics.mInsertions, inserts.load());
+    EXPECT_EQ(hits + misses, retrieves.load());
+    EXPECT_EQ(insertions, inserts.load());
     EXPECT_EQ(notifications.load(), inserts.load());
-    EXPECT_LE(statistics.mBytes, cache.GetByteBudget());
-    EXPECT_EQ(statistics.mBytes, statistics.mFrames * kFrameBytes);
-    EXPECT_GT(statistics.mEvictions, 0u);
-    // Every dependency was balanced.
-    for (uint32_t key = 0; key < kKeys; ++key)
-        EXPECT_EQ(cache.GetDependencyCount(KeyFor(key)), 0u);
+    EXPECT_LE(bytes, cache.GetByteBudget());
+    EXPECT_EQ(bytes, frames * kFrameBytes);
+    EXPECT_GT(evictions, 0u);
+    // Every dependency was balanced, and the frames counted are the frames held.
     uint64_t held = 0;
     for (uint32_t key = 0; key < kKeys; ++key)
+    {
+        EXPECT_EQ(cache.GetDependencyCount(KeyFor(key)), 0u);
         held += bool(cache.RetrieveFromCache(KeyFor(key)));
-    EXPECT_EQ(held, statistics.mFrames);
+    }
+    EXPECT_EQ(held, frames);
 }
 
 TEST_F(SharedVideoFrameCacheTest, EnvironmentSwitchTurnsTheCacheOff)
@@ -350,24 +315,20 @@ TEST_F(SharedVideoFrameCacheTest, EnvironmentSwitchTurnsTheCacheOff)
     ASSERT_EQ(setenv("VF_DISABLE_FRAME_CACHE", "1", 1), 0);
     VF::VideoFrameCache disabled;
     ASSERT_EQ(setenv("VF_DISABLE_FRAME_CACHE", "0", 1), 0);
-    VF::VideoFrameCache enabledByZero;
+    const VF::VideoFrameCache enabledByZero;
     ASSERT_EQ(unsetenv("VF_DISABLE_FRAME_CACHE"), 0);
-    VF::VideoFrameCache enabled;
     EXPECT_FALSE(disabled.IsEnabled());
     EXPECT_TRUE(enabledByZero.IsEnabled());
-    EXPECT_TRUE(enabled.IsEnabled());
-
+    EXPECT_TRUE(VF::VideoFrameCache().IsEnabled());
+    // A disabled cache still marks and notifies, and stores nothing.
     int notified = 0;
     disabled.SetNotificationFunction([&](const Guid&) { ++notified; });
-    FrameRef frame = MakeFrame(5);
+    const Frame frame = MakeTagged(5);
     disabled.InsertIntoCache(frame, KeyFor(5), 10);
     EXPECT_TRUE(frame->IsShared());
     EXPECT_EQ(notified, 1);
     EXPECT_FALSE(disabled.RetrieveFromCache(KeyFor(5)));
-    const auto statistics = disabled.GetStatistics();
-    EXPECT_EQ(statistics.mMisses, 1u);
-    EXPECT_EQ(statistics.mRefused, 1u);
-    EXPECT_EQ(statistics.mBytes, 0u);
+    EXPECT_EQ(Counts(disabled), (Expected{0, 1, 0, 1, 0, 0, 0}));
 }
 
 TEST_F(SharedVideoFrameCacheTest, ProcessWideCacheServesTheStaticFunctions)
@@ -377,7 +338,7 @@ TEST_F(SharedVideoFrameCacheTest, ProcessWideCacheServesTheStaticFunctions)
     EXPECT_GT(instance.GetByteBudget(), 0u);
     EXPECT_LE(instance.GetByteBudget(), size_t{4} << 30);
     const Guid key("{0f1e2d3c-4b5a-6978-8796-a5b4c3d2e1f0}");
-    FrameRef frame = MakeFrame(3);
+    const Frame frame = MakeTagged(3);
     VF::SharedVideoFrameCache::InsertIntoCache(frame, key, 10);
     EXPECT_EQ(VF::SharedVideoFrameCache::RetrieveFromCache(key).Get(), frame.Get());
     VF::SharedVideoFrameCache::Clear();
