@@ -2,8 +2,9 @@
 # builds only what it runs, and runs it.
 JOBS ?= $(shell nproc)
 CMAKE_GEN := -G Ninja
+PREFIX ?= /usr/local
 
-.PHONY: all deps build test asan tsan coverage release clang bench demo format format-check clean
+.PHONY: all deps build test asan tsan coverage release clang bench demo install install-check format format-check clean
 
 all: build
 
@@ -72,6 +73,19 @@ bench: deps build/build.ninja
 	cmake --build build -j $(JOBS)
 	scripts/run-benchmarks build
 
+# Build the libraries and vrender (Release) and install them under $(PREFIX),
+# with the headers, the CMake package and videorenderer.pc.
+install: deps
+	cmake -S . -B build-install $(CMAKE_GEN) -DCMAKE_BUILD_TYPE=Release -DVR_BUILD_TESTS=OFF \
+	  -DVR_BUILD_BENCH=OFF -DCMAKE_INSTALL_PREFIX=$(PREFIX)
+	cmake --build build-install -j $(JOBS)
+	cmake --install build-install
+
+# Install into a temporary prefix and build and run a program against it,
+# through find_package and through pkg-config.
+install-check: deps
+	scripts/check-install build-install
+
 format:
 	git ls-files '*.h' '*.cpp' | xargs clang-format -i
 
@@ -79,4 +93,4 @@ format-check:
 	git ls-files '*.h' '*.cpp' | xargs clang-format --dry-run --Werror
 
 clean:
-	rm -rf build build-asan build-tsan build-coverage build-release build-clang
+	rm -rf build build-asan build-tsan build-coverage build-release build-clang build-install

@@ -21,14 +21,20 @@ endif()
 
 # vr_add_library(NAME <sources...>): a host or module library with its public
 # headers in include/ and its private ones beside the sources in src/.
-# The target is NAME with the alias VR::NAME.
+# The target is NAME with the aliases VR::NAME and VideoRenderer::NAME (the
+# name the installed package gives it). It is installed with its headers
+# (cmake/VRInstall.cmake); its users need C++20.
 function(vr_add_library NAME)
     add_library(${NAME} SHARED ${ARGN})
     add_library(VR::${NAME} ALIAS ${NAME})
+    add_library(VideoRenderer::${NAME} ALIAS ${NAME})
     target_include_directories(${NAME}
         PUBLIC $<BUILD_INTERFACE:${CMAKE_CURRENT_SOURCE_DIR}/include>
+               $<INSTALL_INTERFACE:${VR_INSTALL_INCLUDEDIR}>
         PRIVATE ${CMAKE_CURRENT_SOURCE_DIR}/src)
+    target_compile_features(${NAME} PUBLIC cxx_std_20)
     set_target_properties(${NAME} PROPERTIES OUTPUT_NAME vr_${NAME})
+    vr_install_library(${NAME})
 endfunction()
 
 # vr_add_test(NAME SOURCES <files...> LIBS <targets...> [THREADED])
