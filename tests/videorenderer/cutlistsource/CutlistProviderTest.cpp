@@ -83,33 +83,37 @@ TEST_F(CutlistProviderTest, GettersAnswerTheCutlistsOfTheNameOrTheDefaultSet)
     EXPECT_EQ(mProvider->GetMainCutlist(mSequence, true), fallback);
     mProvider->RemoveCutlists(QRT::ImmutableString::CreateStatic("never registered"));
     EXPECT_EQ(mProvider->GetMainCutlist(other, true), fallback);
-}
 
-TEST_F(CutlistProviderTest, SetCutlistsReplacesTheSetOfThatName)
-{
-    const auto first = NewCutlist("first");
-    const auto second = NewCutlist("second");
-    mProvider->SetCutlists(mSequence, {first, first, first});
-    mProvider->SetCutlists(mSequence, {second, {}, {}});
-    EXPECT_EQ(mProvider->GetMainCutlist(mSequence, true), second);
+    // Setting a name's cutlists replaces its whole set.
+    mProvider->SetCutlists(mSequence, {main, main, main});
+    mProvider->SetCutlists(mSequence, {third, {}, {}});
+    EXPECT_EQ(mProvider->GetMainCutlist(mSequence, true), third);
     EXPECT_FALSE(mProvider->GetAlternateCutlist(mSequence, true));
     EXPECT_FALSE(mProvider->GetThirdCutlist(mSequence, true));
 }
 
 TEST_F(CutlistProviderTest, BadSettingsBreakTheContractAndChangeNothing)
 {
-    BE::CutlistProviderSettings inverted = Settings(720, 576);
-    inverted.mLeft = 800;
-    EXPECT_INPUT_CONTRACT(mProvider->SetSettings(inverted),
-                          "inSettings.mRight >= inSettings.mLeft");
-    BE::CutlistProviderSettings upsideDown = Settings(720, -1);
-    EXPECT_INPUT_CONTRACT(mProvider->SetSettings(upsideDown),
-                          "inSettings.mBottom >= inSettings.mTop");
-    BE::CutlistProviderSettings badField = Settings(720, 576);
-    badField.mFieldType = mvxmediatypes::kFieldType_Invalid;
-    EXPECT_INPUT_CONTRACT(mProvider->SetSettings(badField),
-                          "inSettings.mFieldType >= mvxmediatypes::kFieldType_Progressive && "
-                          "inSettings.mFieldType <= mvxmediatypes::kFieldType_AsSource");
+    const struct
+    {
+        void (*mBreak)(BE::CutlistProviderSettings&);
+        const char* mExpression;
+    } cases[] = {
+        {[](BE::CutlistProviderSettings& ioSettings) { ioSettings.mLeft = 800; },
+         "inSettings.mRight >= inSettings.mLeft"},
+        {[](BE::CutlistProviderSettings& ioSettings) { ioSettings.mBottom = -1; },
+         "inSettings.mBottom >= inSettings.mTop"},
+        {[](BE::CutlistProviderSettings& ioSettings)
+         { ioSettings.mFieldType = mvxmediatypes::kFieldType_Invalid; },
+         "inSettings.mFieldType >= mvxmediatypes::kFieldType_Progressive && "
+         "inSettings.mFieldType <= mvxmediatypes::kFieldType_AsSource"},
+    };
+    for (const auto& testCase : cases)
+    {
+        BE::CutlistProviderSettings settings = Settings(720, 576);
+        testCase.mBreak(settings);
+        EXPECT_INPUT_CONTRACT(mProvider->SetSettings(settings), testCase.mExpression);
+    }
     BE::CutlistProviderSettings badRatio = Settings(720, 576);
     badRatio.mPixelAspectRatio = mvxmediatypes::kPixelAspectRatio_Any;
     EXPECT_INPUT_CONTRACT(BE::CreateCutlistProvider(badRatio),
