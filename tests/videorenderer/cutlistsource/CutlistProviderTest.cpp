@@ -7,6 +7,7 @@
 #include <thread>
 #include <vector>
 
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 namespace
@@ -45,12 +46,9 @@ TEST_F(CutlistProviderTest, PropertiesAnswerTheSettingsThroughTheirInterface)
 {
     const auto properties = QRT::QueryRef<MF::IRenderableCutlistProviderProperties>(mProvider);
     ASSERT_TRUE(properties);
-    std::int32_t left = -1, top = -1, right = -1, bottom = -1;
-    properties->GetBounds(left, top, right, bottom);
-    EXPECT_EQ(left, 0);
-    EXPECT_EQ(top, 0);
-    EXPECT_EQ(right, 720);
-    EXPECT_EQ(bottom, 576);
+    std::int32_t bounds[4] = {-1, -1, -1, -1};
+    properties->GetBounds(bounds[0], bounds[1], bounds[2], bounds[3]);
+    EXPECT_THAT(bounds, ::testing::ElementsAre(0, 0, 720, 576));
     EXPECT_EQ(properties->GetPixelAspectRatio(), mvxmediatypes::kPixelAspectRatio_D1PAL);
     EXPECT_EQ(properties->GetFieldType(), mvxmediatypes::kFieldType_LowerFirst);
     EXPECT_EQ(properties->GetFrameRate(), mvxmediatypes::kFrameRate_Video25);
@@ -94,26 +92,18 @@ TEST_F(CutlistProviderTest, GettersAnswerTheCutlistsOfTheNameOrTheDefaultSet)
 
 TEST_F(CutlistProviderTest, BadSettingsBreakTheContractAndChangeNothing)
 {
-    const struct
-    {
-        void (*mBreak)(BE::CutlistProviderSettings&);
-        const char* mExpression;
-    } cases[] = {
-        {[](BE::CutlistProviderSettings& ioSettings) { ioSettings.mLeft = 800; },
-         "inSettings.mRight >= inSettings.mLeft"},
-        {[](BE::CutlistProviderSettings& ioSettings) { ioSettings.mBottom = -1; },
-         "inSettings.mBottom >= inSettings.mTop"},
-        {[](BE::CutlistProviderSettings& ioSettings)
-         { ioSettings.mFieldType = mvxmediatypes::kFieldType_Invalid; },
-         "inSettings.mFieldType >= mvxmediatypes::kFieldType_Progressive && "
-         "inSettings.mFieldType <= mvxmediatypes::kFieldType_AsSource"},
-    };
-    for (const auto& testCase : cases)
-    {
-        BE::CutlistProviderSettings settings = Settings(720, 576);
-        testCase.mBreak(settings);
-        EXPECT_INPUT_CONTRACT(mProvider->SetSettings(settings), testCase.mExpression);
-    }
+    BE::CutlistProviderSettings inverted = Settings(720, 576);
+    inverted.mLeft = 800;
+    EXPECT_INPUT_CONTRACT(mProvider->SetSettings(inverted),
+                          "inSettings.mRight >= inSettings.mLeft");
+    BE::CutlistProviderSettings upsideDown = Settings(720, -1);
+    EXPECT_INPUT_CONTRACT(mProvider->SetSettings(upsideDown),
+                          "inSettings.mBottom >= inSettings.mTop");
+    BE::CutlistProviderSettings badField = Settings(720, 576);
+    badField.mFieldType = mvxmediatypes::kFieldType_Invalid;
+    EXPECT_INPUT_CONTRACT(mProvider->SetSettings(badField),
+                          "inSettings.mFieldType >= mvxmediatypes::kFieldType_Progressive && "
+                          "inSettings.mFieldType <= mvxmediatypes::kFieldType_AsSource");
     BE::CutlistProviderSettings badRatio = Settings(720, 576);
     badRatio.mPixelAspectRatio = mvxmediatypes::kPixelAspectRatio_Any;
     EXPECT_INPUT_CONTRACT(BE::CreateCutlistProvider(badRatio),
