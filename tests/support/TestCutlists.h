@@ -1,8 +1,8 @@
 #pragma once
 
 // A cutlist of one segment onto a test node, whose node lookup can be made to
-// fail, and cutlist providers that record their getter calls, with or
-// without the sequence description. Getters may be called from any thread.
+// fail, and a cutlist provider that records its getter calls (from any
+// thread).
 
 #include "MF/RenderableCutlist.h"
 #include "MF/RenderableCutlistProvider.h"
@@ -74,11 +74,9 @@ struct GetterCall
     bool mFlag = false;
 };
 
-// Answers mCutlists[0..2] from the main, alternate and third getters and
-// records each call. Interfaces... are further interfaces a subclass answers.
-template <class... Interfaces>
-class RecordingCutlistProvider
-    : public QRT::Implements<MF::IRenderableCutlistProvider, Interfaces...>
+// A provider without the sequence description that answers mCutlists[0..2]
+// from the main, alternate and third getters and records each call.
+class BareCutlistProvider : public QRT::Implements<MF::IRenderableCutlistProvider>
 {
 public:
     CutlistRef mCutlists[3];
@@ -101,13 +99,6 @@ public:
         std::lock_guard lock(mMutex);
         return mCalls;
     }
-    int CallCount(int inWhich)
-    {
-        int count = 0;
-        for (const GetterCall& call : Calls())
-            count += call.mWhich == inWhich ? 1 : 0;
-        return count;
-    }
 
 private:
     CutlistRef Record(int inWhich, const QRT::ImmutableString& inName, bool inFlag)
@@ -120,35 +111,6 @@ private:
     // Guards mCalls.
     std::mutex mMutex;
     std::vector<GetterCall> mCalls;
-};
-
-// A recording provider without the sequence description.
-using BareCutlistProvider = RecordingCutlistProvider<>;
-
-// A recording provider describing a 64 x 32, square-pixel, 25 fps sequence
-// of the field type mFieldType.
-class TestCutlistProvider
-    : public RecordingCutlistProvider<MF::IRenderableCutlistProviderProperties>
-{
-public:
-    mvxmediatypes::FieldType mFieldType = mvxmediatypes::kFieldType_AsSource;
-
-    void GetBounds(std::int32_t& outLeft, std::int32_t& outTop, std::int32_t& outRight,
-                   std::int32_t& outBottom) const override
-    {
-        outLeft = outTop = 0;
-        outRight = 64;
-        outBottom = 32;
-    }
-    mvxmediatypes::PixelAspectRatio GetPixelAspectRatio() const override
-    {
-        return mvxmediatypes::kPixelAspectRatio_Square;
-    }
-    mvxmediatypes::FieldType GetFieldType() const override { return mFieldType; }
-    mvxmediatypes::FrameRate GetFrameRate() const override
-    {
-        return mvxmediatypes::kFrameRate_Video25;
-    }
 };
 
 } // namespace vrtest

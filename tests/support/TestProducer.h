@@ -58,13 +58,12 @@ public:
     std::atomic<int> mProduceCount{0};
     std::atomic<int> mHashCount{0};
 
-    QRT::Result ProduceFrame(const MF::FrameTime& inTime, const ML::CutlistRenderParams& inParams,
+    QRT::Result ProduceFrame(const MF::FrameTime&, const ML::CutlistRenderParams& inParams,
                              FrameRef& outFrame) override
     {
         ++mProduceCount;
         {
             std::lock_guard lock(mMutex);
-            mLastTime = inTime;
             mLastParams = inParams;
             // The node may be the provider that owns this producer: keeping it
             // would make a cycle.
@@ -120,16 +119,10 @@ public:
         std::lock_guard lock(mMutex);
         return mLastParams;
     }
-    MF::FrameTime LastTime()
-    {
-        std::lock_guard lock(mMutex);
-        return mLastTime;
-    }
 
 private:
-    // Guards mLastTime and mLastParams.
+    // Guards mLastParams.
     std::mutex mMutex;
-    MF::FrameTime mLastTime;
     ML::CutlistRenderParams mLastParams;
 };
 

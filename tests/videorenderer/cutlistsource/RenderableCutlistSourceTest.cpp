@@ -257,7 +257,6 @@ TEST_F(RenderableCutlistSourceTest, RenderSizeFollowsFieldTypeAndQuality)
         EXPECT_EQ(seen.mFieldType, testCase.mExpectedFieldType);
         EXPECT_EQ(seen.mFrameRate, mvxmediatypes::kFrameRate_Video25);
         EXPECT_EQ(seen.GetFrameTime(), time);
-        EXPECT_EQ(ProducerOf(mNodes[0]).LastTime(), time);
         EXPECT_EQ(mFrame->GetBounds(),
                   QRT::ParamRect(0, 0, static_cast<std::int32_t>(testCase.mExpectedWidth),
                                  static_cast<std::int32_t>(testCase.mExpectedHeight)));

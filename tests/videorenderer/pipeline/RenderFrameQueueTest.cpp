@@ -293,56 +293,49 @@ TEST_F(RenderFrameQueueTest, CachedKeyIsServedWithoutRendering)
     EXPECT_EQ(producer->mProduceCount.load(), 1);
 }
 
-TEST_F(RenderFrameQueueTest, CancellingAcceleratedRequestDeliversAtOnceAndIgnoresLateAnswer)
-{
-    auto renderer = QRT::Allocated<TestAcceleratedRenderer>::CreateInstance();
-    auto settings = MakeSettings(21, NewProducer(1));
-    settings.mAcceleratedRenderer = renderer;
-    Add(settings);
-    ASSERT_EQ(renderer->mInitiated, std::vector<std::uint32_t>{21});
-    EXPECT_TRUE(renderer->mLastRenderBothFields);
-    EXPECT_EQ(Stats().mAccelerated, 1u);
-
-    mQueue->CancelOne(21);
-    // Delivered on the cancelling thread, before CancelOne returns.
-    ASSERT_EQ(mRecorder.Count(), 1u);
-    EXPECT_EQ(mRecorder.Get()[0].mKind, Delivery::kCancelled);
-    EXPECT_EQ(mRecorder.Get()[0].mStatus, 0);
-    EXPECT_FALSE(mRecorder.Get()[0].mFrame);
-    EXPECT_EQ(renderer->mCancelled, std::vector<std::uint32_t>{21});
-
-    renderer->mClient->OnRenderFrameComplete(0, 21, TickTime(), MakeFrame(4, 4), 9);
-    renderer->mClient->OnRenderFrameError(0, 21, TickTime(), ML::kResult_RenderFailed);
-    EXPECT_EQ(mRecorder.Count(), 1u);
-    EXPECT_EQ(Stats().mAccelerated, 0u);
-}
-
-TEST_F(RenderFrameQueueTest, AcceleratedAnswerIsDeliveredWithItsMilliseconds)
+TEST_F(RenderFrameQueueTest, AcceleratedRequestIsAnsweredByItsRendererOrCancelledAtOnce)
 {
     auto renderer = QRT::Allocated<TestAcceleratedRenderer>::CreateInstance();
     auto client = QRT::Allocated<TestClient>::CreateInstance();
-    auto settings = MakeSettings(22, NewProducer(1));
-    settings.mAcceleratedRenderer = renderer;
-    settings.mClient = client;
-    mQueue->AddRenderRequest(MakeRequest(settings));
+    for (std::uint32_t id : {21u, 22u})
+    {
+        auto settings = MakeSettings(id, NewProducer(1));
+        settings.mAcceleratedRenderer = renderer;
+        settings.mClient = client;
+        Add(settings);
+    }
+    ASSERT_EQ(renderer->mInitiated, (std::vector<std::uint32_t>{21, 22}));
+    EXPECT_TRUE(renderer->mLastRenderBothFields);
+    EXPECT_EQ(Stats().mAccelerated, 2u);
+
     const auto frame = MakeFrame(4, 4);
     renderer->mClient->OnRenderFrameComplete(0, 22, TickTime(), frame, 9);
-    const auto deliveries = client->mRecorder.Get();
-    ASSERT_EQ(deliveries.size(), 1u);
-    EXPECT_EQ(deliveries[0].mMilliseconds, 9);
-    EXPECT_EQ(deliveries[0].mFrame, frame);
-}
+    ASSERT_EQ(client->mRecorder.Count(), 1u);
+    EXPECT_EQ(client->mRecorder.Get()[0].mMilliseconds, 9);
+    EXPECT_EQ(client->mRecorder.Get()[0].mFrame, frame);
 
-TEST_F(RenderFrameQueueTest, RefusedAcceleratedRenderIsRenderedByQueue)
-{
-    auto renderer = QRT::Allocated<TestAcceleratedRenderer>::CreateInstance();
+    mQueue->CancelOne(21);
+    // Delivered on the cancelling thread, before CancelOne returns.
+    ASSERT_EQ(mRecorder.Of(21).size(), 1u);
+    EXPECT_EQ(mRecorder.Of(21)[0].mKind, Delivery::kCancelled);
+    EXPECT_EQ(mRecorder.Of(21)[0].mStatus, 0);
+    EXPECT_FALSE(mRecorder.Of(21)[0].mFrame);
+    EXPECT_EQ(renderer->mCancelled, std::vector<std::uint32_t>{21});
+    // A late answer finds no request.
+    renderer->mClient->OnRenderFrameComplete(0, 21, TickTime(), frame, 9);
+    renderer->mClient->OnRenderFrameError(0, 21, TickTime(), ML::kResult_RenderFailed);
+    EXPECT_EQ(mRecorder.Count(), 2u);
+    EXPECT_EQ(client->mRecorder.Count(), 2u);
+    EXPECT_EQ(Stats().mAccelerated, 0u);
+
+    // A refused render is rendered by the queue.
     renderer->mAnswer = QRT::kResult_NotFound;
     auto producer = NewProducer(1);
     auto settings = MakeSettings(23, producer);
     settings.mAcceleratedRenderer = renderer;
     Add(settings);
-    ASSERT_TRUE(mRecorder.WaitForCount(1));
-    EXPECT_EQ(mRecorder.Get()[0].mKind, Delivery::kComplete);
+    ASSERT_TRUE(mRecorder.WaitForCount(3));
+    EXPECT_EQ(mRecorder.Of(23).at(0).mKind, Delivery::kComplete);
     EXPECT_EQ(producer->mProduceCount.load(), 1);
     EXPECT_EQ(Stats().mAccelerated, 0u);
 }

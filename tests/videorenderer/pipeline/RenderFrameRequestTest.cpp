@@ -212,14 +212,15 @@ TEST_F(RenderFrameRequestTest, CutlistChoiceSelectsGetterAndIsFetchedOnce)
     for (auto& cutlist : mProvider->mCutlists)
         cutlist = QRT::Allocated<TestCutlist>::CreateInstance();
     const std::uint32_t choices[] = {0, 1, 3};
-    for (int i = 0; i < 3; ++i)
+    for (std::size_t i = 0; i < 3; ++i)
     {
         auto settings = CutlistSettings(1);
         settings.mCutlistChoice = choices[i];
         ML::RenderFrameRequest request = MakeRequest(settings);
         EXPECT_EQ(request.GetRenderCutlist(true), mProvider->mCutlists[i]);
         EXPECT_EQ(request.GetRenderCutlist(true), mProvider->mCutlists[i]);
-        EXPECT_EQ(mProvider->CallCount(i), 1);
+        ASSERT_EQ(mProvider->Calls().size(), i + 1u);
+        EXPECT_EQ(mProvider->Calls().back().mWhich, static_cast<int>(i));
     }
     auto settings = CutlistSettings(1);
     settings.mCutlistChoice = 2;
