@@ -139,6 +139,8 @@ TEST_F(VideoRendererTest, TwoInitializeCallsNeedTwoShutdownCalls)
     EXPECT_EQ(ML::VideoRenderer::Initialize(), 0);
     EXPECT_EQ(ML::VideoRenderer::Initialize(), 0);
     EXPECT_EQ(ML::ModuleInternals::GetInitializationCount(), 2);
+    // The suite support library follows every call one for one.
+    EXPECT_EQ(BrambleSupport::GetInitializeCount(), 2);
     // Only the first call brought the module up.
     EXPECT_EQ(ML::RenderFrameQueue::GetConstructionCount(), mConstructions + 1);
     EXPECT_EQ(ImporterHost::GetSessionCount(), mSessions + 1);
@@ -147,6 +149,7 @@ TEST_F(VideoRendererTest, TwoInitializeCallsNeedTwoShutdownCalls)
 
     EXPECT_EQ(ML::VideoRenderer::Shutdown(), 0);
     EXPECT_EQ(ML::ModuleInternals::GetInitializationCount(), 1);
+    EXPECT_EQ(BrambleSupport::GetInitializeCount(), 1);
     // Still up: the queue is running and the importer host open.
     EXPECT_FALSE(ML::IsRenderModuleShuttingDown());
     EXPECT_TRUE(ImporterHost::IsSessionOpen());
@@ -157,20 +160,6 @@ TEST_F(VideoRendererTest, TwoInitializeCallsNeedTwoShutdownCalls)
     EXPECT_TRUE(ML::IsRenderModuleShuttingDown());
     EXPECT_FALSE(ImporterHost::IsSessionOpen());
     EXPECT_TRUE(Asserts().empty());
-}
-
-TEST_F(VideoRendererTest, SuiteSupportCountFollowsEveryCallOneForOne)
-{
-    for (int i = 1; i <= 3; ++i)
-    {
-        ML::VideoRenderer::Initialize();
-        EXPECT_EQ(BrambleSupport::GetInitializeCount(), i);
-    }
-    for (int i = 2; i >= 0; --i)
-    {
-        ML::VideoRenderer::Shutdown();
-        EXPECT_EQ(BrambleSupport::GetInitializeCount(), i);
-    }
 }
 
 TEST_F(VideoRendererTest, UnbalancedShutdownLeavesEverythingAsItWasAndReports)
@@ -200,26 +189,23 @@ TEST_F(VideoRendererTest, LastShutdownStopsTheSharedExecutorsAndInitializeReplac
     const ML::ExecutorRef normal = boost::atomic_load(&ML::sNormalPriorityRenderQueue);
     const ML::ExecutorRef video = boost::atomic_load(&ML::sVideoSourcePrefetcherQueue);
     ASSERT_TRUE(normal && video);
+    // The queue stops the render executors, the prefetch flush the prefetch
+    // executors; the next Initialize makes new ones.
+    const auto expectShutDown = [](bool inShutDown)
+    {
+        for (const ML::ExecutorRef* slot :
+             {&ML::sNormalPriorityRenderQueue, &ML::sLowPriorityRenderQueue,
+              &ML::sVideoSourcePrefetcherQueue, &ML::sImageSourcePrefetcherQueue})
+        {
+            const ML::ExecutorRef executor = boost::atomic_load(slot);
+            EXPECT_TRUE(inShutDown ? !executor || executor->IsShutDown()
+                                   : executor && !executor->IsShutDown());
+        }
+    };
     ML::VideoRenderer::Shutdown();
-    // The queue stopped the render executors, the prefetch flush the
-    // prefetch executors.
-    for (const ML::ExecutorRef* slot :
-         {&ML::sNormalPriorityRenderQueue, &ML::sLowPriorityRenderQueue,
-          &ML::sVideoSourcePrefetcherQueue, &ML::sImageSourcePrefetcherQueue})
-    {
-        const ML::ExecutorRef executor = boost::atomic_load(slot);
-        EXPECT_TRUE(!executor || executor->IsShutDown());
-    }
-
+    expectShutDown(true);
     ML::VideoRenderer::Initialize();
-    for (const ML::ExecutorRef* slot :
-         {&ML::sNormalPriorityRenderQueue, &ML::sLowPriorityRenderQueue,
-          &ML::sVideoSourcePrefetcherQueue, &ML::sImageSourcePrefetcherQueue})
-    {
-        const ML::ExecutorRef executor = boost::atomic_load(slot);
-        ASSERT_TRUE(executor);
-        EXPECT_FALSE(executor->IsShutDown());
-    }
+    expectShutDown(false);
     EXPECT_NE(boost::atomic_load(&ML::sNormalPriorityRenderQueue), normal);
     EXPECT_NE(boost::atomic_load(&ML::sVideoSourcePrefetcherQueue), video);
     ML::VideoRenderer::Shutdown();
@@ -265,13 +251,7 @@ TEST_F(VideoRendererTest, ConcurrentBalancedCallsKeepTheModuleUp)
     // The first caller held the module up throughout: one queue, one session.
     EXPECT_EQ(ML::RenderFrameQueue::GetConstructionCount(), mConstructions + 1);
     EXPECT_EQ(ImporterHost::GetSessionCount(), mSessions + 1);
-    RenderOneFrameAndCheck(1);
-    ML::VideoRenderer::Shutdown();
-}
-
-TEST_F(VideoRendererTest, EnableAcceleratedRenderingLeavesTheModuleAsItWas)
-{
-    ML::VideoRenderer::Initialize();
+    // Enabling accelerated rendering leaves the module as it was.
     ML::VideoRenderer::EnableAcceleratedRendering();
     ML::VideoRenderer::EnableAcceleratedRendering();
     EXPECT_EQ(ML::ModuleInternals::GetInitializationCount(), 1);
