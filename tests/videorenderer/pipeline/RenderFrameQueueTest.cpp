@@ -23,6 +23,7 @@
 #include <set>
 #include <string>
 #include <thread>
+#include <tuple>
 
 #include <gtest/gtest.h>
 
@@ -150,12 +151,10 @@ TEST_F(RenderFrameQueueTest, RenderedRequestIsDeliveredToClientThenCompletion)
     ASSERT_TRUE(mRecorder.WaitForCount(1));
     const auto byClient = client->mRecorder.Get();
     ASSERT_EQ(byClient.size(), 1u);
-    EXPECT_EQ(byClient[0].mKind, Delivery::kComplete);
-    EXPECT_EQ(byClient[0].mRequestID, 5u);
-    EXPECT_EQ(byClient[0].mContext, 1234);
+    EXPECT_EQ(std::tuple(byClient[0].mKind, byClient[0].mRequestID, byClient[0].mContext),
+              std::tuple(Delivery::kComplete, 5u, 1234));
     const Delivery completion = mRecorder.Get()[0];
-    EXPECT_EQ(completion.mKind, Delivery::kComplete);
-    EXPECT_EQ(completion.mStatus, 0);
+    EXPECT_EQ(std::tuple(completion.mKind, completion.mStatus), std::tuple(Delivery::kComplete, 0));
     EXPECT_EQ(completion.mFrame, byClient[0].mFrame);
     EXPECT_EQ(request.GetResult(), completion.mFrame);
     EXPECT_EQ(producer->mProduceCount.load(), 1);
@@ -317,9 +316,9 @@ TEST_F(RenderFrameQueueTest, AcceleratedRequestIsAnsweredByItsRendererOrCancelle
     mQueue->CancelOne(21);
     // Delivered on the cancelling thread, before CancelOne returns.
     ASSERT_EQ(mRecorder.Of(21).size(), 1u);
-    EXPECT_EQ(mRecorder.Of(21)[0].mKind, Delivery::kCancelled);
-    EXPECT_EQ(mRecorder.Of(21)[0].mStatus, 0);
-    EXPECT_FALSE(mRecorder.Of(21)[0].mFrame);
+    const Delivery cancelled = mRecorder.Of(21)[0];
+    EXPECT_EQ(std::tuple(cancelled.mKind, cancelled.mStatus, cancelled.mFrame.Get()),
+              std::tuple(Delivery::kCancelled, 0, nullptr));
     EXPECT_EQ(renderer->mCancelled, std::vector<std::uint32_t>{21});
     // A late answer finds no request.
     renderer->mClient->OnRenderFrameComplete(0, 21, TickTime(), frame, 9);
@@ -417,9 +416,8 @@ TEST_F(RenderFrameQueueTest, CancelByIdentifierOrCallerEndsWaitingRequestsEmptyA
     mQueue->CancelCallersRequests(this);
     ASSERT_TRUE(mRecorder.WaitForCount(1));
     const Delivery delivery = mRecorder.Get()[0];
-    EXPECT_EQ(delivery.mKind, Delivery::kCancelled);
-    EXPECT_FALSE(delivery.mFrame);
-    EXPECT_EQ(delivery.mStatus, 0);
+    EXPECT_EQ(std::tuple(delivery.mKind, delivery.mStatus, delivery.mFrame.Get()),
+              std::tuple(Delivery::kCancelled, 0, nullptr));
     EXPECT_TRUE(WaitUntil(
         [&] { return waited->mCancelCount.load() == 1 && completed->mCancelCount.load() == 1; }));
     // A second cancel of the same identifier finds nothing.
@@ -464,9 +462,8 @@ TEST_F(RenderFrameQueueTest, ReleasedClientWithStationGivesExactlyOneMessage)
     std::lock_guard lock(messagesMutex);
     ASSERT_EQ(messages.size(), 1u);
     EXPECT_EQ(otherMessages, 0);
-    EXPECT_EQ(messages[0].mRequestID, 41u);
-    EXPECT_EQ(messages[0].mContext, 77);
-    EXPECT_EQ(messages[0].mFrame, mRecorder.Get()[0].mFrame);
+    EXPECT_EQ(std::tuple(messages[0].mRequestID, messages[0].mContext, messages[0].mFrame),
+              std::tuple(41u, 77, mRecorder.Get()[0].mFrame));
     QRT::StationRegistry::DisposeStation(station);
 }
 
@@ -494,9 +491,8 @@ TEST_F(RenderFrameQueueTest, FailuresBecomeSignedStatuses)
         Add(MakeSettings(id, testCase.mProducer ? producer : nullptr));
         ASSERT_TRUE(mRecorder.WaitForCount(id - 59));
         const Delivery delivery = mRecorder.Get().back();
-        EXPECT_EQ(delivery.mRequestID, id);
-        EXPECT_EQ(delivery.mKind, Delivery::kError);
-        EXPECT_EQ(delivery.mStatus, testCase.mExpected);
+        EXPECT_EQ(std::tuple(delivery.mRequestID, delivery.mKind, delivery.mStatus),
+                  std::tuple(id, Delivery::kError, testCase.mExpected));
         ++id;
     }
     EXPECT_EQ(static_cast<int>(ML::kResult_OutOfMemory), static_cast<int>(0xA00F0006u));

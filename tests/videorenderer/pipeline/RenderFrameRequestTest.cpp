@@ -13,6 +13,8 @@
 #include "TestProducer.h"
 #include "VF/SharedVideoFrameCache.h"
 
+#include <tuple>
+
 #include <gtest/gtest.h>
 
 using namespace vrtest;
@@ -181,17 +183,14 @@ TEST_F(RenderFrameRequestTest, RenderParamsCarryRequestFieldsAndProviderFieldTyp
     settings.mRenderFlags = 24;
     ML::CutlistRenderParams params;
     MakeRequest(settings).BuildRenderParams(true, params);
-    EXPECT_EQ(params.mWidth, 360u);
-    EXPECT_EQ(params.mHeight, 240u);
-    EXPECT_EQ(params.mFullFrameWidth, 720u);
-    EXPECT_EQ(params.mFullFrameHeight, 480u);
-    EXPECT_EQ(params.mSecondaryQuality, 4u);
-    EXPECT_EQ(params.mQuality, 4u);
-    EXPECT_DOUBLE_EQ(params.mHorizontalScale, 0.5);
-    EXPECT_DOUBLE_EQ(params.mVerticalScale, 0.5);
-    EXPECT_EQ(params.mCutlistChoiceBit, 1u);
-    EXPECT_EQ(params.mCutlistParameter, 77);
-    EXPECT_EQ(params.mRenderFlags, 24u);
+    EXPECT_EQ(
+        std::tuple(params.mWidth, params.mHeight, params.mFullFrameWidth, params.mFullFrameHeight),
+        std::tuple(360u, 240u, 720u, 480u));
+    // An unset secondary quality takes the quality.
+    EXPECT_EQ(std::tuple(params.mQuality, params.mSecondaryQuality), std::tuple(4u, 4u));
+    EXPECT_EQ(std::tuple(params.mHorizontalScale, params.mVerticalScale), std::tuple(0.5, 0.5));
+    EXPECT_EQ(std::tuple(params.mCutlistChoiceBit, params.mCutlistParameter, params.mRenderFlags),
+              std::tuple(1u, 77, 24u));
     EXPECT_EQ(params.mFieldType, 0u);
 
     // A provider's field type replaces the request's, unless it is "as source".
