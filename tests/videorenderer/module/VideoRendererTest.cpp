@@ -183,14 +183,11 @@ TEST_F(VideoRendererTest, UnbalancedShutdownLeavesEverythingAsItWasAndReports)
     BrambleSupport::Shutdown();
 }
 
-TEST_F(VideoRendererTest, LastShutdownStopsTheSharedExecutorsAndInitializeReplacesThem)
+TEST_F(VideoRendererTest, SeveralCyclesInOneProcessRenderInEveryCycleOnNewExecutors)
 {
-    ML::VideoRenderer::Initialize();
-    const ML::ExecutorRef normal = boost::atomic_load(&ML::sNormalPriorityRenderQueue);
-    const ML::ExecutorRef video = boost::atomic_load(&ML::sVideoSourcePrefetcherQueue);
-    ASSERT_TRUE(normal && video);
-    // The queue stops the render executors, the prefetch flush the prefetch
-    // executors; the next Initialize makes new ones.
+    // The last shutdown stops the shared executors (the queue the render
+    // executors, the prefetch flush the prefetch executors); the next
+    // Initialize makes new ones.
     const auto expectShutDown = [](bool inShutDown)
     {
         for (const ML::ExecutorRef* slot :
@@ -202,26 +199,24 @@ TEST_F(VideoRendererTest, LastShutdownStopsTheSharedExecutorsAndInitializeReplac
                                    : executor && !executor->IsShutDown());
         }
     };
-    ML::VideoRenderer::Shutdown();
-    expectShutDown(true);
-    ML::VideoRenderer::Initialize();
-    expectShutDown(false);
-    EXPECT_NE(boost::atomic_load(&ML::sNormalPriorityRenderQueue), normal);
-    EXPECT_NE(boost::atomic_load(&ML::sVideoSourcePrefetcherQueue), video);
-    ML::VideoRenderer::Shutdown();
-}
-
-TEST_F(VideoRendererTest, SeveralCyclesInOneProcessRenderInEveryCycle)
-{
+    ML::ExecutorRef previous[2];
     for (int cycle = 1; cycle <= 3; ++cycle)
     {
         SCOPED_TRACE(cycle);
         ASSERT_EQ(ML::VideoRenderer::Initialize(), 0);
+        expectShutDown(false);
+        const ML::ExecutorRef current[2] = {boost::atomic_load(&ML::sNormalPriorityRenderQueue),
+                                            boost::atomic_load(&ML::sVideoSourcePrefetcherQueue)};
+        EXPECT_NE(current[0], previous[0]);
+        EXPECT_NE(current[1], previous[1]);
+        previous[0] = current[0];
+        previous[1] = current[1];
         EXPECT_EQ(ML::RenderFrameQueue::GetConstructionCount(), mConstructions + cycle);
         EXPECT_EQ(ImporterHost::GetSessionCount(), mSessions + cycle);
         RenderOneFrameAndCheck(5 * cycle);
         RenderOneFrameAndCheck(0);
         ASSERT_EQ(ML::VideoRenderer::Shutdown(), 0);
+        expectShutDown(true);
         EXPECT_TRUE(ML::IsRenderModuleShuttingDown());
         EXPECT_EQ(BrambleSupport::GetInitializeCount(), 0);
     }
