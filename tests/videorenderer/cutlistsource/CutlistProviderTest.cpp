@@ -7,6 +7,7 @@
 #include <thread>
 #include <vector>
 
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 namespace
@@ -45,12 +46,9 @@ TEST_F(CutlistProviderTest, PropertiesAnswerTheSettingsThroughTheirInterface)
 {
     const auto properties = QRT::QueryRef<MF::IRenderableCutlistProviderProperties>(mProvider);
     ASSERT_TRUE(properties);
-    std::int32_t left = -1, top = -1, right = -1, bottom = -1;
-    properties->GetBounds(left, top, right, bottom);
-    EXPECT_EQ(left, 0);
-    EXPECT_EQ(top, 0);
-    EXPECT_EQ(right, 720);
-    EXPECT_EQ(bottom, 576);
+    std::int32_t bounds[4] = {-1, -1, -1, -1};
+    properties->GetBounds(bounds[0], bounds[1], bounds[2], bounds[3]);
+    EXPECT_THAT(bounds, ::testing::ElementsAre(0, 0, 720, 576));
     EXPECT_EQ(properties->GetPixelAspectRatio(), mvxmediatypes::kPixelAspectRatio_D1PAL);
     EXPECT_EQ(properties->GetFieldType(), mvxmediatypes::kFieldType_LowerFirst);
     EXPECT_EQ(properties->GetFrameRate(), mvxmediatypes::kFrameRate_Video25);
@@ -83,15 +81,11 @@ TEST_F(CutlistProviderTest, GettersAnswerTheCutlistsOfTheNameOrTheDefaultSet)
     EXPECT_EQ(mProvider->GetMainCutlist(mSequence, true), fallback);
     mProvider->RemoveCutlists(QRT::ImmutableString::CreateStatic("never registered"));
     EXPECT_EQ(mProvider->GetMainCutlist(other, true), fallback);
-}
 
-TEST_F(CutlistProviderTest, SetCutlistsReplacesTheSetOfThatName)
-{
-    const auto first = NewCutlist("first");
-    const auto second = NewCutlist("second");
-    mProvider->SetCutlists(mSequence, {first, first, first});
-    mProvider->SetCutlists(mSequence, {second, {}, {}});
-    EXPECT_EQ(mProvider->GetMainCutlist(mSequence, true), second);
+    // Setting a name's cutlists replaces its whole set.
+    mProvider->SetCutlists(mSequence, {main, main, main});
+    mProvider->SetCutlists(mSequence, {third, {}, {}});
+    EXPECT_EQ(mProvider->GetMainCutlist(mSequence, true), third);
     EXPECT_FALSE(mProvider->GetAlternateCutlist(mSequence, true));
     EXPECT_FALSE(mProvider->GetThirdCutlist(mSequence, true));
 }

@@ -1,10 +1,13 @@
 #include "ML/RenderableCutlistSource.h"
 
 #include "BE/CutlistProvider.h"
-#include "CutlistSourceTestSupport.h"
 #include "ML/IMutableCutlist.h"
-#include "ML/RenderRequestException.h"
 #include "ML/RenderStatus.h"
+#include "TestCutlists.h"
+#include "TestFrames.h"
+#include "TestNode.h"
+#include "TestPrefetch.h"
+#include "TestProducer.h"
 #include "VF/SharedVideoFrameCache.h"
 
 #include <gtest/gtest.h>
@@ -12,7 +15,7 @@
 namespace
 {
 
-using namespace cstest;
+using namespace vrtest;
 using mvxmediatypes::FieldType;
 using mvxmediatypes::TickTime;
 
@@ -24,14 +27,38 @@ TickTime Ticks(std::int64_t inTicks)
     return TickTime::TicksToTime(inTicks);
 }
 
-// One segment over [0, 100 frames) onto inNode.
-CutlistRef CutlistOver(const QRT::InterfaceRef<RecordingNode>& inNode, const char* inName)
+// A node whose producer makes frames as the parameters ask, with its own
+// prefetch handle.
+QRT::InterfaceRef<TestNode> NewNode(std::uint32_t inSeed)
 {
-    auto cutlist = ML::CreateMutableCutlist(QRT::ImmutableString::CreateStatic(inName));
-    cutlist->AddSegment(mvxmediatypes::kTime_Zero, Ticks(100 * kFrameTicks),
-                        mvxmediatypes::kTime_Zero, QRT::InterfaceRef<MF::IRenderableNode>(inNode));
-    cutlist->MakeImmutable();
-    return CutlistRef(cutlist);
+    auto node = QRT::Allocated<TestNode>::CreateInstance();
+    auto producer = QRT::Allocated<TestProducer>::CreateInstance(
+        QRT::Guid(0x0a000000u + inSeed, 0, 0, {0, 0, 0, 0, 0, 0, 0, 1}));
+    producer->mFormat = mvxmediatypes::kPixelFormat_Invalid;
+    producer->mWidth = 0;
+    node->mProducer = producer;
+    node->mPrefetch = QRT::Allocated<TestPrefetch>::CreateInstance();
+    return node;
+}
+
+TestProducer& ProducerOf(const QRT::InterfaceRef<TestNode>& inNode)
+{
+    return *static_cast<TestProducer*>(inNode->mProducer.Get());
+}
+
+// Expects inCall to throw the render request exception with inStatus.
+template <typename Call>
+void ExpectRenderException(Call&& inCall, QRT::Result inStatus)
+{
+    try
+    {
+        inCall();
+        ADD_FAILURE() << "no exception";
+    }
+    catch (const ML::RenderRequestException& error)
+    {
+        EXPECT_EQ(error.GetStatus(), inStatus);
+    }
 }
 
 class RenderableCutlistSourceTest : public ::testing::Test
@@ -40,13 +67,9 @@ protected:
     void SetUp() override
     {
         VF::SharedVideoFrameCache::Clear();
-        mParams.mWidth = 8;
-        mParams.mHeight = 4;
         mParams.mFullFrameWidth = 16;
         mParams.mFullFrameHeight = 8;
-        mParams.mPixelAspectRatio = mvxmediatypes::kPixelAspectRatio_Square;
         mParams.mFullFramePixelAspectRatio = mvxmediatypes::kPixelAspectRatio_D1PAL;
-        mParams.mPixelFormat = mvxmediatypes::kPixelFormat_BGRA_4444_8u;
         mParams.mHorizontalScale = 0.5;
         mParams.mVerticalScale = 0.5;
         mParams.mQuality = 2;
@@ -54,8 +77,8 @@ protected:
 
     void TearDown() override { VF::SharedVideoFrameCache::Clear(); }
 
-    // A source over the main and alternate nodes' cutlists whose provider
-    // reports inFieldType.
+    // A source over cutlists of one segment over [0, 100 frames) onto each of
+    // the three nodes, whose provider reports inFieldType.
     QRT::InterfaceRef<ML::IRenderableSource>
     Source(FieldType inFieldType,
            mvxmediatypes::FrameRate inRate = mvxmediatypes::kFrameRate_Video25)
@@ -65,46 +88,45 @@ protected:
         settings.mBottom = 8;
         settings.mFieldType = inFieldType;
         settings.mFrameRate = inRate;
-        mProvider = BE::CreateCutlistProvider(settings);
-        mProvider->SetCutlists(mName, {CutlistOver(mMain, "main"), CutlistOver(mAlternate, "alt"),
-                                       CutlistOver(mThird, "third")});
-        return ML::CreateRenderableCutlistSource(
-            QRT::InterfaceRef<MF::IRenderableCutlistProvider>(mProvider), inRate, mName);
+        auto provider = BE::CreateCutlistProvider(settings);
+        CutlistRef cutlists[3];
+        for (int i = 0; i < 3; ++i)
+        {
+            auto cutlist = ML::CreateMutableCutlist(QRT::ImmutableString::CreateStatic("c"));
+            cutlist->AddSegment(mvxmediatypes::kTime_Zero, Ticks(100 * kFrameTicks),
+                                mvxmediatypes::kTime_Zero, mNodes[i]);
+            cutlist->MakeImmutable();
+            cutlists[i] = cutlist;
+        }
+        provider->SetCutlists(mName, {cutlists[0], cutlists[1], cutlists[2]});
+        return ML::CreateRenderableCutlistSource(provider, inRate, mName);
     }
 
-    MF::FrameTime Conform(const QRT::InterfaceRef<ML::IRenderableSource>& inSource,
-                          const MF::FrameTime& inRequested)
+    QRT::InterfaceRef<ML::IRenderableSource> BareSource()
     {
-        MF::FrameTime conformed(Ticks(-1));
-        inSource->ConformFrameTime(inRequested, mParams, conformed);
-        return conformed;
+        return ML::CreateRenderableCutlistSource(mBare, mvxmediatypes::kFrameRate_Video25, mName);
     }
 
-    const QRT::ImmutableString mName = QRT::ImmutableString::CreateStatic("Sequence");
-    QRT::InterfaceRef<RecordingNode> mMain = QRT::Allocated<RecordingNode>::CreateInstance(
-        "main", QRT::Guid("{0a000000-0000-0000-0000-000000000001}"));
-    QRT::InterfaceRef<RecordingNode> mAlternate = QRT::Allocated<RecordingNode>::CreateInstance(
-        "alternate", QRT::Guid("{0a000000-0000-0000-0000-000000000002}"));
-    QRT::InterfaceRef<RecordingNode> mThird = QRT::Allocated<RecordingNode>::CreateInstance(
-        "third", QRT::Guid("{0a000000-0000-0000-0000-000000000003}"));
-    QRT::InterfaceRef<BE::ICutlistProvider> mProvider;
-    ML::CutlistRenderParams mParams;
+    const QRT::ImmutableString mName = QRT::ImmutableString::CreateStatic("Timeline A");
+    // Main, alternate and third.
+    const QRT::InterfaceRef<TestNode> mNodes[3] = {NewNode(1), NewNode(2), NewNode(3)};
+    QRT::InterfaceRef<BareCutlistProvider> mBare =
+        QRT::Allocated<BareCutlistProvider>::CreateInstance();
+    ML::CutlistRenderParams mParams = MakeParams(8, 4);
+    FrameRef mFrame;
 };
 
 TEST_F(RenderableCutlistSourceTest, CreationFetchesMainAndAlternateWithTheNameAndTrue)
 {
-    auto provider = QRT::Allocated<BareProvider>::CreateInstance();
-    const auto source = ML::CreateRenderableCutlistSource(
-        QRT::InterfaceRef<MF::IRenderableCutlistProvider>(provider),
-        mvxmediatypes::kFrameRate_Video25, QRT::ImmutableString::CreateStatic("Timeline A"));
+    const auto source = BareSource();
     ASSERT_TRUE(source);
-    ASSERT_EQ(provider->mCalls.size(), 2u);
-    EXPECT_EQ(provider->mCalls[0].mWhich, 0);
-    EXPECT_EQ(provider->mCalls[1].mWhich, 1);
-    for (const GetterCall& call : provider->mCalls)
+    const auto calls = mBare->Calls();
+    ASSERT_EQ(calls.size(), 2u);
+    for (int i = 0; i < 2; ++i)
     {
-        EXPECT_EQ(call.mName, "Timeline A");
-        EXPECT_TRUE(call.mFlag);
+        EXPECT_EQ(calls[i].mWhich, i);
+        EXPECT_EQ(calls[i].mName, "Timeline A");
+        EXPECT_TRUE(calls[i].mFlag);
     }
     // Without a description the sequence counts as progressive.
     mvxmediatypes::FrameRate fieldRate;
@@ -112,212 +134,179 @@ TEST_F(RenderableCutlistSourceTest, CreationFetchesMainAndAlternateWithTheNameAn
     EXPECT_EQ(fieldRate, mvxmediatypes::kFrameRate_Video25);
 }
 
-TEST_F(RenderableCutlistSourceTest, EmptyProviderThrowsTheNullInterfaceException)
+TEST_F(RenderableCutlistSourceTest, EmptyProviderOrCutlistThrowsTheNullInterfaceException)
 {
     EXPECT_THROW(ML::CreateRenderableCutlistSource({}, mvxmediatypes::kFrameRate_Video25, mName),
                  QRT::NullInterfaceException);
+    const auto source = BareSource();
+    EXPECT_THROW(source->RenderFrame(MF::FrameTime(Ticks(0)), mParams, mFrame),
+                 QRT::NullInterfaceException);
+    ML::RenderableNodePrefetchList prefetches;
+    source->CollectPrefetches(MF::FrameTime(Ticks(0)), mParams, prefetches);
+    EXPECT_TRUE(prefetches.empty());
 }
 
-TEST_F(RenderableCutlistSourceTest, FrameAndFieldRatesFollowTheFieldType)
+TEST_F(RenderableCutlistSourceTest, FieldRateIsTwiceTheFrameRateOnlyWhenInterlaced)
 {
-    mvxmediatypes::FrameRate rate;
-    for (FieldType type :
-         {mvxmediatypes::kFieldType_UpperFirst, mvxmediatypes::kFieldType_LowerFirst})
+    for (const auto& [type, fieldTicks] :
+         {std::pair{mvxmediatypes::kFieldType_UpperFirst, kFieldTicks},
+          std::pair{mvxmediatypes::kFieldType_LowerFirst, kFieldTicks},
+          std::pair{mvxmediatypes::kFieldType_Progressive, kFrameTicks},
+          std::pair{mvxmediatypes::kFieldType_AsSource, kFrameTicks}})
     {
+        SCOPED_TRACE(type);
+        mvxmediatypes::FrameRate rate;
         const auto source = Source(type);
         source->GetFrameRate(rate);
         EXPECT_EQ(rate.GetTicksPerFrame(), kFrameTicks);
         source->GetFieldRate(rate);
-        EXPECT_EQ(rate.GetTicksPerFrame(), kFieldTicks) << type;
-    }
-    for (FieldType type :
-         {mvxmediatypes::kFieldType_Progressive, mvxmediatypes::kFieldType_AsSource})
-    {
-        Source(type)->GetFieldRate(rate);
-        EXPECT_EQ(rate.GetTicksPerFrame(), kFrameTicks) << type;
+        EXPECT_EQ(rate.GetTicksPerFrame(), fieldTicks);
     }
 }
 
 TEST_F(RenderableCutlistSourceTest, ConformFrameTimeAlignsTheEarlierFieldAndAddsTheFieldOrder)
 {
-    const MF::FrameTime midFrame(Ticks(3 * kFrameTicks + 100));
-    EXPECT_EQ(Conform(Source(mvxmediatypes::kFieldType_Progressive), midFrame),
-              MF::FrameTime(Ticks(3 * kFrameTicks)));
-    EXPECT_EQ(Conform(Source(mvxmediatypes::kFieldType_UpperFirst), midFrame),
-              MF::FrameTime(Ticks(3 * kFrameTicks), Ticks(3 * kFrameTicks + kFieldTicks)));
-    EXPECT_EQ(Conform(Source(mvxmediatypes::kFieldType_LowerFirst), midFrame),
-              MF::FrameTime(Ticks(3 * kFrameTicks + kFieldTicks), Ticks(3 * kFrameTicks)));
-    // The earlier field decides the frame, in either slot.
-    const MF::FrameTime swapped(Ticks(5 * kFrameTicks + 10), Ticks(4 * kFrameTicks + 10));
-    EXPECT_EQ(Conform(Source(mvxmediatypes::kFieldType_Progressive), swapped),
-              MF::FrameTime(Ticks(4 * kFrameTicks)));
-    // Negative times round down onto the grid.
-    EXPECT_EQ(Conform(Source(mvxmediatypes::kFieldType_Progressive), MF::FrameTime(Ticks(-1))),
-              MF::FrameTime(Ticks(-kFrameTicks)));
+    const TickTime t2 = Ticks(2 * kFrameTicks);
+    const TickTime t3 = Ticks(3 * kFrameTicks);
+    const TickTime field = Ticks(kFieldTicks);
+    const MF::FrameTime midFrame(t3 + Ticks(100));
+    const struct
+    {
+        FieldType mType;
+        mvxmediatypes::FrameRate mRate;
+        MF::FrameTime mRequested;
+        MF::FrameTime mExpected;
+    } cases[] = {
+        {mvxmediatypes::kFieldType_Progressive, mvxmediatypes::kFrameRate_Video25, midFrame,
+         MF::FrameTime(t3)},
+        {mvxmediatypes::kFieldType_UpperFirst, mvxmediatypes::kFrameRate_Video25, midFrame,
+         MF::FrameTime(t3, t3 + field)},
+        {mvxmediatypes::kFieldType_LowerFirst, mvxmediatypes::kFrameRate_Video25, midFrame,
+         MF::FrameTime(t3 + field, t3)},
+        // The earlier field decides the frame, in either slot.
+        {mvxmediatypes::kFieldType_Progressive, mvxmediatypes::kFrameRate_Video25,
+         MF::FrameTime(Ticks(5 * kFrameTicks + 10), Ticks(4 * kFrameTicks + 10)),
+         MF::FrameTime(Ticks(4 * kFrameTicks))},
+        // Negative times round down onto the grid.
+        {mvxmediatypes::kFieldType_Progressive, mvxmediatypes::kFrameRate_Video25,
+         MF::FrameTime(Ticks(-1)), MF::FrameTime(Ticks(-kFrameTicks))},
+        // "As source" takes the order of an interlaced request.
+        {mvxmediatypes::kFieldType_AsSource, mvxmediatypes::kFrameRate_Video25,
+         MF::FrameTime(t2 + Ticks(7), t2 + Ticks(9)), MF::FrameTime(t2, t2 + field)},
+        {mvxmediatypes::kFieldType_AsSource, mvxmediatypes::kFrameRate_Video25,
+         MF::FrameTime(t2 + Ticks(9), t2 + Ticks(7)), MF::FrameTime(t2 + field, t2)},
+        {mvxmediatypes::kFieldType_AsSource, mvxmediatypes::kFrameRate_Video25,
+         MF::FrameTime(t2 + Ticks(9)), MF::FrameTime(t2)},
+        // A zero rate leaves the time unaligned.
+        {mvxmediatypes::kFieldType_Progressive, mvxmediatypes::kFrameRate_Zero,
+         MF::FrameTime(Ticks(12345)), MF::FrameTime(Ticks(12345))},
+    };
+    for (const auto& testCase : cases)
+    {
+        SCOPED_TRACE(testCase.mType);
+        MF::FrameTime conformed(Ticks(-1));
+        Source(testCase.mType, testCase.mRate)
+            ->ConformFrameTime(testCase.mRequested, mParams, conformed);
+        EXPECT_EQ(conformed, testCase.mExpected);
+    }
 }
 
-TEST_F(RenderableCutlistSourceTest, AsSourceFieldTypeTakesTheOrderOfAnInterlacedRequest)
+TEST_F(RenderableCutlistSourceTest, RenderSizeFollowsFieldTypeAndQuality)
 {
-    const auto source = Source(mvxmediatypes::kFieldType_AsSource);
-    const TickTime t = Ticks(2 * kFrameTicks);
-    EXPECT_EQ(
-        Conform(source, MF::FrameTime(Ticks(2 * kFrameTicks + 7), Ticks(2 * kFrameTicks + 9))),
-        MF::FrameTime(t, t + Ticks(kFieldTicks)));
-    EXPECT_EQ(
-        Conform(source, MF::FrameTime(Ticks(2 * kFrameTicks + 9), Ticks(2 * kFrameTicks + 7))),
-        MF::FrameTime(t + Ticks(kFieldTicks), t));
-    EXPECT_EQ(Conform(source, MF::FrameTime(Ticks(2 * kFrameTicks + 9))), MF::FrameTime(t));
-}
-
-TEST_F(RenderableCutlistSourceTest, ZeroFrameRateLeavesTheTimeUnaligned)
-{
-    const auto source =
-        Source(mvxmediatypes::kFieldType_Progressive, mvxmediatypes::kFrameRate_Zero);
-    EXPECT_EQ(Conform(source, MF::FrameTime(Ticks(12345))), MF::FrameTime(Ticks(12345)));
-}
-
-TEST_F(RenderableCutlistSourceTest, InterlacedLowQualityKeepsAnEvenHeightAndScale)
-{
-    const auto source = Source(mvxmediatypes::kFieldType_UpperFirst);
-    const MF::FrameTime time(Ticks(kFrameTicks), Ticks(kFrameTicks + kFieldTicks));
-    FrameRef frame;
-    source->RenderFrame(time, mParams, frame);
-    ASSERT_TRUE(frame);
-    const ML::CutlistRenderParams seen = mMain->mProducer->LastParams();
-    EXPECT_EQ(seen.mWidth, 8u);
-    EXPECT_EQ(seen.mHeight, 4u);
-    EXPECT_EQ(seen.mVerticalScale, 0.5);
-    EXPECT_EQ(seen.mHorizontalScale, 0.5);
-    EXPECT_EQ(seen.mPixelAspectRatio, mvxmediatypes::kPixelAspectRatio_Square);
-    EXPECT_EQ(seen.mFieldType, 1u);
-    EXPECT_EQ(seen.mFrameRate, mvxmediatypes::kFrameRate_Video25);
-    EXPECT_EQ(seen.GetFrameTime(), time);
-    EXPECT_EQ(mMain->mProducer->LastTime(), time);
-    EXPECT_EQ(frame->GetBounds(), QRT::ParamRect(0, 0, 8, 4));
-}
-
-TEST_F(RenderableCutlistSourceTest, InterlacedLowQualityRaisesAnOddHeightAndRescales)
-{
-    const auto source = Source(mvxmediatypes::kFieldType_LowerFirst);
-    mParams.mHeight = 5;
-    FrameRef frame;
-    source->RenderFrame(MF::FrameTime(Ticks(0)), mParams, frame);
-    ASSERT_TRUE(frame);
-    const ML::CutlistRenderParams seen = mMain->mProducer->LastParams();
-    EXPECT_EQ(seen.mHeight, 6u);
-    EXPECT_EQ(seen.mVerticalScale, 6.0 / 8.0);
-    EXPECT_EQ(seen.mWidth, 8u);
-    EXPECT_EQ(seen.mFieldType, 2u);
-
-    // An unset quality (all bits) counts as below 3 when compared signed.
-    mParams.mQuality = 0xFFFFFFFFu;
-    source->RenderFrame(MF::FrameTime(Ticks(0)), mParams, frame);
-    EXPECT_EQ(mMain->mProducer->LastParams().mHeight, 6u);
-
-    // Without a full-frame height the scale stays as requested.
-    mParams.mQuality = 1;
-    mParams.mFullFrameHeight = 0;
-    source->RenderFrame(MF::FrameTime(Ticks(0)), mParams, frame);
-    EXPECT_EQ(mMain->mProducer->LastParams().mHeight, 6u);
-    EXPECT_EQ(mMain->mProducer->LastParams().mVerticalScale, 0.5);
-}
-
-TEST_F(RenderableCutlistSourceTest, InterlacedHighQualityRendersTheFullFrame)
-{
-    const auto source = Source(mvxmediatypes::kFieldType_UpperFirst);
-    mParams.mQuality = 3;
-    FrameRef frame;
-    source->RenderFrame(MF::FrameTime(Ticks(0)), mParams, frame);
-    ASSERT_TRUE(frame);
-    const ML::CutlistRenderParams seen = mMain->mProducer->LastParams();
-    EXPECT_EQ(seen.mWidth, 16u);
-    EXPECT_EQ(seen.mHeight, 8u);
-    EXPECT_EQ(seen.mHorizontalScale, 1.0);
-    EXPECT_EQ(seen.mVerticalScale, 1.0);
-    EXPECT_EQ(seen.mPixelAspectRatio, mvxmediatypes::kPixelAspectRatio_D1PAL);
-}
-
-TEST_F(RenderableCutlistSourceTest, ProgressiveIsConformedOnlyFromQualityFive)
-{
-    const auto source = Source(mvxmediatypes::kFieldType_Progressive);
-    mParams.mQuality = 4;
-    mParams.mHeight = 5;
-    FrameRef frame;
-    source->RenderFrame(MF::FrameTime(Ticks(0)), mParams, frame);
-    EXPECT_EQ(mMain->mProducer->LastParams().mWidth, 8u);
-    EXPECT_EQ(mMain->mProducer->LastParams().mHeight, 5u);
-    EXPECT_EQ(mMain->mProducer->LastParams().mFieldType, 0u);
-
-    mParams.mQuality = 5;
-    source->RenderFrame(MF::FrameTime(Ticks(0)), mParams, frame);
-    EXPECT_EQ(mMain->mProducer->LastParams().mWidth, 16u);
-    EXPECT_EQ(mMain->mProducer->LastParams().mHeight, 8u);
+    // Interlaced below quality 3 keeps the requested size with an even
+    // height (scale rescaled to match); from quality 3 it renders the full
+    // frame. Progressive renders the full frame only from quality 5.
+    const struct
+    {
+        FieldType mType;
+        std::uint32_t mQuality;
+        std::uint32_t mHeight;
+        std::uint32_t mFullFrameHeight;
+        std::uint32_t mExpectedWidth;
+        std::uint32_t mExpectedHeight;
+        double mExpectedScale;
+        std::uint32_t mExpectedFieldType;
+    } cases[] = {
+        {mvxmediatypes::kFieldType_UpperFirst, 2, 4, 8, 8, 4, 0.5, 1},
+        {mvxmediatypes::kFieldType_LowerFirst, 2, 5, 8, 8, 6, 6.0 / 8.0, 2},
+        // An unset quality (all bits) counts as below 3 when compared signed.
+        {mvxmediatypes::kFieldType_LowerFirst, 0xFFFFFFFFu, 5, 8, 8, 6, 6.0 / 8.0, 2},
+        // Without a full-frame height the scale stays as requested.
+        {mvxmediatypes::kFieldType_LowerFirst, 1, 5, 0, 8, 6, 0.5, 2},
+        {mvxmediatypes::kFieldType_UpperFirst, 3, 4, 8, 16, 8, 1.0, 1},
+        {mvxmediatypes::kFieldType_Progressive, 4, 5, 8, 8, 5, 0.5, 0},
+        {mvxmediatypes::kFieldType_Progressive, 5, 5, 8, 16, 8, 1.0, 0},
+    };
+    for (const auto& testCase : cases)
+    {
+        SCOPED_TRACE(testing::Message() << testCase.mType << " q" << testCase.mQuality);
+        mParams.mQuality = testCase.mQuality;
+        mParams.mHeight = testCase.mHeight;
+        mParams.mFullFrameHeight = testCase.mFullFrameHeight;
+        const MF::FrameTime time(Ticks(kFrameTicks), Ticks(kFrameTicks + kFieldTicks));
+        Source(testCase.mType)->RenderFrame(time, mParams, mFrame);
+        ASSERT_TRUE(mFrame);
+        const ML::CutlistRenderParams seen = ProducerOf(mNodes[0]).LastParams();
+        EXPECT_EQ(seen.mWidth, testCase.mExpectedWidth);
+        EXPECT_EQ(seen.mHeight, testCase.mExpectedHeight);
+        EXPECT_EQ(seen.mVerticalScale, testCase.mExpectedScale);
+        EXPECT_EQ(seen.mHorizontalScale, testCase.mExpectedWidth == 16 ? 1.0 : 0.5);
+        EXPECT_EQ(seen.mPixelAspectRatio, testCase.mExpectedWidth == 16
+                                              ? mvxmediatypes::kPixelAspectRatio_D1PAL
+                                              : mvxmediatypes::kPixelAspectRatio_Square);
+        EXPECT_EQ(seen.mFieldType, testCase.mExpectedFieldType);
+        EXPECT_EQ(seen.mFrameRate, mvxmediatypes::kFrameRate_Video25);
+        EXPECT_EQ(seen.GetFrameTime(), time);
+        EXPECT_EQ(mFrame->GetBounds(),
+                  QRT::ParamRect(0, 0, static_cast<std::int32_t>(testCase.mExpectedWidth),
+                                 static_cast<std::int32_t>(testCase.mExpectedHeight)));
+    }
 }
 
 TEST_F(RenderableCutlistSourceTest, ChoiceBitPicksTheAlternateCutlistForRenderingAndPrefetching)
 {
     const auto source = Source(mvxmediatypes::kFieldType_Progressive);
     const MF::FrameTime time(Ticks(2 * kFrameTicks));
-    FrameRef frame;
     ML::RenderableNodePrefetchList prefetches;
-
-    source->RenderFrame(time, mParams, frame);
-    source->CollectPrefetches(time, mParams, prefetches);
-    EXPECT_EQ(mMain->mProducer->mProduceCount.load(), 1);
-    EXPECT_EQ(mAlternate->mProducer->mProduceCount.load(), 0);
-    ASSERT_EQ(prefetches.size(), 1u);
-    EXPECT_EQ(static_cast<MarkerPrefetch*>(prefetches[0].Get())->mOwner, "main");
-
-    // Only bit 0 of the choice counts.
-    mParams.mCutlistChoiceBit = 3;
-    source->RenderFrame(time, mParams, frame);
-    source->CollectPrefetches(time, mParams, prefetches);
-    EXPECT_EQ(mAlternate->mProducer->mProduceCount.load(), 1);
-    ASSERT_EQ(prefetches.size(), 2u);
-    EXPECT_EQ(static_cast<MarkerPrefetch*>(prefetches[1].Get())->mOwner, "alternate");
-
-    mParams.mCutlistChoiceBit = 2;
-    source->RenderFrame(time, mParams, frame);
-    EXPECT_EQ(mMain->mProducer->mProduceCount.load(), 2);
-    EXPECT_EQ(mAlternate->mProducer->mProduceCount.load(), 1);
-    // The third cutlist is never used.
-    EXPECT_EQ(mThird->mProducer->mProduceCount.load(), 0);
-    EXPECT_TRUE(mThird->PrefetchRanges().empty());
+    // Only bit 0 of the choice counts; the third cutlist is never used.
+    for (const auto& [choice, node] : {std::pair{0u, 0}, std::pair{3u, 1}, std::pair{2u, 0}})
+    {
+        SCOPED_TRACE(choice);
+        mParams.mCutlistChoiceBit = choice;
+        const int before = ProducerOf(mNodes[node]).mProduceCount.load();
+        source->RenderFrame(time, mParams, mFrame);
+        EXPECT_EQ(ProducerOf(mNodes[node]).mProduceCount.load(), before + 1);
+        source->CollectPrefetches(time, mParams, prefetches);
+        EXPECT_EQ(prefetches.back(), mNodes[node]->mPrefetch);
+    }
+    EXPECT_EQ(ProducerOf(mNodes[1]).mProduceCount.load(), 1);
+    EXPECT_EQ(ProducerOf(mNodes[2]).mProduceCount.load(), 0);
+    EXPECT_TRUE(mNodes[2]->PrefetchRanges().empty());
+    EXPECT_EQ(prefetches.size(), 3u);
 }
 
 TEST_F(RenderableCutlistSourceTest, PrefetchesCoverBothFieldsOfTheRequestedFrame)
 {
-    const auto source = Source(mvxmediatypes::kFieldType_LowerFirst);
-    const MF::FrameTime time(Ticks(kFrameTicks + kFieldTicks), Ticks(kFrameTicks));
     ML::RenderableNodePrefetchList prefetches;
-    source->CollectPrefetches(time, mParams, prefetches);
-    const auto ranges = mMain->PrefetchRanges();
+    Source(mvxmediatypes::kFieldType_LowerFirst)
+        ->CollectPrefetches(MF::FrameTime(Ticks(kFrameTicks + kFieldTicks), Ticks(kFrameTicks)),
+                            mParams, prefetches);
+    const auto ranges = mNodes[0]->PrefetchRanges();
     ASSERT_EQ(ranges.size(), 1u);
-    EXPECT_EQ(ranges[0].first, Ticks(kFrameTicks));
-    EXPECT_EQ(ranges[0].second, Ticks(kFrameTicks + kFieldTicks));
-    ASSERT_EQ(prefetches.size(), 1u);
+    EXPECT_EQ(ranges[0], MF::TickTimeRange(Ticks(kFrameTicks), Ticks(kFrameTicks + kFieldTicks)));
+    EXPECT_EQ(prefetches.size(), 1u);
 }
 
-TEST_F(RenderableCutlistSourceTest, FailedLookupIsThrownWithItsStatus)
+TEST_F(RenderableCutlistSourceTest, FailedLookupIsThrownWithItsStatusAndCollectsNothing)
 {
-    auto provider = QRT::Allocated<BareProvider>::CreateInstance();
-    provider->mCutlists[0] = CutlistRef(QRT::Allocated<FailingCutlist>::CreateInstance());
-    const auto source = ML::CreateRenderableCutlistSource(
-        QRT::InterfaceRef<MF::IRenderableCutlistProvider>(provider),
-        mvxmediatypes::kFrameRate_Video25, mName);
-    FrameRef frame = VF::CreateVideoFrame(mParams.mPixelFormat, 2, 2,
-                                          mvxmediatypes::kPixelAspectRatio_Square, false, false);
-    try
-    {
-        source->RenderFrame(MF::FrameTime(Ticks(0)), mParams, frame);
-        ADD_FAILURE() << "no exception";
-    }
-    catch (const ML::RenderRequestException& error)
-    {
-        EXPECT_EQ(error.GetStatus(), static_cast<QRT::Result>(0xA0990042u));
-    }
-    EXPECT_FALSE(frame);
-    // Collecting from a failing cutlist starts nothing.
+    auto failing = QRT::Allocated<TestCutlist>::CreateInstance();
+    failing->mLookupStatus = static_cast<QRT::Result>(0xA0990042u);
+    mBare->mCutlists[0] = failing;
+    const auto source = BareSource();
+    mFrame = MakeFrame(2, 2);
+    ExpectRenderException([&] { source->RenderFrame(MF::FrameTime(Ticks(0)), mParams, mFrame); },
+                          static_cast<QRT::Result>(0xA0990042u));
+    EXPECT_FALSE(mFrame);
     ML::RenderableNodePrefetchList prefetches;
     source->CollectPrefetches(MF::FrameTime(Ticks(0)), mParams, prefetches);
     EXPECT_TRUE(prefetches.empty());
@@ -325,33 +314,11 @@ TEST_F(RenderableCutlistSourceTest, FailedLookupIsThrownWithItsStatus)
 
 TEST_F(RenderableCutlistSourceTest, FailedProducerIsThrownAsAFailedRender)
 {
+    ProducerOf(mNodes[0]).mFailure = ProducerFailure::kStatus;
     const auto source = Source(mvxmediatypes::kFieldType_Progressive);
-    mMain->mProducer->mFailureStatus = static_cast<QRT::Result>(0xA0990077u);
-    FrameRef frame;
-    try
-    {
-        source->RenderFrame(MF::FrameTime(Ticks(0)), mParams, frame);
-        ADD_FAILURE() << "no exception";
-    }
-    catch (const ML::RenderRequestException& error)
-    {
-        EXPECT_EQ(error.GetStatus(), ML::kResult_RenderFailed);
-    }
-    EXPECT_FALSE(frame);
-}
-
-TEST_F(RenderableCutlistSourceTest, EmptyCutlistThrowsTheNullInterfaceExceptionAndCollectsNothing)
-{
-    auto provider = QRT::Allocated<BareProvider>::CreateInstance();
-    const auto source = ML::CreateRenderableCutlistSource(
-        QRT::InterfaceRef<MF::IRenderableCutlistProvider>(provider),
-        mvxmediatypes::kFrameRate_Video25, mName);
-    FrameRef frame;
-    EXPECT_THROW(source->RenderFrame(MF::FrameTime(Ticks(0)), mParams, frame),
-                 QRT::NullInterfaceException);
-    ML::RenderableNodePrefetchList prefetches;
-    source->CollectPrefetches(MF::FrameTime(Ticks(0)), mParams, prefetches);
-    EXPECT_TRUE(prefetches.empty());
+    ExpectRenderException([&] { source->RenderFrame(MF::FrameTime(Ticks(0)), mParams, mFrame); },
+                          ML::kResult_RenderFailed);
+    EXPECT_FALSE(mFrame);
 }
 
 } // namespace

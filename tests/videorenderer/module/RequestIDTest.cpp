@@ -27,27 +27,25 @@ TEST_F(RequestIDTest, FirstIdentifiersAfterLoadAreTwoThenThree)
     EXPECT_EQ(kSecondIDAfterLoad, 3u);
 }
 
-TEST_F(RequestIDTest, EachCallAnswersTheNextIdentifier)
+TEST_F(RequestIDTest, EachCallAnswersTheNextIdentifierAndTheWrapSkipsZero)
 {
-    ML::ModuleInternals::SetLastRequestID(1000);
-    EXPECT_EQ(ML::GetNextRequestID(), 1001u);
-    EXPECT_EQ(ML::GetNextRequestID(), 1002u);
-    EXPECT_EQ(ML::GetNextRequestID(), 1003u);
-}
-
-TEST_F(RequestIDTest, WrapSkipsZero)
-{
-    ML::ModuleInternals::SetLastRequestID(0xFFFFFFFEu);
-    EXPECT_EQ(ML::GetNextRequestID(), 0xFFFFFFFFu);
-    // 0 means "no request": the counter goes on at 1.
-    EXPECT_EQ(ML::GetNextRequestID(), 1u);
-    EXPECT_EQ(ML::GetNextRequestID(), 2u);
-}
-
-TEST_F(RequestIDTest, CounterLeftAtZeroStillNeverAnswersZero)
-{
-    ML::ModuleInternals::SetLastRequestID(0xFFFFFFFFu);
-    EXPECT_EQ(ML::GetNextRequestID(), 1u);
+    // 0 means "no request": past the top the counter goes on at 1, also from
+    // a counter left at the top.
+    const struct
+    {
+        unsigned int mLast;
+        std::vector<unsigned int> mExpected;
+    } cases[] = {
+        {1000, {1001, 1002, 1003}},
+        {0xFFFFFFFEu, {0xFFFFFFFFu, 1, 2}},
+        {0xFFFFFFFFu, {1}},
+    };
+    for (const auto& testCase : cases)
+    {
+        ML::ModuleInternals::SetLastRequestID(testCase.mLast);
+        for (unsigned int expected : testCase.mExpected)
+            EXPECT_EQ(ML::GetNextRequestID(), expected) << "after " << testCase.mLast;
+    }
 }
 
 TEST_F(RequestIDTest, ConcurrentCallersGetDistinctNonZeroIdentifiersAcrossTheWrap)

@@ -7,13 +7,13 @@
 #include "ML/RenderExecutors.h"
 #include "ML/RenderFrameQueue.h"
 #include "ML/RenderableVideoSources.h"
-#include "ModuleTestSupport.h"
+#include "RecordingClient.h"
+#include "TestSource.h"
 #include "module/ModuleInternals.h"
 #include "mvxcore/debug/Contract.h"
 #include "mvxcore/threads/ExecutorFactories.h"
 
 #include <mutex>
-#include <set>
 #include <string>
 #include <thread>
 #include <vector>
@@ -23,8 +23,12 @@
 namespace
 {
 
-using namespace modtest;
+using namespace vrtest;
 using mvxmediatypes::TickTime;
+
+// Prefetch delays of NewSource that are no delay.
+constexpr int kNoPrefetch = -2;
+constexpr int kNeverArrives = -1;
 
 class VideoRendererTest : public ::testing::Test
 {
@@ -58,21 +62,58 @@ protected:
         EXPECT_EQ(BrambleSupport::GetInitializeCount(), 0);
     }
 
-    QRT::InterfaceRef<DelayedPrefetch> NewPrefetch(std::chrono::milliseconds inDelay)
+    // A source whose prefetch frame arrives inDelayMs after it is started
+    // (or never, or that has no prefetch).
+    QRT::InterfaceRef<TestSource> NewSource(int inDelayMs)
     {
-        return QRT::Allocated<DelayedPrefetch>::CreateInstance(mPrefetchExecutor, inDelay);
-    }
-
-    QRT::InterfaceRef<ColorSource> NewSource(QRT::InterfaceRef<DelayedPrefetch> inPrefetch = {})
-    {
-        auto source = QRT::Allocated<ColorSource>::CreateInstance();
-        source->mPrefetch = inPrefetch;
+        auto source = QRT::Allocated<TestSource>::CreateInstance();
+        if (inDelayMs == kNeverArrives)
+            source->mPrefetch = QRT::Allocated<TestPrefetch>::CreateInstance();
+        else if (inDelayMs >= 0)
+            source->mPrefetch = QRT::Allocated<TestPrefetch>::CreateInstance(
+                mPrefetchExecutor, std::chrono::milliseconds(inDelayMs));
+        if (source->mPrefetch)
+            source->mPrefetch->mWantMoreTime = true;
         return source;
     }
 
-    static SourceRef AsSource(const QRT::InterfaceRef<ColorSource>& inSource)
+    // Starts an inWidth x inHeight render of inSource at inTime, recorded by
+    // mRecorder.
+    void Initiate(const QRT::InterfaceRef<TestSource>& inSource, unsigned int inRequestID,
+                  const MF::FrameTime& inTime = MF::FrameTime(TickTime::TicksToTime(1000)),
+                  std::uint32_t inWidth = 8, std::uint32_t inHeight = 8)
     {
-        return SourceRef(inSource);
+        ML::InitiateRender(inSource, inTime, MakeParams(inWidth, inHeight, inTime), inRequestID,
+                           mRecorder.Callback());
+    }
+
+    // The one callback of inRequestID, waited for (bounded), checked for the
+    // identifier, the source and status 0.
+    Delivery Answer(unsigned int inRequestID, const QRT::InterfaceRef<TestSource>& inSource)
+    {
+        EXPECT_TRUE(WaitUntil([&] { return !mRecorder.Of(inRequestID).empty(); }));
+        const auto answers = mRecorder.Of(inRequestID);
+        if (answers.size() != 1)
+        {
+            ADD_FAILURE() << answers.size() << " answers to " << inRequestID;
+            return {};
+        }
+        EXPECT_EQ(answers[0].mSource.Get(), static_cast<ML::IRenderableSource*>(inSource.Get()));
+        EXPECT_EQ(answers[0].mStatus, 0);
+        return answers[0];
+    }
+
+    // Renders one 16x8 frame of a source with a prefetch arriving after
+    // inDelayMs and checks everything the callback receives.
+    void RenderOneFrameAndCheck(int inDelayMs)
+    {
+        auto source = NewSource(inDelayMs);
+        const unsigned int id = ML::GetNextRequestID();
+        Initiate(source, id, MF::FrameTime(TickTime::TicksToTime(5000)), 16, 8);
+        const Delivery answer = Answer(id, source);
+        EXPECT_EQ(answer.mKind, Delivery::kComplete);
+        EXPECT_TRUE(IsFilledWith(answer.mFrame, source->mColor));
+        EXPECT_EQ(source->mRenderCount.load(), 1);
     }
 
     std::vector<std::string> Asserts()
@@ -81,30 +122,11 @@ protected:
         return mAsserts;
     }
 
-    // Renders one 16x8 frame of a source with a prefetch arriving after
-    // inDelay and checks everything the callback receives.
-    void RenderOneFrameAndCheck(std::chrono::milliseconds inDelay)
-    {
-        auto prefetch = NewPrefetch(inDelay);
-        auto source = NewSource(prefetch);
-        const unsigned int id = ML::GetNextRequestID();
-        CallbackRecorder recorder;
-        ML::InitiateRender(AsSource(source), MF::FrameTime(TickTime::TicksToTime(5000)),
-                           MakeParams(MF::FrameTime(TickTime::TicksToTime(5000)), 16, 8), id,
-                           recorder.Callback());
-        ASSERT_TRUE(recorder.WaitForCount(1));
-        const CallbackCall call = recorder.Get()[0];
-        EXPECT_TRUE(IsFilledWith(call.mFrame, source->mColor));
-        EXPECT_EQ(call.mRequestID, id);
-        EXPECT_EQ(call.mSource.Get(), AsSource(source).Get());
-        EXPECT_FALSE(call.mCancelled);
-        EXPECT_EQ(call.mStatus, 0);
-        EXPECT_EQ(source->mRenderCount.load(), 1);
-    }
-
     std::uint64_t mConstructions = 0;
     std::uint32_t mSessions = 0;
     boost::shared_ptr<mvxcore::threads::AsyncThreadedExecutor> mPrefetchExecutor;
+    DeliveryRecorder mRecorder;
+    // Guards mAsserts.
     std::mutex mAssertMutex;
     std::vector<std::string> mAsserts;
     mvxcore::debug::AssertHook mPreviousAssertHook;
@@ -117,6 +139,8 @@ TEST_F(VideoRendererTest, TwoInitializeCallsNeedTwoShutdownCalls)
     EXPECT_EQ(ML::VideoRenderer::Initialize(), 0);
     EXPECT_EQ(ML::VideoRenderer::Initialize(), 0);
     EXPECT_EQ(ML::ModuleInternals::GetInitializationCount(), 2);
+    // The suite support library follows every call one for one.
+    EXPECT_EQ(BrambleSupport::GetInitializeCount(), 2);
     // Only the first call brought the module up.
     EXPECT_EQ(ML::RenderFrameQueue::GetConstructionCount(), mConstructions + 1);
     EXPECT_EQ(ImporterHost::GetSessionCount(), mSessions + 1);
@@ -125,30 +149,17 @@ TEST_F(VideoRendererTest, TwoInitializeCallsNeedTwoShutdownCalls)
 
     EXPECT_EQ(ML::VideoRenderer::Shutdown(), 0);
     EXPECT_EQ(ML::ModuleInternals::GetInitializationCount(), 1);
+    EXPECT_EQ(BrambleSupport::GetInitializeCount(), 1);
     // Still up: the queue is running and the importer host open.
     EXPECT_FALSE(ML::IsRenderModuleShuttingDown());
     EXPECT_TRUE(ImporterHost::IsSessionOpen());
-    RenderOneFrameAndCheck(std::chrono::milliseconds(1));
+    RenderOneFrameAndCheck(1);
 
     EXPECT_EQ(ML::VideoRenderer::Shutdown(), 0);
     EXPECT_EQ(ML::ModuleInternals::GetInitializationCount(), 0);
     EXPECT_TRUE(ML::IsRenderModuleShuttingDown());
     EXPECT_FALSE(ImporterHost::IsSessionOpen());
     EXPECT_TRUE(Asserts().empty());
-}
-
-TEST_F(VideoRendererTest, SuiteSupportCountFollowsEveryCallOneForOne)
-{
-    for (int i = 1; i <= 3; ++i)
-    {
-        ML::VideoRenderer::Initialize();
-        EXPECT_EQ(BrambleSupport::GetInitializeCount(), i);
-    }
-    for (int i = 2; i >= 0; --i)
-    {
-        ML::VideoRenderer::Shutdown();
-        EXPECT_EQ(BrambleSupport::GetInitializeCount(), i);
-    }
 }
 
 TEST_F(VideoRendererTest, UnbalancedShutdownLeavesEverythingAsItWasAndReports)
@@ -166,54 +177,46 @@ TEST_F(VideoRendererTest, UnbalancedShutdownLeavesEverythingAsItWasAndReports)
     ML::VideoRenderer::Initialize();
     EXPECT_EQ(ML::RenderFrameQueue::GetConstructionCount(), mConstructions + 1);
     EXPECT_EQ(ImporterHost::GetSessionCount(), mSessions + 1);
-    RenderOneFrameAndCheck(std::chrono::milliseconds(1));
+    RenderOneFrameAndCheck(1);
     ML::VideoRenderer::Shutdown();
     EXPECT_EQ(BrambleSupport::GetInitializeCount(), 1);
     BrambleSupport::Shutdown();
 }
 
-TEST_F(VideoRendererTest, LastShutdownStopsTheSharedExecutorsAndInitializeReplacesThem)
+TEST_F(VideoRendererTest, SeveralCyclesInOneProcessRenderInEveryCycleOnNewExecutors)
 {
-    ML::VideoRenderer::Initialize();
-    const ML::ExecutorRef normal = boost::atomic_load(&ML::sNormalPriorityRenderQueue);
-    const ML::ExecutorRef video = boost::atomic_load(&ML::sVideoSourcePrefetcherQueue);
-    ASSERT_TRUE(normal && video);
-    ML::VideoRenderer::Shutdown();
-    // The queue stopped the render executors, the prefetch flush the
-    // prefetch executors.
-    for (const ML::ExecutorRef* slot :
-         {&ML::sNormalPriorityRenderQueue, &ML::sLowPriorityRenderQueue,
-          &ML::sVideoSourcePrefetcherQueue, &ML::sImageSourcePrefetcherQueue})
+    // The last shutdown stops the shared executors (the queue the render
+    // executors, the prefetch flush the prefetch executors); the next
+    // Initialize makes new ones.
+    const auto expectShutDown = [](bool inShutDown)
     {
-        const ML::ExecutorRef executor = boost::atomic_load(slot);
-        EXPECT_TRUE(!executor || executor->IsShutDown());
-    }
-
-    ML::VideoRenderer::Initialize();
-    for (const ML::ExecutorRef* slot :
-         {&ML::sNormalPriorityRenderQueue, &ML::sLowPriorityRenderQueue,
-          &ML::sVideoSourcePrefetcherQueue, &ML::sImageSourcePrefetcherQueue})
-    {
-        const ML::ExecutorRef executor = boost::atomic_load(slot);
-        ASSERT_TRUE(executor);
-        EXPECT_FALSE(executor->IsShutDown());
-    }
-    EXPECT_NE(boost::atomic_load(&ML::sNormalPriorityRenderQueue), normal);
-    EXPECT_NE(boost::atomic_load(&ML::sVideoSourcePrefetcherQueue), video);
-    ML::VideoRenderer::Shutdown();
-}
-
-TEST_F(VideoRendererTest, SeveralCyclesInOneProcessRenderInEveryCycle)
-{
+        for (const ML::ExecutorRef* slot :
+             {&ML::sNormalPriorityRenderQueue, &ML::sLowPriorityRenderQueue,
+              &ML::sVideoSourcePrefetcherQueue, &ML::sImageSourcePrefetcherQueue})
+        {
+            const ML::ExecutorRef executor = boost::atomic_load(slot);
+            EXPECT_TRUE(inShutDown ? !executor || executor->IsShutDown()
+                                   : executor && !executor->IsShutDown());
+        }
+    };
+    ML::ExecutorRef previous[2];
     for (int cycle = 1; cycle <= 3; ++cycle)
     {
         SCOPED_TRACE(cycle);
         ASSERT_EQ(ML::VideoRenderer::Initialize(), 0);
+        expectShutDown(false);
+        const ML::ExecutorRef current[2] = {boost::atomic_load(&ML::sNormalPriorityRenderQueue),
+                                            boost::atomic_load(&ML::sVideoSourcePrefetcherQueue)};
+        EXPECT_NE(current[0], previous[0]);
+        EXPECT_NE(current[1], previous[1]);
+        previous[0] = current[0];
+        previous[1] = current[1];
         EXPECT_EQ(ML::RenderFrameQueue::GetConstructionCount(), mConstructions + cycle);
         EXPECT_EQ(ImporterHost::GetSessionCount(), mSessions + cycle);
-        RenderOneFrameAndCheck(std::chrono::milliseconds(5 * cycle));
-        RenderOneFrameAndCheck(std::chrono::milliseconds(0));
+        RenderOneFrameAndCheck(5 * cycle);
+        RenderOneFrameAndCheck(0);
         ASSERT_EQ(ML::VideoRenderer::Shutdown(), 0);
+        expectShutDown(true);
         EXPECT_TRUE(ML::IsRenderModuleShuttingDown());
         EXPECT_EQ(BrambleSupport::GetInitializeCount(), 0);
     }
@@ -243,17 +246,11 @@ TEST_F(VideoRendererTest, ConcurrentBalancedCallsKeepTheModuleUp)
     // The first caller held the module up throughout: one queue, one session.
     EXPECT_EQ(ML::RenderFrameQueue::GetConstructionCount(), mConstructions + 1);
     EXPECT_EQ(ImporterHost::GetSessionCount(), mSessions + 1);
-    RenderOneFrameAndCheck(std::chrono::milliseconds(1));
-    ML::VideoRenderer::Shutdown();
-}
-
-TEST_F(VideoRendererTest, EnableAcceleratedRenderingLeavesTheModuleAsItWas)
-{
-    ML::VideoRenderer::Initialize();
+    // Enabling accelerated rendering leaves the module as it was.
     ML::VideoRenderer::EnableAcceleratedRendering();
     ML::VideoRenderer::EnableAcceleratedRendering();
     EXPECT_EQ(ML::ModuleInternals::GetInitializationCount(), 1);
-    RenderOneFrameAndCheck(std::chrono::milliseconds(1));
+    RenderOneFrameAndCheck(1);
     ML::VideoRenderer::Shutdown();
 }
 
@@ -311,200 +308,117 @@ TEST_F(VideoRendererTest, SuiteFamilyRegistersEveryVersionAndChecksTheLastResult
 TEST_F(VideoRendererTest, RendersTheSourceOnceItsPrefetchHasArrived)
 {
     ML::VideoRenderer::Initialize();
-    auto prefetch = NewPrefetch(std::chrono::milliseconds(30));
-    auto source = NewSource(prefetch);
-    source->mColor[0] = 0x11;
-    source->mColor[1] = 0x22;
-    source->mColor[2] = 0x33;
-    source->mColor[3] = 0x44;
+    auto source = NewSource(30);
+    source->mColor = {0x11, 0x22, 0x33, 0x44};
     // An interlaced frame time: the request goes by the earlier field.
     const MF::FrameTime frameTime(TickTime::TicksToTime(8000), TickTime::TicksToTime(6000));
-    const ML::CutlistRenderParams params = MakeParams(frameTime, 16, 8);
-    CallbackRecorder recorder;
-    ML::InitiateRender(AsSource(source), frameTime, params, 4242, recorder.Callback());
+    Initiate(source, 4242, frameTime, 16, 8);
     EXPECT_EQ(source->mCollectCount.load(), 1);
     EXPECT_EQ(source->mCollectTime, frameTime);
-
-    ASSERT_TRUE(recorder.WaitForCount(1));
-    const CallbackCall call = recorder.Get()[0];
-    ASSERT_TRUE(call.mFrame);
-    EXPECT_EQ(call.mFrame->GetBounds().Width(), 16);
-    EXPECT_EQ(call.mFrame->GetBounds().Height(), 8);
-    EXPECT_TRUE(IsFilledWith(call.mFrame, source->mColor));
-    EXPECT_EQ(call.mRequestID, 4242u);
-    EXPECT_EQ(call.mSource.Get(), AsSource(source).Get());
-    EXPECT_FALSE(call.mCancelled);
-    EXPECT_EQ(call.mStatus, 0);
-
+    const Delivery answer = Answer(4242, source);
+    EXPECT_EQ(answer.mKind, Delivery::kComplete);
+    EXPECT_TRUE(IsFilledWith(answer.mFrame, source->mColor));
+    ASSERT_TRUE(answer.mFrame);
+    EXPECT_EQ(answer.mFrame->GetBounds(), QRT::ParamRect(0, 0, 16, 8));
     // Rendered once, after the prefetch, with the parameters' own frame time.
-    EXPECT_EQ(prefetch->mInitiateCount.load(), 1);
+    EXPECT_EQ(source->mPrefetch->mInitiateCount.load(), 1);
     EXPECT_EQ(source->mRenderCount.load(), 1);
-    EXPECT_TRUE(source->mPrefetchArrivedBeforeRender);
+    EXPECT_TRUE(source->mPrefetchCompleteBeforeRender);
     EXPECT_EQ(source->mRenderTime, frameTime);
     EXPECT_EQ(source->mRenderWidth, 16u);
-
     // Exactly once: nothing more arrives by the time the module is down.
     ML::VideoRenderer::Shutdown();
-    EXPECT_EQ(recorder.Count(), 1u);
+    EXPECT_EQ(mRecorder.Count(), 1u);
     EXPECT_TRUE(Asserts().empty());
 }
 
-TEST_F(VideoRendererTest, SourceWithoutPrefetchesIsStillRendered)
+TEST_F(VideoRendererTest, SourceOutcomesReachTheCallbackOnce)
 {
-    // A source whose reads are cheap collects no prefetch; the queue then
-    // completes the request with no frame and status 0, and the source is
-    // rendered on the delivering thread all the same.
+    // A source without prefetches is still rendered (on the delivering
+    // thread); a render request exception of the source gives no frame; any
+    // other failure gives no frame and is reported by the executor that
+    // delivered, and the queue keeps working.
+    const struct
+    {
+        int mDelayMs;
+        SourceFailure mFailure;
+        bool mFrame;
+        const char* mReported;
+    } cases[] = {
+        {kNoPrefetch, SourceFailure::kNone, true, nullptr},
+        {1, SourceFailure::kRenderRequestException, false, nullptr},
+        {1, SourceFailure::kStdException, false, "source failed"},
+    };
     ML::VideoRenderer::Initialize();
-    auto source = NewSource();
-    CallbackRecorder recorder;
-    const MF::FrameTime frameTime(TickTime::TicksToTime(1000));
-    ML::InitiateRender(AsSource(source), frameTime, MakeParams(frameTime, 8, 8), 77,
-                       recorder.Callback());
-    ASSERT_TRUE(recorder.WaitForCount(1));
-    const CallbackCall call = recorder.Get()[0];
-    ASSERT_TRUE(call.mFrame);
-    EXPECT_TRUE(IsFilledWith(call.mFrame, source->mColor));
-    EXPECT_EQ(call.mRequestID, 77u);
-    EXPECT_EQ(call.mSource.Get(), AsSource(source).Get());
-    EXPECT_FALSE(call.mCancelled);
-    EXPECT_EQ(call.mStatus, 0);
-    EXPECT_EQ(source->mRenderCount.load(), 1);
+    unsigned int id = 60;
+    for (const auto& testCase : cases)
+    {
+        SCOPED_TRACE(id);
+        auto source = NewSource(testCase.mDelayMs);
+        source->mFailure = testCase.mFailure;
+        Initiate(source, ++id);
+        const Delivery answer = Answer(id, source);
+        EXPECT_EQ(answer.mKind, testCase.mFrame ? Delivery::kComplete : Delivery::kError);
+        EXPECT_TRUE(testCase.mFrame ? IsFilledWith(answer.mFrame, source->mColor) : !answer.mFrame);
+        EXPECT_EQ(source->mRenderCount.load(), 1);
+        if (!testCase.mReported)
+        {
+            EXPECT_TRUE(Asserts().empty());
+            continue;
+        }
+        ASSERT_TRUE(WaitUntil([this] { return !Asserts().empty(); }));
+        EXPECT_NE(Asserts()[0].find(testCase.mReported), std::string::npos) << Asserts()[0];
+    }
+    RenderOneFrameAndCheck(1);
     ML::VideoRenderer::Shutdown();
-    EXPECT_EQ(recorder.Count(), 1u);
+    EXPECT_EQ(mRecorder.Count(), 4u);
 }
 
-TEST_F(VideoRendererTest, EmptySourceIsNeverQueuedNorCalledBack)
+TEST_F(VideoRendererTest, EmptySourceOrCallbackIsNeverCalledBack)
 {
     ML::VideoRenderer::Initialize();
-    CallbackRecorder emptyRecorder;
-    const MF::FrameTime frameTime(TickTime::TicksToTime(1000));
-    ML::InitiateRender(SourceRef(), frameTime, MakeParams(frameTime, 8, 8), 90,
-                       emptyRecorder.Callback());
+    ML::InitiateRender(QRT::InterfaceRef<ML::IRenderableSource>(), MF::FrameTime(),
+                       MakeParams(8, 8), 90, mRecorder.Callback());
     EXPECT_EQ(ML::RenderFrameQueue::Create()->GetStatistics().mIncoming, 0u);
-
-    // A render queued after it has gone all the way through the queue: had the
-    // empty one been queued, it would have been answered first.
-    CallbackRecorder recorder;
-    auto source = NewSource(NewPrefetch(std::chrono::milliseconds(1)));
-    ML::InitiateRender(AsSource(source), frameTime, MakeParams(frameTime, 8, 8), 91,
-                       recorder.Callback());
-    ASSERT_TRUE(recorder.WaitForCount(1));
-    EXPECT_EQ(recorder.Get()[0].mRequestID, 91u);
+    auto source = NewSource(1);
+    ML::InitiateRender(source, MF::FrameTime(), MakeParams(8, 8), 63, ML::InitiateRenderCallback());
+    ASSERT_TRUE(WaitUntil([&] { return source->mRenderCount.load() == 1; }));
+    // A render queued after both goes all the way through the queue: had the
+    // empty source been queued, it would have been answered first.
+    RenderOneFrameAndCheck(1);
     ML::VideoRenderer::Shutdown();
-    EXPECT_EQ(emptyRecorder.Count(), 0u);
+    EXPECT_EQ(mRecorder.Count(), 1u);
+    EXPECT_TRUE(Asserts().empty());
 }
 
 TEST_F(VideoRendererTest, CancelWhilePrefetchIsInFlightReachesTheCallbackAsCancelled)
 {
     ML::VideoRenderer::Initialize();
-    auto prefetch = NewPrefetch(std::chrono::milliseconds(-1));
-    auto source = NewSource(prefetch);
-    CallbackRecorder recorder;
-    const MF::FrameTime frameTime(TickTime::TicksToTime(2000));
+    auto source = NewSource(kNeverArrives);
     const unsigned int id = ML::GetNextRequestID();
-    ML::InitiateRender(AsSource(source), frameTime, MakeParams(frameTime, 8, 8), id,
-                       recorder.Callback());
+    Initiate(source, id);
     ASSERT_TRUE(WaitUntil(
         [] { return ML::RenderFrameQueue::Create()->GetStatistics().mPrefetchWaiting == 1; }));
-    EXPECT_EQ(prefetch->mInitiateCount.load(), 1);
-    EXPECT_EQ(recorder.Count(), 0u);
-
+    EXPECT_EQ(source->mPrefetch->mInitiateCount.load(), 1);
+    EXPECT_EQ(mRecorder.Count(), 0u);
     ML::CancelRender(id);
-    ASSERT_TRUE(recorder.WaitForCount(1));
-    const CallbackCall call = recorder.Get()[0];
-    EXPECT_FALSE(call.mFrame);
-    EXPECT_EQ(call.mRequestID, id);
-    EXPECT_EQ(call.mSource.Get(), AsSource(source).Get());
-    EXPECT_TRUE(call.mCancelled);
-    EXPECT_EQ(call.mStatus, 0);
+    const Delivery answer = Answer(id, source);
+    EXPECT_EQ(answer.mKind, Delivery::kCancelled);
+    EXPECT_FALSE(answer.mFrame);
     EXPECT_EQ(source->mRenderCount.load(), 0);
-    EXPECT_GE(prefetch->mCancelCount.load(), 1);
-
-    // A second cancel of the same identifier finds nothing.
+    EXPECT_GE(source->mPrefetch->mCancelCount.load(), 1);
+    // A second cancel of the same identifier, or of unknown ones, finds nothing.
     ML::CancelRender(id);
-    ML::VideoRenderer::Shutdown();
-    EXPECT_EQ(recorder.Count(), 1u);
-}
-
-TEST_F(VideoRendererTest, CancellingAnUnknownIdentifierChangesNothing)
-{
-    ML::VideoRenderer::Initialize();
-    auto prefetch = NewPrefetch(std::chrono::milliseconds(20));
-    auto source = NewSource(prefetch);
-    CallbackRecorder recorder;
-    const MF::FrameTime frameTime(TickTime::TicksToTime(3000));
-    ML::InitiateRender(AsSource(source), frameTime, MakeParams(frameTime, 8, 4), 500,
-                       recorder.Callback());
+    auto other = NewSource(20);
+    Initiate(other, 500);
     ML::CancelRender(501);
     ML::CancelRender(0);
-    ASSERT_TRUE(recorder.WaitForCount(1));
-    const CallbackCall call = recorder.Get()[0];
-    EXPECT_FALSE(call.mCancelled);
-    EXPECT_EQ(call.mRequestID, 500u);
-    EXPECT_TRUE(IsFilledWith(call.mFrame, source->mColor));
-    EXPECT_EQ(prefetch->mCancelCount.load(), 0);
+    const Delivery answer500 = Answer(500, other);
+    EXPECT_EQ(answer500.mKind, Delivery::kComplete);
+    EXPECT_TRUE(IsFilledWith(answer500.mFrame, other->mColor));
+    EXPECT_EQ(other->mPrefetch->mCancelCount.load(), 0);
     ML::VideoRenderer::Shutdown();
-    EXPECT_EQ(recorder.Count(), 1u);
-}
-
-TEST_F(VideoRendererTest, RenderRequestExceptionOfTheSourceGivesNoFrame)
-{
-    ML::VideoRenderer::Initialize();
-    auto source = NewSource(NewPrefetch(std::chrono::milliseconds(1)));
-    source->mFailure = SourceFailure::kRenderRequestException;
-    CallbackRecorder recorder;
-    const MF::FrameTime frameTime(TickTime::TicksToTime(1000));
-    ML::InitiateRender(AsSource(source), frameTime, MakeParams(frameTime, 8, 8), 61,
-                       recorder.Callback());
-    ASSERT_TRUE(recorder.WaitForCount(1));
-    const CallbackCall call = recorder.Get()[0];
-    EXPECT_FALSE(call.mFrame);
-    EXPECT_EQ(call.mRequestID, 61u);
-    EXPECT_FALSE(call.mCancelled);
-    EXPECT_EQ(call.mStatus, 0);
-    EXPECT_EQ(source->mRenderCount.load(), 1);
-    ML::VideoRenderer::Shutdown();
-    EXPECT_EQ(recorder.Count(), 1u);
-    EXPECT_TRUE(Asserts().empty());
-}
-
-TEST_F(VideoRendererTest, OtherSourceFailureCallsBackThenReachesTheDeliveringThread)
-{
-    ML::VideoRenderer::Initialize();
-    auto source = NewSource(NewPrefetch(std::chrono::milliseconds(1)));
-    source->mFailure = SourceFailure::kStdException;
-    CallbackRecorder recorder;
-    const MF::FrameTime frameTime(TickTime::TicksToTime(1000));
-    ML::InitiateRender(AsSource(source), frameTime, MakeParams(frameTime, 8, 8), 62,
-                       recorder.Callback());
-    ASSERT_TRUE(recorder.WaitForCount(1));
-    const CallbackCall call = recorder.Get()[0];
-    EXPECT_FALSE(call.mFrame);
-    EXPECT_EQ(call.mRequestID, 62u);
-    EXPECT_FALSE(call.mCancelled);
-    EXPECT_EQ(call.mStatus, 0);
-    // The executor that delivered reports the escaped failure.
-    ASSERT_TRUE(WaitUntil([this] { return !Asserts().empty(); }));
-    EXPECT_NE(Asserts()[0].find("source failed"), std::string::npos) << Asserts()[0];
-
-    // The queue keeps working.
-    RenderOneFrameAndCheck(std::chrono::milliseconds(1));
-    ML::VideoRenderer::Shutdown();
-    EXPECT_EQ(recorder.Count(), 1u);
-}
-
-TEST_F(VideoRendererTest, EmptyCallbackIsNotCalled)
-{
-    ML::VideoRenderer::Initialize();
-    auto source = NewSource(NewPrefetch(std::chrono::milliseconds(1)));
-    const MF::FrameTime frameTime(TickTime::TicksToTime(1000));
-    ML::InitiateRender(AsSource(source), frameTime, MakeParams(frameTime, 8, 8), 63,
-                       ML::InitiateRenderCallback());
-    ASSERT_TRUE(WaitUntil([&] { return source->mRenderCount.load() == 1; }));
-    // A render queued after it is answered normally, and nothing was reported.
-    RenderOneFrameAndCheck(std::chrono::milliseconds(1));
-    ML::VideoRenderer::Shutdown();
-    EXPECT_TRUE(Asserts().empty());
+    EXPECT_EQ(mRecorder.Count(), 2u);
 }
 
 TEST_F(VideoRendererTest, ConcurrentRendersAndCancelsAreEachAnsweredExactlyOnce)
@@ -512,10 +426,8 @@ TEST_F(VideoRendererTest, ConcurrentRendersAndCancelsAreEachAnsweredExactlyOnce)
     ML::VideoRenderer::Initialize();
     constexpr int kThreads = 4;
     constexpr int kPerThread = 20;
-    CallbackRecorder recorder;
-    std::mutex idsMutex;
-    std::vector<unsigned int> ids;
-    std::vector<QRT::InterfaceRef<ColorSource>> sources;
+    std::mutex sourcesMutex;
+    std::vector<std::pair<unsigned int, QRT::InterfaceRef<TestSource>>> sources;
     std::vector<std::thread> threads;
     for (int t = 0; t < kThreads; ++t)
     {
@@ -526,47 +438,37 @@ TEST_F(VideoRendererTest, ConcurrentRendersAndCancelsAreEachAnsweredExactlyOnce)
                 {
                     // Half never complete: those must end cancelled.
                     const bool hung = i % 2 == 1;
-                    auto source =
-                        NewSource(NewPrefetch(std::chrono::milliseconds(hung ? -1 : i % 4)));
+                    auto source = NewSource(hung ? kNeverArrives : i % 4);
                     source->mColor[0] = static_cast<std::uint8_t>(t);
                     const unsigned int id = ML::GetNextRequestID();
-                    const MF::FrameTime frameTime(TickTime::TicksToTime(1000 * i));
-                    ML::InitiateRender(AsSource(source), frameTime, MakeParams(frameTime, 8, 8), id,
-                                       recorder.Callback());
+                    Initiate(source, id, MF::FrameTime(TickTime::TicksToTime(1000 * i)));
                     if (hung || i % 3 == 0)
                         ML::CancelRender(id);
-                    std::lock_guard lock(idsMutex);
-                    ids.push_back(id);
-                    sources.push_back(source);
+                    std::lock_guard lock(sourcesMutex);
+                    sources.emplace_back(id, source);
                 }
             });
     }
     for (std::thread& thread : threads)
         thread.join();
-    ASSERT_TRUE(recorder.WaitForCount(kThreads * kPerThread));
-
-    for (std::size_t i = 0; i < ids.size(); ++i)
+    ASSERT_TRUE(mRecorder.WaitForCount(kThreads * kPerThread));
+    for (const auto& [id, source] : sources)
     {
-        const std::vector<CallbackCall> calls = recorder.For(ids[i]);
-        ASSERT_EQ(calls.size(), 1u) << "request " << ids[i];
-        const CallbackCall& call = calls[0];
-        EXPECT_EQ(call.mSource.Get(), AsSource(sources[i]).Get());
-        EXPECT_EQ(call.mStatus, 0);
-        if (call.mCancelled)
+        const Delivery answer = Answer(id, source);
+        if (answer.mKind == Delivery::kCancelled)
         {
-            EXPECT_FALSE(call.mFrame);
-            EXPECT_EQ(sources[i]->mRenderCount.load(), 0);
+            EXPECT_FALSE(answer.mFrame);
+            EXPECT_EQ(source->mRenderCount.load(), 0);
         }
         else
         {
             // A completed one is one whose prefetch arrived: it was rendered.
-            EXPECT_TRUE(sources[i]->mPrefetch &&
-                        static_cast<DelayedPrefetch*>(sources[i]->mPrefetch.Get())->IsComplete());
-            EXPECT_TRUE(IsFilledWith(call.mFrame, sources[i]->mColor));
+            EXPECT_TRUE(source->mPrefetch->IsComplete());
+            EXPECT_TRUE(IsFilledWith(answer.mFrame, source->mColor));
         }
     }
     ML::VideoRenderer::Shutdown();
-    EXPECT_EQ(recorder.Count(), static_cast<std::size_t>(kThreads * kPerThread));
+    EXPECT_EQ(mRecorder.Count(), static_cast<std::size_t>(kThreads * kPerThread));
 }
 
 } // namespace
@@ -583,20 +485,19 @@ TEST_F(VideoRendererTest, PatternSourceRendersEndToEndWithItsPixels)
         media->GetFrameRate(), media->GetFieldType(), media->GetPixelAspectRatio(),
         media->GetColorProfile());
     ASSERT_TRUE(source);
-
-    CallbackRecorder recorder;
     const MF::FrameTime frameTime(TickTime::TicksToTime(0));
-    ML::InitiateRender(source, frameTime, MakeParams(frameTime, 16, 8), 501, recorder.Callback());
-    ML::InitiateRender(source, frameTime, MakeParams(frameTime, 64, 36), 502, recorder.Callback());
-    ASSERT_TRUE(recorder.WaitForCount(2));
-    const std::uint8_t expected[4] = {0xCC, 0x66, 0x33, 0xFF}; // B, G, R, A
-    for (const CallbackCall& call : recorder.Get())
+    for (const auto& [id, width, height] : {std::tuple{501u, 16u, 8u}, std::tuple{502u, 64u, 36u}})
+        ML::InitiateRender(source, frameTime, MakeParams(width, height, frameTime), id,
+                           mRecorder.Callback());
+    ASSERT_TRUE(mRecorder.WaitForCount(2));
+    for (const Delivery& answer : mRecorder.Get())
     {
-        ASSERT_TRUE(call.mFrame) << call.mRequestID;
-        EXPECT_FALSE(call.mCancelled);
-        EXPECT_EQ(call.mStatus, 0);
-        EXPECT_EQ(call.mFrame->GetBounds().Width(), call.mRequestID == 501 ? 16 : 64);
-        EXPECT_TRUE(IsFilledWith(call.mFrame, expected)) << call.mRequestID;
+        SCOPED_TRACE(answer.mRequestID);
+        EXPECT_EQ(answer.mKind, Delivery::kComplete);
+        EXPECT_EQ(answer.mStatus, 0);
+        EXPECT_TRUE(IsFilledWith(answer.mFrame, {0xCC, 0x66, 0x33, 0xFF}));
+        ASSERT_TRUE(answer.mFrame);
+        EXPECT_EQ(answer.mFrame->GetBounds().Width(), answer.mRequestID == 501 ? 16 : 64);
     }
     ML::VideoRenderer::Shutdown();
 }

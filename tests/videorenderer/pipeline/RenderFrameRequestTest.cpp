@@ -1,60 +1,81 @@
 #include "ML/RenderFrameRequest.h"
 
+#include "BE/CutlistProvider.h"
 #include "BE/VideoSources.h"
 #include "ContractExpect.h"
 #include "ML/CutlistRenderer.h"
 #include "PipelineTestSupport.h"
 #include "QRT/Hash.h"
+#include "TestCutlists.h"
+#include "TestFrames.h"
+#include "TestNode.h"
+#include "TestPrefetch.h"
+#include "TestProducer.h"
 #include "VF/SharedVideoFrameCache.h"
+
+#include <tuple>
 
 #include <gtest/gtest.h>
 
-using namespace pltest;
+using namespace vrtest;
 using mvxmediatypes::TickTime;
 
 namespace
 {
 
-// The request key, mixed here run by run from the documented order.
+// The request key, mixed here from the documented order: prefix, content
+// hash, each format's 64-bit value, the composite-on-black flag, the two
+// qualities, all little-endian.
 QRT::Guid ExpectedKey(const QRT::Guid& inContent,
                       const std::vector<mvxmediatypes::PixelFormat>& inFormats,
                       bool inCompositeOnBlack, std::uint32_t inQuality,
                       std::uint32_t inSecondaryQuality)
 {
     QRT::HashValue hash;
+    const auto mix = [&hash](std::uint64_t inValue, int inBytes)
+    {
+        std::uint8_t bytes[8];
+        for (int i = 0; i < inBytes; ++i)
+            bytes[i] = static_cast<std::uint8_t>(inValue >> (8 * i));
+        QRT::MixHash::MixInData(hash, bytes, static_cast<std::size_t>(inBytes));
+    };
     const std::string prefix = "Hash Including Render Params";
     QRT::MixHash::MixInData(hash, prefix.data(), prefix.size());
-    const auto bytes = QRT::GuidToBytes(inContent);
-    QRT::MixHash::MixInData(hash, bytes.data(), 16);
+    QRT::MixHash::MixInData(hash, QRT::GuidToBytes(inContent).data(), 16);
     for (const auto& format : inFormats)
-    {
-        std::uint8_t value[8];
-        const std::uint64_t raw = format.GetValue();
-        for (int i = 0; i < 8; ++i)
-            value[i] = static_cast<std::uint8_t>(raw >> (8 * i));
-        QRT::MixHash::MixInData(hash, value, 8);
-    }
-    const std::uint8_t flag = inCompositeOnBlack ? 1 : 0;
-    QRT::MixHash::MixInData(hash, &flag, 1);
-    std::uint8_t quality[4];
-    for (int i = 0; i < 4; ++i)
-        quality[i] = static_cast<std::uint8_t>(inQuality >> (8 * i));
-    QRT::MixHash::MixInData(hash, quality, 4);
-    for (int i = 0; i < 4; ++i)
-        quality[i] = static_cast<std::uint8_t>(inSecondaryQuality >> (8 * i));
-    QRT::MixHash::MixInData(hash, quality, 4);
+        mix(format.GetValue(), 8);
+    mix(inCompositeOnBlack ? 1 : 0, 1);
+    mix(inQuality, 4);
+    mix(inSecondaryQuality, 4);
     return QRT::HashValueToGuid(hash);
 }
 
 class RenderFrameRequestTest : public ::testing::Test
 {
 protected:
-    void SetUp() override { VF::SharedVideoFrameCache::Clear(); }
+    void SetUp() override
+    {
+        VF::SharedVideoFrameCache::Clear();
+        mCutlist->mNode = mNode;
+        mProvider->mCutlists[0] = mCutlist;
+    }
+
+    // Settings of request inRequestID rendered from mProvider's cutlists.
+    ML::RenderFrameRequestSettings CutlistSettings(std::uint32_t inRequestID)
+    {
+        auto settings = MakeSettings(inRequestID, nullptr);
+        settings.mCutlistProvider = mProvider;
+        return settings;
+    }
 
     QRT::InterfaceRef<TestProducer> mProducer = QRT::Allocated<TestProducer>::CreateInstance();
+    QRT::InterfaceRef<TestNode> mNode = QRT::Allocated<TestNode>::CreateInstance();
+    QRT::InterfaceRef<TestCutlist> mCutlist = QRT::Allocated<TestCutlist>::CreateInstance();
+    QRT::InterfaceRef<BareCutlistProvider> mProvider =
+        QRT::Allocated<BareCutlistProvider>::CreateInstance();
 };
 
-TEST_F(RenderFrameRequestTest, KeyMixesContentHashFormatsFlagAndQualitiesInOrder)
+TEST_F(RenderFrameRequestTest, KeyMixesContentFormatsFlagAndQualitiesInOrderButNotCallerOrID)
 {
     auto settings = MakeSettings(7, mProducer);
     settings.mRequestedFormats = {mvxmediatypes::kPixelFormat_VUYA_4444_8u,
@@ -62,30 +83,19 @@ TEST_F(RenderFrameRequestTest, KeyMixesContentHashFormatsFlagAndQualitiesInOrder
     settings.mCompositeOnBlack = true;
     settings.mQuality = 4;
     settings.mSecondaryQuality = 0xFFFFFFFFu;
-    ML::RenderFrameRequest request(settings, false, true);
+    const ML::RenderFrameRequest request(settings, false, true);
     EXPECT_EQ(request.mKey,
               ExpectedKey(mProducer->mHash, settings.mRequestedFormats, true, 4, 0xFFFFFFFFu));
     EXPECT_EQ(mProducer->mHashCount.load(), 1);
-}
 
-TEST_F(RenderFrameRequestTest, FormatOrderChangesKeyButCallerPriorityAndIdentifierDoNot)
-{
-    auto first = MakeSettings(1, mProducer);
-    first.mRequestedFormats = {mvxmediatypes::kPixelFormat_BGRA_4444_8u,
-                               mvxmediatypes::kPixelFormat_VUYA_4444_8u};
-    auto swapped = first;
-    swapped.mRequestedFormats = {mvxmediatypes::kPixelFormat_VUYA_4444_8u,
-                                 mvxmediatypes::kPixelFormat_BGRA_4444_8u};
-    auto other = first;
+    auto swapped = settings;
+    std::swap(swapped.mRequestedFormats[0], swapped.mRequestedFormats[1]);
+    EXPECT_NE(ML::RenderFrameRequest(swapped, false, true).mKey, request.mKey);
+    auto other = settings;
     other.mRequestID = 99;
     other.mPriority = 10;
     other.mCaller = &other;
-    const ML::RenderFrameRequest a(first, false, true);
-    const ML::RenderFrameRequest b(swapped, false, true);
-    const ML::RenderFrameRequest c(other, false, true);
-    EXPECT_NE(a.mKey, b.mKey);
-    EXPECT_EQ(a.mKey, c.mKey);
-    EXPECT_FALSE(a.mKey.IsNil());
+    EXPECT_EQ(ML::RenderFrameRequest(other, false, true).mKey, request.mKey);
 }
 
 TEST_F(RenderFrameRequestTest, DeferredKeyStaysNilUntilComputed)
@@ -94,10 +104,11 @@ TEST_F(RenderFrameRequestTest, DeferredKeyStaysNilUntilComputed)
     EXPECT_TRUE(request.mKey.IsNil());
     EXPECT_EQ(mProducer->mHashCount.load(), 0);
     request.ComputeKey(true);
-    EXPECT_FALSE(request.mKey.IsNil());
+    EXPECT_EQ(request.mKey, ExpectedKey(mProducer->mHash,
+                                        {mvxmediatypes::kPixelFormat_BGRA_4444_8u}, false, 0, 0));
 }
 
-TEST_F(RenderFrameRequestTest, NilContentKeepsNilKeyAndRenderBreaksContracts)
+TEST_F(RenderFrameRequestTest, NilContentOrNoFormatsBreakContracts)
 {
     ML::RenderFrameRequest request = MakeRequest(MakeSettings(4, nullptr));
     request.ComputeKey(true);
@@ -107,10 +118,6 @@ TEST_F(RenderFrameRequestTest, NilContentKeepsNilKeyAndRenderBreaksContracts)
                           "inPixelFormat != MF::kPixelFormat_Invalid");
     EXPECT_INPUT_CONTRACT(request.Render(frame, mvxmediatypes::kPixelFormat_BGRA_4444_8u),
                           "mKey != QRT::Guid()");
-}
-
-TEST_F(RenderFrameRequestTest, EmptyFormatListBreaksContract)
-{
     auto settings = MakeSettings(5, mProducer);
     settings.mRequestedFormats.clear();
     EXPECT_INPUT_CONTRACT(ML::RenderFrameRequest(settings, true, false),
@@ -125,44 +132,47 @@ TEST_F(RenderFrameRequestTest, RenderFormatIsFirstRasterFourFourFourElseBGRA)
     ML::RenderFrameRequest fallback = MakeRequest(settings);
     EXPECT_EQ(fallback.ChooseRenderPixelFormat(), mvxmediatypes::kPixelFormat_BGRA_4444_8u);
     EXPECT_EQ(fallback.mPixelFormat, mvxmediatypes::kPixelFormat_BGRA_4444_8u);
-
     settings.mRequestedFormats = {mvxmediatypes::kPixelFormat_YUYV_422_8u,
                                   mvxmediatypes::kPixelFormat_VUYA_4444_8u,
                                   mvxmediatypes::kPixelFormat_BGRA_4444_8u};
-    ML::RenderFrameRequest chosen = MakeRequest(settings);
-    EXPECT_EQ(chosen.ChooseRenderPixelFormat(), mvxmediatypes::kPixelFormat_VUYA_4444_8u);
+    EXPECT_EQ(MakeRequest(settings).ChooseRenderPixelFormat(),
+              mvxmediatypes::kPixelFormat_VUYA_4444_8u);
 }
 
-TEST_F(RenderFrameRequestTest, SingleFieldInSecondHalfOfUpperFirstFrameMovesBackHalfAFrame)
+TEST_F(RenderFrameRequestTest, SingleFieldOfUpperFirstFrameIsTheHalfTheTimeFallsIn)
 {
     const std::int64_t frame = mvxmediatypes::kFrameRate_Video25.GetTicksPerFrame();
     const std::int64_t half = frame / 2;
-    auto settings = MakeSettings(1, mProducer);
-    settings.mFieldType = 1;
-    settings.mRenderSingleField = true;
-    settings.mTime = MF::FrameTime(TickTime::TicksToTime(3 * frame + half + half / 2));
-    ML::RenderFrameRequest late = MakeRequest(settings);
-    ML::CutlistRenderParams params;
-    late.BuildRenderParams(true, params);
-    EXPECT_EQ(params.mSingleField, 2u);
-    const TickTime moved = TickTime::TicksToTime(3 * frame + half / 2);
-    EXPECT_EQ(params.GetFrameTime(), MF::FrameTime(moved, moved + TickTime::TicksToTime(half)));
-
-    settings.mTime = MF::FrameTime(TickTime::TicksToTime(3 * frame + half / 2));
-    ML::RenderFrameRequest early = MakeRequest(settings);
-    early.BuildRenderParams(true, params);
-    EXPECT_EQ(params.mSingleField, 1u);
-    EXPECT_EQ(params.GetFrameTime(), MF::FrameTime(moved, moved + TickTime::TicksToTime(half)));
-
-    settings.mRenderSingleField = false;
-    settings.mFieldType = 2;
-    ML::RenderFrameRequest whole = MakeRequest(settings);
-    whole.BuildRenderParams(true, params);
-    EXPECT_EQ(params.mSingleField, 0u);
-    EXPECT_EQ(params.GetFrameTime(), MF::FrameTime(moved + TickTime::TicksToTime(half), moved));
+    const TickTime start = TickTime::TicksToTime(3 * frame + half / 2);
+    const TickTime later = start + TickTime::TicksToTime(half);
+    const struct
+    {
+        std::uint32_t mFieldType;
+        bool mSingle;
+        std::int64_t mTime;
+        std::uint32_t mExpectedField;
+        MF::FrameTime mExpectedTime;
+    } cases[] = {
+        // In the second half: moved back half a frame, second field.
+        {1, true, 3 * frame + half + half / 2, 2, MF::FrameTime(start, later)},
+        {1, true, 3 * frame + half / 2, 1, MF::FrameTime(start, later)},
+        {2, false, 3 * frame + half / 2, 0, MF::FrameTime(later, start)},
+    };
+    for (const auto& testCase : cases)
+    {
+        SCOPED_TRACE(testCase.mTime);
+        auto settings = MakeSettings(1, mProducer);
+        settings.mFieldType = testCase.mFieldType;
+        settings.mRenderSingleField = testCase.mSingle;
+        settings.mTime = MF::FrameTime(TickTime::TicksToTime(testCase.mTime));
+        ML::CutlistRenderParams params;
+        MakeRequest(settings).BuildRenderParams(true, params);
+        EXPECT_EQ(params.mSingleField, testCase.mExpectedField);
+        EXPECT_EQ(params.GetFrameTime(), testCase.mExpectedTime);
+    }
 }
 
-TEST_F(RenderFrameRequestTest, RenderParamsCarryRequestFields)
+TEST_F(RenderFrameRequestTest, RenderParamsCarryRequestFieldsAndProviderFieldType)
 {
     auto settings = MakeSettings(1, mProducer, 360, 240);
     settings.mFullFrameRect = QRT::ParamRect(0, 0, 720, 480);
@@ -171,57 +181,47 @@ TEST_F(RenderFrameRequestTest, RenderParamsCarryRequestFields)
     settings.mCutlistChoice = 3;
     settings.mCutlistParameter = 77;
     settings.mRenderFlags = 24;
-    ML::RenderFrameRequest request = MakeRequest(settings);
     ML::CutlistRenderParams params;
-    request.BuildRenderParams(true, params);
-    EXPECT_EQ(params.mWidth, 360u);
-    EXPECT_EQ(params.mHeight, 240u);
-    EXPECT_EQ(params.mFullFrameWidth, 720u);
-    EXPECT_EQ(params.mFullFrameHeight, 480u);
-    EXPECT_EQ(params.mSecondaryQuality, 4u);
-    EXPECT_EQ(params.mQuality, 4u);
-    EXPECT_DOUBLE_EQ(params.mHorizontalScale, 0.5);
-    EXPECT_DOUBLE_EQ(params.mVerticalScale, 0.5);
-    EXPECT_EQ(params.mCutlistChoiceBit, 1u);
-    EXPECT_EQ(params.mCutlistParameter, 77);
-    EXPECT_EQ(params.mRenderFlags, 24u);
+    MakeRequest(settings).BuildRenderParams(true, params);
+    EXPECT_EQ(
+        std::tuple(params.mWidth, params.mHeight, params.mFullFrameWidth, params.mFullFrameHeight),
+        std::tuple(360u, 240u, 720u, 480u));
+    // An unset secondary quality takes the quality.
+    EXPECT_EQ(std::tuple(params.mQuality, params.mSecondaryQuality), std::tuple(4u, 4u));
+    EXPECT_EQ(std::tuple(params.mHorizontalScale, params.mVerticalScale), std::tuple(0.5, 0.5));
+    EXPECT_EQ(std::tuple(params.mCutlistChoiceBit, params.mCutlistParameter, params.mRenderFlags),
+              std::tuple(1u, 77, 24u));
     EXPECT_EQ(params.mFieldType, 0u);
-}
 
-TEST_F(RenderFrameRequestTest, ProviderFieldTypeReplacesRequestsUnlessAsSource)
-{
-    auto provider = QRT::Allocated<TestCutlistProvider>::CreateInstance();
-    auto settings = MakeSettings(1, mProducer);
+    // A provider's field type replaces the request's, unless it is "as source".
     settings.mFieldType = 1;
-    settings.mCutlistProvider = QRT::InterfaceRef<MF::IRenderableCutlistProvider>(provider);
-    ML::RenderFrameRequest request = MakeRequest(settings);
-    ML::CutlistRenderParams params;
-    request.BuildRenderParams(true, params);
-    EXPECT_EQ(params.mFieldType, 1u);
-    provider->mFieldType = mvxmediatypes::kFieldType_LowerFirst;
-    request.BuildRenderParams(true, params);
-    EXPECT_EQ(params.mFieldType, 2u);
+    BE::CutlistProviderSettings described;
+    for (const auto& [type, expected] : {std::pair{mvxmediatypes::kFieldType_AsSource, 1u},
+                                         std::pair{mvxmediatypes::kFieldType_LowerFirst, 2u}})
+    {
+        described.mFieldType = type;
+        settings.mCutlistProvider = BE::CreateCutlistProvider(described);
+        MakeRequest(settings).BuildRenderParams(true, params);
+        EXPECT_EQ(params.mFieldType, expected);
+    }
 }
 
 TEST_F(RenderFrameRequestTest, CutlistChoiceSelectsGetterAndIsFetchedOnce)
 {
-    auto provider = QRT::Allocated<TestCutlistProvider>::CreateInstance();
-    for (auto& cutlist : provider->mCutlists)
-        cutlist = QRT::InterfaceRef<MF::IRenderableCutlist>(
-            QRT::Allocated<TestCutlist>::CreateInstance());
+    for (auto& cutlist : mProvider->mCutlists)
+        cutlist = QRT::Allocated<TestCutlist>::CreateInstance();
     const std::uint32_t choices[] = {0, 1, 3};
-    for (int i = 0; i < 3; ++i)
+    for (std::size_t i = 0; i < 3; ++i)
     {
-        auto settings = MakeSettings(1, nullptr);
-        settings.mCutlistProvider = QRT::InterfaceRef<MF::IRenderableCutlistProvider>(provider);
+        auto settings = CutlistSettings(1);
         settings.mCutlistChoice = choices[i];
         ML::RenderFrameRequest request = MakeRequest(settings);
-        EXPECT_EQ(request.GetRenderCutlist(true), provider->mCutlists[i]);
-        EXPECT_EQ(request.GetRenderCutlist(true), provider->mCutlists[i]);
-        EXPECT_EQ(provider->mCalls[i].load(), 1);
+        EXPECT_EQ(request.GetRenderCutlist(true), mProvider->mCutlists[i]);
+        EXPECT_EQ(request.GetRenderCutlist(true), mProvider->mCutlists[i]);
+        ASSERT_EQ(mProvider->Calls().size(), i + 1u);
+        EXPECT_EQ(mProvider->Calls().back().mWhich, static_cast<int>(i));
     }
-    auto settings = MakeSettings(1, nullptr);
-    settings.mCutlistProvider = QRT::InterfaceRef<MF::IRenderableCutlistProvider>(provider);
+    auto settings = CutlistSettings(1);
     settings.mCutlistChoice = 2;
     ML::RenderFrameRequest bad = MakeRequest(settings);
     EXPECT_INPUT_CONTRACT(bad.GetRenderCutlist(true),
@@ -230,26 +230,18 @@ TEST_F(RenderFrameRequestTest, CutlistChoiceSelectsGetterAndIsFetchedOnce)
 
 TEST_F(RenderFrameRequestTest, CutlistKeyUsesProducerInNodeTimeAndBlackHashOutsideSegments)
 {
-    auto node = QRT::Allocated<TestNode>::CreateInstance();
-    node->mProducer = QRT::InterfaceRef<ML::IRenderableNodeProducer>(mProducer);
-    auto cutlist = QRT::Allocated<TestCutlist>::CreateInstance();
-    cutlist->mNode = QRT::InterfaceRef<MF::IRenderableNode>(node);
-    cutlist->mStart = TickTime::TicksToTime(1000);
-    cutlist->mEnd = TickTime::TicksToTime(5000);
-    cutlist->mOffset = TickTime::TicksToTime(100);
-    auto provider = QRT::Allocated<TestCutlistProvider>::CreateInstance();
-    provider->mCutlists[0] = QRT::InterfaceRef<MF::IRenderableCutlist>(cutlist);
-
-    auto settings = MakeSettings(2, nullptr);
-    settings.mCutlistProvider = QRT::InterfaceRef<MF::IRenderableCutlistProvider>(provider);
+    mNode->mProducer = mProducer;
+    mCutlist->mStart = TickTime::TicksToTime(1000);
+    mCutlist->mEnd = TickTime::TicksToTime(5000);
+    mCutlist->mOffset = TickTime::TicksToTime(100);
+    auto settings = CutlistSettings(2);
     ML::RenderFrameRequest inside = MakeRequest(settings);
     inside.ComputeKey(true);
     EXPECT_EQ(inside.mKey, ExpectedKey(mProducer->mHash, settings.mRequestedFormats, false, 0, 0));
     EXPECT_EQ(inside.mProducer.Get(), static_cast<ML::IRenderableNodeProducer*>(mProducer.Get()));
     EXPECT_EQ(inside.mNodeTime, MF::FrameTime(TickTime::TicksToTime(2000 - 1000 + 100)));
 
-    settings.mRequestID = 9; // time 9000: after the segment
-    settings.mTime = MF::FrameTime(TickTime::TicksToTime(9000));
+    settings.mTime = MF::FrameTime(TickTime::TicksToTime(9000)); // after the segment
     ML::RenderFrameRequest outside = MakeRequest(settings);
     outside.ComputeKey(true);
     ML::CutlistRenderParams params;
@@ -258,7 +250,7 @@ TEST_F(RenderFrameRequestTest, CutlistKeyUsesProducerInNodeTimeAndBlackHashOutsi
                                         settings.mRequestedFormats, false, 0, 0));
     EXPECT_FALSE(outside.mProducer);
 
-    cutlist->mLookupStatus = static_cast<QRT::Result>(0xA0990002u);
+    mCutlist->mLookupStatus = static_cast<QRT::Result>(0xA0990002u);
     ML::RenderFrameRequest failing = MakeRequest(settings);
     try
     {
@@ -272,19 +264,12 @@ TEST_F(RenderFrameRequestTest, CutlistKeyUsesProducerInNodeTimeAndBlackHashOutsi
     }
 }
 
-TEST_F(RenderFrameRequestTest, StartPrefetchesCollectsFromNodeAndStartsEachHandleOnce)
+TEST_F(RenderFrameRequestTest, OnlyNormalPriorityStartsTheNodesPrefetchesOnce)
 {
     auto prefetch = QRT::Allocated<TestPrefetch>::CreateInstance();
-    auto node = QRT::Allocated<TestNode>::CreateInstance();
-    node->mPrefetch = QRT::InterfaceRef<ML::IRenderableNodePrefetch>(prefetch);
-    auto cutlist = QRT::Allocated<TestCutlist>::CreateInstance();
-    cutlist->mNode = QRT::InterfaceRef<MF::IRenderableNode>(node);
-    cutlist->mOffset = TickTime::TicksToTime(500);
-    auto provider = QRT::Allocated<TestCutlistProvider>::CreateInstance();
-    provider->mCutlists[0] = QRT::InterfaceRef<MF::IRenderableCutlist>(cutlist);
-
-    auto settings = MakeSettings(3, nullptr);
-    settings.mCutlistProvider = QRT::InterfaceRef<MF::IRenderableCutlistProvider>(provider);
+    mNode->mPrefetch = prefetch;
+    mCutlist->mOffset = TickTime::TicksToTime(500);
+    auto settings = CutlistSettings(3);
     settings.mPriority = 100;
     ML::RenderFrameRequest low = MakeRequest(settings);
     low.StartPrefetches();
@@ -295,77 +280,71 @@ TEST_F(RenderFrameRequestTest, StartPrefetchesCollectsFromNodeAndStartsEachHandl
     normal.StartPrefetches();
     ASSERT_EQ(normal.mActivePrefetches.size(), 1u);
     EXPECT_EQ(prefetch->mInitiateCount.load(), 1);
-    ASSERT_EQ(node->mPrefetchRanges.size(), 1u);
-    EXPECT_EQ(node->mPrefetchRanges[0].first, TickTime::TicksToTime(3500));
+    ASSERT_EQ(mNode->PrefetchRanges().size(), 1u);
+    EXPECT_EQ(mNode->PrefetchRanges()[0].first, TickTime::TicksToTime(3500));
     EXPECT_FALSE(normal.PrefetchesComplete());
-    prefetch->mFrame = VF::CreateVideoFrame(mvxmediatypes::kPixelFormat_BGRA_4444_8u, 4, 4,
-                                            mvxmediatypes::kPixelAspectRatio_Square, true, false);
-    prefetch->mComplete = true;
+    const auto frame = MakeFrame(4, 4);
+    prefetch->Complete(frame);
     EXPECT_TRUE(normal.PrefetchesComplete());
-    FrameRef frame;
-    normal.GetPrefetchResult(frame);
-    EXPECT_EQ(frame, prefetch->mFrame);
+    FrameRef result;
+    normal.GetPrefetchResult(result);
+    EXPECT_EQ(result, frame);
 }
 
 TEST_F(RenderFrameRequestTest, PrefetchOnlyRequestTakesGivenHandlesAndCopiesShareResult)
 {
     auto prefetch = QRT::Allocated<TestPrefetch>::CreateInstance();
-    ML::RenderFrameRequest request(
-        TickTime::TicksToTime(10),
-        ML::RenderableNodePrefetchList{QRT::InterfaceRef<ML::IRenderableNodePrefetch>(prefetch)},
-        12);
+    ML::RenderFrameRequest request = PrefetchOnly(12, prefetch);
     EXPECT_TRUE(request.mPrefetchOnly);
     EXPECT_EQ(request.mCutlistParameter, -1);
     request.StartPrefetches();
     EXPECT_EQ(request.mActivePrefetches.size(), 1u);
     EXPECT_TRUE(request.mGivenPrefetches.empty());
-    EXPECT_TRUE(request.PrefetchesWantMoreTime(1.0) == false);
+    EXPECT_FALSE(request.PrefetchesWantMoreTime(1.0));
     prefetch->mWantMoreTime = true;
     EXPECT_TRUE(request.PrefetchesWantMoreTime(2.5));
     EXPECT_DOUBLE_EQ(prefetch->mLastElapsed.load(), 2.5);
 
     const ML::RenderFrameRequest copy = request;
-    const auto frame = VF::CreateVideoFrame(mvxmediatypes::kPixelFormat_BGRA_4444_8u, 2, 2,
-                                            mvxmediatypes::kPixelAspectRatio_Square, true, false);
+    const auto frame = MakeFrame(2, 2);
     copy.StoreResult(frame);
     EXPECT_EQ(request.GetResult(), frame);
 }
 
-TEST_F(RenderFrameRequestTest, RenderProducesConformedFrameAndCompositesOnBlack)
+TEST_F(RenderFrameRequestTest, CompositeOnBlackTreatsPremultipliedStorageAsAssociatedColour)
 {
-    mProducer->mFormat = mvxmediatypes::kPixelFormat_BGRA_4444_8u;
-    auto settings = MakeSettings(5, mProducer, 8, 4);
-    settings.mCompositeOnBlack = true;
-    ML::RenderFrameRequest request = MakeRequest(settings);
-    request.ComputeKey(true);
-    // A half-transparent white frame.
-    struct WhiteProducer : TestProducer
+    // A half-transparent pixel on black: straight colour is scaled by its
+    // alpha, premultiplied colour is already scaled and stays. The frame's
+    // format is the straight BGRA_4444_8u either way: only its alpha kind
+    // says the colour is premultiplied.
+    const struct
     {
-        QRT::Result ProduceFrame(const MF::FrameTime& inTime,
-                                 const ML::CutlistRenderParams& inParams,
-                                 FrameRef& outFrame) override
-        {
-            TestProducer::ProduceFrame(inTime, inParams, outFrame);
-            auto* pixels = static_cast<std::uint8_t*>(outFrame->GetWritableBaseAddress());
-            for (std::uint32_t y = 0; y < mHeight; ++y)
-                for (std::uint32_t x = 0; x < mWidth; ++x)
-                {
-                    std::uint8_t* pixel = pixels + y * outFrame->GetRowBytes() + 4 * x;
-                    pixel[0] = pixel[1] = pixel[2] = 255;
-                    pixel[3] = 128;
-                }
-            return QRT::kResult_Success;
-        }
+        mvxmediatypes::AlphaChannel mAlpha;
+        Bgra mPixel;
+        std::uint8_t mExpected;
+    } cases[] = {
+        {mvxmediatypes::kAlphaChannel_Straight, {255, 255, 255, 128}, 128},
+        {mvxmediatypes::kAlphaChannel_Premultiplied, {100, 100, 100, 128}, 100},
     };
-    auto white = QRT::Allocated<WhiteProducer>::CreateInstance();
-    request.mProducer = QRT::InterfaceRef<ML::IRenderableNodeProducer>(white);
-    FrameRef frame;
-    request.Render(frame, request.ChooseRenderPixelFormat());
-    ASSERT_TRUE(frame);
-    const auto* pixel = static_cast<const std::uint8_t*>(frame->GetBaseAddress());
-    EXPECT_EQ(pixel[3], 255);
-    EXPECT_NEAR(pixel[0], 128, 1);
-    EXPECT_EQ(white->mProduceCount.load(), 1);
+    for (const auto& testCase : cases)
+    {
+        SCOPED_TRACE(static_cast<int>(testCase.mAlpha));
+        auto producer = QRT::Allocated<TestProducer>::CreateInstance();
+        producer->mPaint = [&](MF::IVideoFrame& ioFrame)
+        {
+            Fill(ioFrame, testCase.mPixel);
+            ioFrame.SetAlphaChannel(testCase.mAlpha);
+        };
+        auto settings = MakeSettings(5, producer, 8, 4);
+        settings.mCompositeOnBlack = true;
+        ML::RenderFrameRequest request = MakeRequest(settings);
+        request.ComputeKey(true);
+        FrameRef frame;
+        request.Render(frame, request.ChooseRenderPixelFormat());
+        const std::uint8_t value = testCase.mExpected;
+        EXPECT_TRUE(IsFilledWith(frame, {value, value, value, 255}));
+        EXPECT_EQ(producer->mProduceCount.load(), 1);
+    }
 }
 
 } // namespace
@@ -376,13 +355,10 @@ TEST(RenderFrameRequestMediaTest, FirstMediaComesOnlyFromImportedMediaNodes)
     ASSERT_TRUE(BE::OpenVideoSource("pattern:bars", source).Succeeded());
     const auto media = QRT::QueryRef<BE::Deprecated::IMedia>(source);
     ASSERT_TRUE(media);
-
-    const BE::ImportedVideoSegmentNode imported(media);
-    EXPECT_EQ(ML::RenderFrameRequest::GetFirstMediaFromVideoSegment(imported), media);
-
-    const BE::VideoSegmentNode clip(2);
-    EXPECT_FALSE(ML::RenderFrameRequest::GetFirstMediaFromVideoSegment(clip));
-
-    const BE::ImportedVideoSegmentNode offline{QRT::InterfaceRef<BE::Deprecated::IMedia>()};
-    EXPECT_FALSE(ML::RenderFrameRequest::GetFirstMediaFromVideoSegment(offline));
+    EXPECT_EQ(
+        ML::RenderFrameRequest::GetFirstMediaFromVideoSegment(BE::ImportedVideoSegmentNode(media)),
+        media);
+    EXPECT_FALSE(ML::RenderFrameRequest::GetFirstMediaFromVideoSegment(BE::VideoSegmentNode(2)));
+    EXPECT_FALSE(ML::RenderFrameRequest::GetFirstMediaFromVideoSegment(
+        BE::ImportedVideoSegmentNode{QRT::InterfaceRef<BE::Deprecated::IMedia>()}));
 }
