@@ -9,7 +9,8 @@ endif()
 add_compile_options(-Wall -Wextra -Werror)
 
 if(VR_COVERAGE)
-    add_compile_options(--coverage)
+    # Atomic counters: the suites run real threads, and racing counters corrupt the counts.
+    add_compile_options(--coverage -fprofile-update=atomic)
     add_link_options(--coverage)
 endif()
 
