@@ -1,5 +1,6 @@
-// vrender's command line: arguments to options, and every refusal with its
-// message, checked in the parser and in the program's exit code and output.
+// vrender's command line: arguments to options, and the refusals with their
+// messages, checked in the parser and, for a few, in the program's exit code
+// and output.
 
 #include "Options.h"
 
@@ -11,10 +12,8 @@
 #include <tuple>
 #include <vector>
 
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
-
-// The tables designate only the fields that differ from RenderOptions' defaults.
-#pragma GCC diagnostic ignored "-Wmissing-field-initializers"
 
 namespace
 {
@@ -24,8 +23,6 @@ using vrender::Command;
 using vrender::OutputKind;
 using vrender::RenderOptions;
 using Args = std::vector<std::string>;
-
-const std::string kFrames = "out/frames/frame_%05d.png";
 
 // Every field, so that an option that also changes another field shows.
 auto Fields(const RenderOptions& inOptions)
@@ -62,77 +59,76 @@ using OptionsTest = vrendertest::ScratchDirectoryTest;
 
 TEST_F(OptionsTest, ArgumentsBecomeTheseOptions)
 {
-    const std::pair<const char*, RenderOptions> cases[] = {
-        {"",
-         {.mMedia = "pattern:moving?size=1280x720",
-          .mStart = 0,
-          .mCount = 50,
-          .mOutputPath = "out/demo/frame_%05d.png"}},
-        {"source clip.y4m", {.mMedia = "clip.y4m", .mOutputPath = kFrames}},
-        {"source pattern:moving --start 3 --count=7 --size 320x240 --par 10:11 --format "
-         "VUYA_4444_8u --field lower --quality 2 --rate 30000/1001 -o - --chroma 444 -j 5 -q",
-         {.mMedia = "pattern:moving",
-          .mStart = 3,
-          .mCount = 7,
-          .mWidth = 320,
-          .mHeight = 240,
-          .mPixelAspectRatio = mt::PixelAspectRatio(10, 11),
-          .mPixelFormat = mt::kPixelFormat_VUYA_4444_8u,
-          .mFieldType = mt::kFieldType_LowerFirst,
-          .mFrameRate = mt::kFrameRate_Video2997,
-          .mQuality = 2,
-          .mOutputKind = OutputKind::kY4MStream,
-          .mChroma = vrender::Y4MChroma::k444,
-          .mJobs = 5,
-          .mQuiet = true,
-          .mFilters = {.mScale = true}}},
+    // Each row's options follow "source m"; the row changes the fields that
+    // differ from media "m" written to the default frame files.
+    using O = RenderOptions;
+    using K = OutputKind;
+    using C = vrender::Y4MChroma;
+    const std::pair<const char*, void (*)(O&)> cases[] = {
+        {"", [](O&) {}},
+        {"--start 3 --count=7", [](O& o) { std::tie(o.mStart, o.mCount) = std::pair(3, 7); }},
+        {"-j 5 -q", [](O& o) { std::tie(o.mJobs, o.mQuiet) = std::pair(5u, true); }},
+        {"--size 320x240", [](O& o) { std::tie(o.mWidth, o.mHeight) = std::pair(320u, 240u); }},
+        {"--quality 2", [](O& o) { o.mQuality = 2; }},
+        {"--format VUYA_4444_8u", [](O& o) { o.mPixelFormat = mt::kPixelFormat_VUYA_4444_8u; }},
+        {"--field lower", [](O& o) { o.mFieldType = mt::kFieldType_LowerFirst; }},
+        {"--rate 30000/1001", [](O& o) { o.mFrameRate = mt::kFrameRate_Video2997; }},
         // --frames is an inclusive range.
-        {"source a.y4m --frames 10:19",
-         {.mMedia = "a.y4m", .mStart = 10, .mCount = 10, .mOutputPath = kFrames}},
-        {"source a.y4m --frames 4:4",
-         {.mMedia = "a.y4m", .mStart = 4, .mCount = 1, .mOutputPath = kFrames}},
-        {"source a.png --y4m", {.mMedia = "a.png", .mOutputKind = OutputKind::kY4MStream}},
-        {"source a.png -o out/clip.Y4M",
-         {.mMedia = "a.png", .mOutputKind = OutputKind::kY4MFile, .mOutputPath = "out/clip.Y4M"}},
-        {"source a.png --output x/f_%03d.png", {.mMedia = "a.png", .mOutputPath = "x/f_%03d.png"}},
-        {"source a.png --output-dir out/100%",
-         {.mMedia = "a.png", .mOutputPath = "out/100%%/frame_%05d.png"}},
-        // The filters stack in the media node's order, whatever the argument order.
-        {"source clip.y4m --remove-pulldown BC --deinterlace --speed 0.5 --frame-blend --scale "
-         "320x180 --reverse-field-dominance",
-         {.mMedia = "clip.y4m",
-          .mWidth = 320,
-          .mHeight = 180,
-          .mOutputPath = kFrames,
-          .mFilters = {.mRemovePulldown = mt::kPulldownCadence_23_BC,
-                       .mReverseFieldDominance = true,
-                       .mDeinterlace = true,
-                       .mScale = true,
-                       .mSpeed = 0.5,
-                       .mFrameBlend = true}}},
-        // --par alone brings in the scaler; --size alone is no filter.
-        {"source x.png --par 10:11",
-         {.mMedia = "x.png",
-          .mPixelAspectRatio = mt::PixelAspectRatio(10, 11),
-          .mOutputPath = kFrames,
-          .mFilters = {.mScale = true}}},
-        {"source x.png --size 64x36",
-         {.mMedia = "x.png", .mWidth = 64, .mHeight = 36, .mOutputPath = kFrames}},
+        {"--frames 10:19", [](O& o) { std::tie(o.mStart, o.mCount) = std::pair(10, 10); }},
+        {"--frames 4:4", [](O& o) { std::tie(o.mStart, o.mCount) = std::pair(4, 1); }},
+        {"--y4m",
+         [](O& o) { std::tie(o.mOutputKind, o.mOutputPath) = std::pair(K::kY4MStream, ""); }},
+        {"-o - --chroma 444",
+         [](O& o) {
+             std::tie(o.mOutputKind, o.mOutputPath, o.mChroma) =
+                 std::tuple(K::kY4MStream, "", C::k444);
+         }},
+        {"-o out/c.Y4M", [](O& o)
+         { std::tie(o.mOutputKind, o.mOutputPath) = std::pair(K::kY4MFile, "out/c.Y4M"); }},
+        {"--output x/f_%03d.png", [](O& o) { o.mOutputPath = "x/f_%03d.png"; }},
+        {"--output-dir out/100%", [](O& o) { o.mOutputPath = "out/100%%/frame_%05d.png"; }},
+        // The filters, in field order: pulldown, reverse dominance, field
+        // reverse, deinterlace, flicker, interlace, scale, speed, blend.
+        {"--remove-pulldown BC --deinterlace --speed 0.5 --frame-blend --reverse-field-dominance",
+         [](O& o) {
+             o.mFilters = {
+                 mt::kPulldownCadence_23_BC, true, false, true, false, false, false, 0.5, true};
+         }},
+        {"--field-reverse --remove-flicker --interlace-consecutive",
+         [](O& o) { o.mFilters = {{}, false, true, false, true, true, false, {}, false}; }},
+        // --scale and --par bring in the scaler; --size alone is no filter.
+        {"--scale 320x180", [](O& o)
+         { std::tie(o.mWidth, o.mHeight, o.mFilters.mScale) = std::tuple(320u, 180u, true); }},
+        {"--par 10:11",
+         [](O& o)
+         {
+             std::tie(o.mPixelAspectRatio, o.mFilters.mScale) =
+                 std::pair(mt::PixelAspectRatio(10, 11), true);
+         }},
     };
-    for (const auto& [args, options] : cases)
+    for (const auto& [args, change] : cases)
     {
         SCOPED_TRACE(args);
-        const vrender::ParsedCommandLine parsed = Parse(args);
+        const vrender::ParsedCommandLine parsed = Parse(std::string("source m ") + args);
         ASSERT_EQ(parsed.mError, "");
-        EXPECT_EQ(parsed.mCommand, *args ? Command::kSource : Command::kDemo);
-        EXPECT_EQ(Fields(parsed.mOptions), Fields(options));
+        EXPECT_EQ(parsed.mCommand, Command::kSource);
+        RenderOptions expected;
+        expected.mMedia = "m";
+        expected.mOutputPath = "out/frames/frame_%05d.png";
+        change(expected);
+        EXPECT_EQ(Fields(parsed.mOptions), Fields(expected));
     }
+    RenderOptions demo;
+    std::tie(demo.mMedia, demo.mStart, demo.mCount, demo.mOutputPath) =
+        std::tuple("pattern:moving?size=1280x720", 0, 50, "out/demo/frame_%05d.png");
+    EXPECT_EQ(Fields(Parse("").mOptions), Fields(demo));
 }
 
-TEST_F(OptionsTest, HelpAndInfoCommands)
+TEST_F(OptionsTest, HelpInfoAndDemoCommands)
 {
     for (const auto& [args, command] : {std::pair{"--help", Command::kHelp},
                                         {"help", Command::kHelp},
+                                        {"", Command::kDemo},
                                         {"source x.png --size bad -h", Command::kHelp},
                                         {"info", Command::kInfo}})
     {
@@ -144,89 +140,57 @@ TEST_F(OptionsTest, HelpAndInfoCommands)
 
 TEST_F(OptionsTest, RefusalsNameTheArgumentAndExitWithTwo)
 {
-    const std::pair<const char*, std::string> cases[] = {
+    // How each message begins; the program runs for a few of them.
+    const std::pair<const char*, const char*> cases[] = {
         {"render", "unknown command 'render' (commands: source, info, demo, help)"},
         {"--size 10x10", "a command comes first: source, info, demo or help (got option '--size')"},
-        {"info extra",
-         "info: unexpected argument 'extra' (info prints the built-in example cutlist)"},
+        {"info extra", "info: unexpected argument 'extra' (info prints the built-in"},
         {"demo media.png", "unexpected argument 'media.png'"},
-        {"source", "source: no media given (an image file, a .y4m file or a pattern: text such "
-                   "as pattern:bars)"},
-        {"source pattern:bars other", "unexpected argument 'other'"},
-        {"source pattern:bars --size", "--size needs a value"},
-        {"source pattern:bars --bogus", "unknown option '--bogus' (see vrender --help)"},
-        {"source pattern:bars --quiet=yes", "--quiet takes no value"},
-        {"source pattern:bars --deinterlace=1", "--deinterlace takes no value"},
-        {"source pattern:bars --size 1x1 --size 2x2", "--size is given twice"},
-        {"source pattern:bars --frames 0:9 --count 3",
-         "--frames cannot be combined with --start or --count"},
-        {"source pattern:bars -o - --y4m",
-         "--y4m: the output is already chosen by -o; give only one "
-         "of -o, --output-dir and --y4m"},
-        {"source pattern:bars --chroma 444",
-         "--chroma applies to Y4M output only (-o -, -o FILE.y4m or --y4m)"},
-        {"source pattern:bars -o out/frame.png",
-         "-o: 'out/frame.png': the pattern has no frame number "
-         "(add one, e.g. frame_%05d.png)"},
-        {"source pattern:bars -o out/x.tiff",
-         "-o: 'out/x.tiff' is neither a .png sequence (e.g. out/frame_%05d.png), a .y4m file nor "
-         "- (a Y4M stream on standard output)"},
-        {"source pattern:bars --size abc", "--size: 'abc' is not WIDTHxHEIGHT, e.g. 1280x720"},
-        {"source pattern:bars --size 0x10", "--size: '0x10' is out of range (1 to 32768 each)"},
-        {"source pattern:bars --size 40000x10",
-         "--size: '40000x10' is out of range (1 to 32768 each)"},
-        {"source pattern:bars --par 4:0",
-         "--par: '4:0' is not N:D with both terms positive, e.g. 1:1 or 10:11"},
-        {"source pattern:bars --field top", "--field: 'top' is not progressive, upper or lower"},
-        {"source pattern:bars --quality 6", "--quality: '6' is not a quality 0 to 5"},
-        {"source pattern:bars --quality -1", "--quality: '-1' is not a quality 0 to 5"},
-        {"source pattern:bars --jobs 0",
-         "--jobs: '0' is not a number of frames in flight, 1 to 64"},
-        {"source pattern:bars --jobs 65",
-         "--jobs: '65' is not a number of frames in flight, 1 to 64"},
-        {"source pattern:bars --rate fast",
-         "--rate: 'fast' is not a frame rate from 1 to 1000, e.g. 25, 30000/1001 or 29.97"},
-        {"source pattern:bars --rate 25/0",
-         "--rate: '25/0' is not a frame rate from 1 to 1000, e.g. 25, 30000/1001 or 29.97"},
-        {"source pattern:bars --start x", "--start: 'x' is not a frame number (0 or more)"},
-        {"source pattern:bars --count 0", "--count: '0' is not a frame count (1 or more)"},
-        {"source pattern:bars --frames 5",
-         "--frames: '5' is not FIRST:LAST (frame numbers, both included), e.g. 0:49"},
-        {"source pattern:bars --frames 9:3", "--frames: the last frame 3 comes before the first 9"},
-        {"source pattern:bars --chroma 422 --y4m", "--chroma: '422' is not 420 or 444"},
-        {"source pattern:bars --remove-pulldown XY",
-         "--remove-pulldown: 'XY' is not a 2:3 cadence phase (AA, BB, BC, CD or DD)"},
-        {"source pattern:bars --speed 0",
-         "--speed: '0' is not a speed (a non-zero number from -1000 to 1000, e.g. 0.5)"},
-        {"source pattern:bars --speed fast",
-         "--speed: 'fast' is not a speed (a non-zero number from -1000 to 1000, e.g. 0.5)"},
+        {"source", "source: no media given (an image file, a .y4m file or a pattern:"},
+        {"source m other", "unexpected argument 'other'"},
+        {"source m --size", "--size needs a value"},
+        {"source m --bogus", "unknown option '--bogus' (see vrender --help)"},
+        {"source m --quiet=yes", "--quiet takes no value"},
+        {"source m --deinterlace=1", "--deinterlace takes no value"},
+        {"source m --size 1x1 --size 2x2", "--size is given twice"},
+        {"source m --frames 0:9 --count 3", "--frames cannot be combined with --start or --count"},
+        {"source m -o - --y4m", "--y4m: the output is already chosen by -o; give only one of -o,"},
+        {"source m --chroma 444", "--chroma applies to Y4M output only (-o -, -o FILE.y4m or"},
+        {"source m -o out/frame.png", "-o: 'out/frame.png': the pattern has no frame number"},
+        {"source m -o out/x.tiff", "-o: 'out/x.tiff' is neither a .png sequence (e.g. out/"},
+        {"source m --output-dir=", "--output-dir: the directory name is empty"},
+        {"source m --size abc", "--size: 'abc' is not WIDTHxHEIGHT, e.g. 1280x720"},
+        {"source m --size 0x10", "--size: '0x10' is out of range (1 to 32768 each)"},
+        {"source m --size 40000x10", "--size: '40000x10' is out of range"},
+        {"source m --par 4:0", "--par: '4:0' is not N:D with both terms positive"},
+        {"source m --field top", "--field: 'top' is not progressive, upper or lower"},
+        {"source m --quality 6", "--quality: '6' is not a quality 0 to 5"},
+        {"source m --quality -1", "--quality: '-1' is not"},
+        {"source m --jobs 0", "--jobs: '0' is not a number of frames in flight, 1 to 64"},
+        {"source m --jobs 65", "--jobs: '65' is not"},
+        {"source m --rate fast", "--rate: 'fast' is not a frame rate from 1 to 1000, e.g. 25,"},
+        {"source m --start x", "--start: 'x' is not a frame number (0 or more)"},
+        {"source m --count 0", "--count: '0' is not a frame count (1 or more)"},
+        {"source m --frames 5", "--frames: '5' is not FIRST:LAST (frame numbers, both included)"},
+        {"source m --frames 9:3", "--frames: the last frame 3 comes before the first 9"},
+        {"source m --chroma 422 --y4m", "--chroma: '422' is not 420 or 444"},
+        {"source m --remove-pulldown XY", "--remove-pulldown: 'XY' is not a 2:3 cadence phase"},
+        {"source m --speed 0", "--speed: '0' is not a speed (a non-zero number from -1000 to"},
+        {"source m --speed fast", "--speed: 'fast' is not a speed"},
+        {"source m --format RGB24",
+         "--format: unknown pixel format 'RGB24' (one of BGRA_4444_8u, "},
+        {"source m --format Any", "--format: 'Any' cannot be rendered to (one of BGRA_4444_8u, "},
     };
     for (const auto& [args, error] : cases)
+        EXPECT_THAT(Parse(args).mError, testing::StartsWith(error)) << args;
+    for (const char* args : {"render", "source m --size", "source m --chroma 444"})
     {
         SCOPED_TRACE(args);
-        EXPECT_EQ(Parse(args).mError, error);
         const vrendertest::RunResult run = Run(Words(args));
         EXPECT_EQ(run.mExitCode, 2);
-        EXPECT_EQ(run.mErr,
-                  "vrender: " + error + "\nRun 'vrender --help' for the commands and options.\n");
+        EXPECT_EQ(run.mErr, "vrender: " + Parse(args).mError +
+                                "\nRun 'vrender --help' for the commands and options.\n");
         EXPECT_EQ(run.mOut, "");
-    }
-}
-
-TEST_F(OptionsTest, BadFormatsListTheRenderableOnes)
-{
-    const std::string unknown = Parse("source pattern:bars --format RGB24").mError;
-    EXPECT_EQ(unknown.rfind("--format: unknown pixel format 'RGB24' (one of BGRA_4444_8u, ", 0), 0u)
-        << unknown;
-    EXPECT_EQ(unknown.find("MJPG"), std::string::npos);
-    for (const char* format : {"MJPG_422_Compressed", "Any"})
-    {
-        const std::string refused =
-            Parse(std::string("source pattern:bars --format ") + format).mError;
-        EXPECT_EQ(refused.rfind(
-                      "--format: '" + std::string(format) + "' cannot be rendered to (one of ", 0),
-                  0u)
-            << refused;
     }
 }
 
@@ -241,19 +205,21 @@ TEST_F(OptionsTest, FrameRatesAndFramePatterns)
         {"0", std::nullopt},
         {"1001", std::nullopt},
         {"1/2", std::nullopt},
+        {"25/0", std::nullopt},
         {"", std::nullopt}};
     for (const auto& [text, rate] : rates)
         EXPECT_EQ(vrender::ParseFrameRate(text), rate) << '"' << text << '"';
 
-    const std::string badConversion = " (use %d, %5d or %05d; %% for a percent sign)";
+    const std::string bad = "bad frame number conversion at ";
+    const std::string use = " (use %d, %5d or %05d; %% for a percent sign)";
     const std::pair<const char*, std::string> patterns[] = {
         {"f_%05d.png", ""},
         {"f_%d.png", ""},
         {"100%%_%3d.png", ""},
         {"%d_%d.png", "the pattern has more than one frame number"},
-        {"f_%s.png", "bad frame number conversion at '%s.png'" + badConversion},
-        {"f_%0005d.png", "bad frame number conversion at '%0005d.png'" + badConversion},
-        {"f_%", "bad frame number conversion at '%'" + badConversion}};
+        {"f_%s.png", bad + "'%s.png'" + use},
+        {"f_%0005d.png", bad + "'%0005d.png'" + use},
+        {"f_%", bad + "'%'" + use}};
     for (const auto& [pattern, problem] : patterns)
         EXPECT_EQ(vrender::CheckFramePattern(pattern), problem) << pattern;
 
@@ -261,8 +227,7 @@ TEST_F(OptionsTest, FrameRatesAndFramePatterns)
         {"f_%05d.png", 42, "f_00042.png"},
         {"f_%3d.png", 7, "f_  7.png"},
         {"f_%d.png", 123456, "f_123456.png"},
-        {"100%%_%02d.png", 123, "100%_123.png"},
-        {"out/100%%/frame_%05d.png", 7, "out/100%/frame_00007.png"}};
+        {"100%%_%02d.png", 123, "100%_123.png"}};
     for (const auto& [pattern, frame, path] : paths)
         EXPECT_EQ(vrender::FormatFramePath(pattern, frame), path);
 }

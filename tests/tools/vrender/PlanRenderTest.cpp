@@ -31,20 +31,23 @@ vrender::RenderPlan Plan(const vrender::RenderOptions& inOptions,
     return plan;
 }
 
+// The first frame, count, size, aspect, field order and jobs of inPlan.
+auto Summary(const vrender::RenderPlan& inPlan)
+{
+    const vrender::StreamInfo& stream = inPlan.mStream;
+    return std::tuple(inPlan.mFirst, inPlan.mCount, stream.mWidth, stream.mHeight,
+                      stream.mPixelAspectRatio, stream.mFieldType, inPlan.mJobs);
+}
+
 using PlanRenderTest = ::testing::Test;
 
 TEST_F(PlanRenderTest, DefaultsComeFromTheSource)
 {
     const vrender::RenderPlan plan = Plan({}, Clip(), 4);
-    EXPECT_EQ(plan.mFirst, 0);
-    EXPECT_EQ(plan.mCount, 100);
-    EXPECT_EQ(plan.mStream.mWidth, 640u);
-    EXPECT_EQ(plan.mStream.mHeight, 360u);
-    EXPECT_EQ(plan.mStream.mPixelAspectRatio, mt::PixelAspectRatio(4, 3));
+    EXPECT_EQ(Summary(plan), std::tuple(0, 100, 640u, 360u, mt::PixelAspectRatio(4, 3),
+                                        mt::kFieldType_Progressive, 8u));
     EXPECT_EQ(plan.mStream.mFrameRate, mt::kFrameRate_Video25);
-    EXPECT_EQ(plan.mStream.mFieldType, mt::kFieldType_Progressive);
     EXPECT_EQ(plan.mPixelFormat, mt::kPixelFormat_BGRA_4444_8u);
-    EXPECT_EQ(plan.mJobs, 8u) << "twice the cores";
     vrender::SourceFacts interlaced = Clip();
     interlaced.mFieldType = mt::kFieldType_LowerFirst;
     EXPECT_EQ(Plan({}, interlaced).mStream.mFieldType, mt::kFieldType_LowerFirst);
@@ -59,13 +62,10 @@ TEST_F(PlanRenderTest, OptionsOverrideTheSource)
     options.mPixelAspectRatio = mt::kPixelAspectRatio_Square;
     options.mFieldType = mt::kFieldType_UpperFirst;
     options.mJobs = 3;
-    vrender::RenderPlan plan = Plan(options, Clip(), 64);
-    EXPECT_EQ(plan.mFirst, 90);
-    EXPECT_EQ(plan.mCount, 10) << "to the end of the media";
-    EXPECT_EQ(plan.mStream.mWidth, 100u);
-    EXPECT_EQ(plan.mStream.mPixelAspectRatio, mt::kPixelAspectRatio_Square);
-    EXPECT_EQ(plan.mStream.mFieldType, mt::kFieldType_UpperFirst);
-    EXPECT_EQ(plan.mJobs, 3u);
+    // The count runs to the end of the media.
+    EXPECT_EQ(
+        Summary(Plan(options, Clip(), 64)),
+        std::tuple(90, 10, 100u, 50u, mt::kPixelAspectRatio_Square, mt::kFieldType_UpperFirst, 3u));
     options.mJobs = 0;
     EXPECT_EQ(Plan(options, Clip(), 64).mJobs, vrender::kMaxJobs) << "bounded";
     // Another output rate counts the media on its own grid: 4 seconds at 50 fps.
@@ -96,21 +96,21 @@ TEST_F(PlanRenderTest, EndlessAndStillMedia)
     vrender::SourceFacts pattern = Clip();
     pattern.mDuration = mt::kTime_Max;
     vrender::RenderPlan plan = Plan({}, pattern);
-    EXPECT_EQ(plan.mCount, vrender::kDefaultEndlessFrameCount);
-    EXPECT_EQ(plan.mJobs, 2u);
+    EXPECT_EQ(std::pair(plan.mCount, plan.mJobs),
+              std::pair(vrender::kDefaultEndlessFrameCount, 2u));
 
     vrender::SourceFacts still = pattern;
     still.mIsStill = true;
     still.mFrameRate = mt::kFrameRate_Video1000;
     plan = Plan({}, still);
-    EXPECT_EQ(plan.mCount, 1);
-    EXPECT_EQ(plan.mStream.mFrameRate, vrender::kDefaultStillFrameRate);
+    EXPECT_EQ(std::pair(plan.mCount, plan.mStream.mFrameRate),
+              std::pair(std::int64_t{1}, vrender::kDefaultStillFrameRate));
     vrender::RenderOptions options;
     options.mCount = 12;
     options.mFrameRate = mt::kFrameRate_Video50;
     plan = Plan(options, still);
-    EXPECT_EQ(plan.mCount, 12);
-    EXPECT_EQ(plan.mStream.mFrameRate, mt::kFrameRate_Video50);
+    EXPECT_EQ(std::pair(plan.mCount, plan.mStream.mFrameRate),
+              std::pair(std::int64_t{12}, mt::kFrameRate_Video50));
 }
 
 } // namespace

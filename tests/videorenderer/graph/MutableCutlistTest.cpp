@@ -19,8 +19,7 @@ using mvxmediatypes::kTime_Max;
 using CutlistRef = QRT::InterfaceRef<ML::IMutableCutlist>;
 // Start, end and offset in ticks, and the node named by a letter (A, B or C).
 using Seg = std::tuple<std::int64_t, std::int64_t, std::int64_t, char>;
-
-const std::string kCutlistSeed = "Hash value for ML::RenderableCutlistImpl";
+using Segs = std::vector<Seg>;
 
 CutlistRef NewCutlist()
 {
@@ -43,7 +42,7 @@ protected:
 
     const NodeRef& Node(char inName) const { return mNodes[inName - 'A']; }
 
-    CutlistRef Sealed(const std::vector<Seg>& inSegments) const
+    CutlistRef Sealed(const Segs& inSegments) const
     {
         CutlistRef list = NewCutlist();
         for (const auto& [start, end, offset, node] : inSegments)
@@ -52,9 +51,9 @@ protected:
         return list;
     }
 
-    std::vector<Seg> SegmentsOf(const CutlistRef& inList) const
+    Segs SegmentsOf(const CutlistRef& inList) const
     {
-        std::vector<Seg> segments;
+        Segs segments;
         for (std::size_t index = 0; index < inList->GetSegmentCount(); ++index)
         {
             TickTime start, end, offset;
@@ -71,56 +70,40 @@ protected:
 
 TEST_F(MutableCutlistTest, SealingSortsTrimsMergesAndHashesTheResultInOrder)
 {
-    const struct
-    {
-        const char* mName;
-        std::vector<Seg> mAdded;
-        std::vector<Seg> mSealed;
-    } cases[] = {
-        {"empty", {}, {}},
-        {"empty range ignored", {{100, 100, 0, 'A'}}, {}},
-        {"sorted by start",
-         {{100, 200, 7, 'B'}, {0, 100, 0, 'A'}},
-         {{0, 100, 0, 'A'}, {100, 200, 7, 'B'}}},
-        {"continuous runs of one node merge",
-         {{0, 100, 1000, 'A'}, {100, 250, 1100, 'A'}, {250, 300, 1250, 'A'}},
+    // The segments added, then those sealed.
+    const std::pair<Segs, Segs> cases[] = {
+        {{}, {}},
+        // An empty range is ignored.
+        {{{100, 100, 0, 'A'}}, {}},
+        // Sorted by start.
+        {{{100, 200, 7, 'B'}, {0, 100, 0, 'A'}}, {{0, 100, 0, 'A'}, {100, 200, 7, 'B'}}},
+        // Continuous runs of one node merge.
+        {{{0, 100, 1000, 'A'}, {100, 250, 1100, 'A'}, {250, 300, 1250, 'A'}},
          {{0, 300, 1000, 'A'}}},
-        {"offset jump, other node and gap stay apart",
-         {{0, 100, 0, 'A'}, {100, 200, 101, 'A'}, {200, 300, 200, 'B'}, {310, 400, 310, 'B'}},
+        // An offset jump forwards or back (the same media again), another
+        // node and a gap keep segments apart.
+        {{{0, 100, 0, 'A'}, {100, 200, 101, 'A'}, {200, 300, 200, 'B'}, {310, 400, 310, 'B'}},
          {{0, 100, 0, 'A'}, {100, 200, 101, 'A'}, {200, 300, 200, 'B'}, {310, 400, 310, 'B'}}},
-        {"overlap trimmed with its offset moved; swallowed segment dropped",
-         {{0, 100, 0, 'A'}, {60, 150, 500, 'B'}, {120, 140, 0, 'A'}},
+        {{{0, 100, 0, 'A'}, {100, 200, 0, 'A'}}, {{0, 100, 0, 'A'}, {100, 200, 0, 'A'}}},
+        // An overlap is trimmed with its offset moved; a swallowed segment is dropped.
+        {{{0, 100, 0, 'A'}, {60, 150, 500, 'B'}, {120, 140, 0, 'A'}},
          {{0, 100, 0, 'A'}, {100, 150, 540, 'B'}}},
-        {"trimmed segment that becomes continuous merges",
-         {{0, 100, 0, 'A'}, {50, 180, 50, 'A'}},
-         {{0, 180, 0, 'A'}}},
-        {"equal starts keep the order they were added in",
-         {{0, 50, 0, 'B'}, {0, 100, 0, 'A'}},
-         {{0, 50, 0, 'B'}, {50, 100, 50, 'A'}}},
+        // A trimmed segment that becomes continuous merges.
+        {{{0, 100, 0, 'A'}, {50, 180, 50, 'A'}}, {{0, 180, 0, 'A'}}},
+        // Equal starts keep the order they were added in.
+        {{{0, 50, 0, 'B'}, {0, 100, 0, 'A'}}, {{0, 50, 0, 'B'}, {50, 100, 50, 'A'}}},
     };
-    for (const auto& test : cases)
+    for (const auto& [added, sealed] : cases)
     {
-        SCOPED_TRACE(test.mName);
-        const CutlistRef list = Sealed(test.mAdded);
-        EXPECT_EQ(SegmentsOf(list), test.mSealed);
-        ByteRuns runs{kCutlistSeed};
-        for (const auto& [start, end, offset, node] : test.mSealed)
+        SCOPED_TRACE(testing::PrintToString(added));
+        const CutlistRef list = Sealed(added);
+        EXPECT_EQ(SegmentsOf(list), sealed);
+        ByteRuns runs{"Hash value for ML::RenderableCutlistImpl"};
+        for (const auto& [start, end, offset, node] : sealed)
             runs.insert(runs.end(), {BytesOf(start), BytesOf(end), BytesOf(offset),
                                      BytesOf(Node(node)->GetNodeHash())});
         EXPECT_EQ(list->GetCutlistHash(), HashOfRuns(runs));
     }
-}
-
-TEST_F(MutableCutlistTest, EmptyCutlistIsOneStillRangeAndKeepsItsName)
-{
-    const CutlistRef list = Sealed({});
-    EXPECT_EQ(list->GetCutlistHash(), HashOfRuns({kCutlistSeed}));
-    EXPECT_EQ(StillRangesOf(list),
-              MF::TickTimeRangeList{MF::TickTimeRange(mvxmediatypes::kTime_Zero, kTime_Max)});
-    EXPECT_EQ(list->GetName(), std::string_view("Sequence 1"));
-    EXPECT_TRUE(QRT::QueryRef<MF::IRenderableCutlist>(list));
-    EXPECT_TRUE(QRT::QueryRef<MF::ISmartRenderSegmentInfo>(list));
-    EXPECT_FALSE(QRT::QueryRef<MF::IRenderableNode>(list));
 }
 
 TEST_F(MutableCutlistTest, EmptyNodesAreRefusedUnlessTheRangeIsEmpty)
@@ -131,27 +114,19 @@ TEST_F(MutableCutlistTest, EmptyNodesAreRefusedUnlessTheRangeIsEmpty)
                  QRT::NullInterfaceException);
     list->MakeImmutable();
     EXPECT_EQ(list->GetSegmentCount(), 0u);
+    EXPECT_EQ(list->GetName(), std::string_view("Sequence 1"));
+    EXPECT_EQ(StillRangesOf(list),
+              MF::TickTimeRangeList{MF::TickTimeRange(mvxmediatypes::kTime_Zero, kTime_Max)});
     NodeRef node;
     EXPECT_EQ(Sealed({{5, 5, 0, 'A'}})->GetNodeByHash(Node('A')->GetNodeHash(), node),
               QRT::kResult_NotFound)
         << "an ignored empty range stores no node";
 }
 
-TEST_F(MutableCutlistTest, HashChangesWithEverySegmentField)
-{
-    const QRT::Guid base = Sealed({{0, 10, 0, 'B'}, {20, 30, 5, 'A'}})->GetCutlistHash();
-    EXPECT_EQ(Sealed({{0, 10, 0, 'B'}, {20, 30, 5, 'A'}})->GetCutlistHash(), base);
-    for (const Seg& changed :
-         {Seg{21, 30, 5, 'A'}, Seg{20, 31, 5, 'A'}, Seg{20, 30, 6, 'A'}, Seg{20, 30, 5, 'C'}})
-        EXPECT_NE(Sealed({{0, 10, 0, 'B'}, changed})->GetCutlistHash(), base)
-            << testing::PrintToString(changed);
-}
-
 TEST_F(MutableCutlistTest, LookupsByTimeHonourHalfOpenBoundariesAndMapBothFields)
 {
     const CutlistRef list =
         Sealed({{100, 200, 1000, 'A'}, {200, 300, 0, 'B'}, {400, 500, -50, 'A'}});
-    const std::vector<Seg> segments = SegmentsOf(list);
     // Time, node (0: none), local time and segment index.
     const std::tuple<std::int64_t, char, std::int64_t, std::size_t> cases[] = {
         {-5, 0, 0, 0},      {99, 0, 0, 0},     {100, 'A', 1000, 0}, {199, 'A', 1099, 0},
@@ -173,12 +148,7 @@ TEST_F(MutableCutlistTest, LookupsByTimeHonourHalfOpenBoundariesAndMapBothFields
         EXPECT_EQ(list->GetSegmentAtTime(Ticks(time), index, start, end, offset, hash),
                   name ? QRT::kResult_Success : QRT::kResult_NotFound);
         EXPECT_EQ(index, name ? wantIndex : 99u);
-        if (name)
-        {
-            EXPECT_EQ(Seg(start.GetTicks(), end.GetTicks(), offset.GetTicks(), name),
-                      segments[wantIndex]);
-            EXPECT_EQ(hash, Node(name)->GetNodeHash());
-        }
+        EXPECT_EQ(hash, name ? Node(name)->GetNodeHash() : QRT::Guid());
     }
     TickTime start, end, offset;
     QRT::Guid hash;
@@ -222,7 +192,6 @@ TEST_F(MutableCutlistTest, NodeTreesAreStoredOncePerHashAndTheLaterOneIsKept)
     EXPECT_EQ(list->GetNodeByHash(Node('A')->GetNodeHash(), node), QRT::kResult_Success);
     EXPECT_TRUE(node == twin);
     EXPECT_EQ(list->GetNodeByHash(Node('B')->GetNodeHash(), node), QRT::kResult_NotFound);
-    EXPECT_TRUE(node == twin);
 }
 
 TEST_F(MutableCutlistTest, GapsStillSegmentsAndNodeRangesMakeTheStillList)
@@ -276,7 +245,6 @@ TEST_F(MutableCutlistTest, SmartRenderTimesAreAskedInNodeTimeAndMappedBack)
               (std::set<TickTime>{Ticks(1), Ticks(100), Ticks(140), Ticks(310), Ticks(350)}));
     EXPECT_EQ(scripted->mSmartQuestions,
               (MF::TickTimeRangeList{Range(1000, 1050), Range(990, 1090)}));
-    EXPECT_EQ(scripted->mSmartFlags, (std::vector<bool>{true, true}));
 }
 
 } // namespace

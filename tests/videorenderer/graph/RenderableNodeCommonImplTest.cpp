@@ -19,22 +19,7 @@ const QRT::ImmutableString kKeyC = QRT::ImmutableString::CreateStatic("C::Key");
 const QRT::ImmutableString kKeyLong = QRT::ImmutableString::CreateStatic("A::KeyLonger");
 const std::string kSeed = "ML::RenderableNodeCommonImpl";
 
-QRT::Guid HashOf(const QRT::InterfaceRef<TestNode>& inNode)
-{
-    inNode->MakeImmutable();
-    return inNode->GetNodeHash();
-}
-
 using RenderableNodeCommonImplTest = ::testing::Test;
-
-TEST_F(RenderableNodeCommonImplTest, EmptyNodeHashesSeedAndKindOnly)
-{
-    const NodeRef node = MakeLeaf("Leaf");
-    EXPECT_EQ(node->GetNodeHash(), HashOfRuns({kSeed, "NodeType::", "Leaf"}));
-    EXPECT_EQ(node->GetNodeType(), std::string_view("Leaf"));
-    // Mixing the seed as one run with the kind differs: run boundaries count.
-    EXPECT_NE(node->GetNodeHash(), HashOfRuns({kSeed + "NodeType::", "Leaf"}));
-}
 
 TEST_F(RenderableNodeCommonImplTest, OnlyHashedPropertiesAreMixedInKeyOrder)
 {
@@ -48,10 +33,11 @@ TEST_F(RenderableNodeCommonImplTest, OnlyHashedPropertiesAreMixedInKeyOrder)
     node->SetProperty(kKeyC, "runtime", false);
     node->SetProperty(kKeyC, "gone", true);
     node->SetProperty(kKeyC, "", true);
-    EXPECT_EQ(HashOf(node), HashOfRuns({kSeed, "PropertyName::", "A::Key", "PropertyValue::", "1",
-                                        "PropertyName::", "A::KeyLonger", "PropertyValue::", "3",
-                                        "PropertyName::", "B::Key", "PropertyValue::", binary,
-                                        "NodeType::", "Leaf"}));
+    node->MakeImmutable();
+    EXPECT_EQ(node->GetNodeHash(), HashOfRuns({kSeed, "PropertyName::", "A::Key", "PropertyValue::",
+                                               "1", "PropertyName::", "A::KeyLonger",
+                                               "PropertyValue::", "3", "PropertyName::", "B::Key",
+                                               "PropertyValue::", binary, "NodeType::", "Leaf"}));
 }
 
 TEST_F(RenderableNodeCommonImplTest, InputsAndOperatorsAreHashedInOrderAndReadBackByIndex)
@@ -73,45 +59,18 @@ TEST_F(RenderableNodeCommonImplTest, InputsAndOperatorsAreHashedInOrderAndReadBa
                              "Operator::", BytesOf(second->GetNodeHash())});
     EXPECT_EQ(clip->GetNodeHash(), HashOfRuns(runs));
 
-    ASSERT_EQ(clip->GetInputCount(), 2u);
+    EXPECT_EQ(clip->GetInputCount(), 2u);
     TickTime offset;
     NodeRef got;
     EXPECT_EQ(clip->GetInput(0, offset, got), QRT::kResult_Success);
-    EXPECT_EQ(offset, Ticks(250));
-    EXPECT_TRUE(got == child);
+    EXPECT_TRUE(offset == Ticks(250) && got == child);
     EXPECT_EQ(clip->GetInput(1, offset, got), QRT::kResult_Success);
-    EXPECT_EQ(offset, Ticks(-7));
-    EXPECT_FALSE(got);
-    got = child;
+    EXPECT_TRUE(offset == Ticks(-7) && !got);
     EXPECT_EQ(clip->GetInput(2, offset, got), QRT::kResult_NotFound);
-    EXPECT_EQ(offset, Ticks(-7));
-    EXPECT_TRUE(got == child);
-    ASSERT_EQ(clip->GetOperatorCount(), 2u);
+    EXPECT_EQ(clip->GetOperatorCount(), 2u);
     EXPECT_EQ(clip->GetOperator(1, got), QRT::kResult_Success);
     EXPECT_TRUE(got == second);
     EXPECT_EQ(clip->GetOperator(2, got), QRT::kResult_NotFound);
-    EXPECT_TRUE(got == second);
-}
-
-TEST_F(RenderableNodeCommonImplTest, OffsetsSubtreesAndOperatorOrderChangeTheHash)
-{
-    auto deeper = MakeMutable<TestNode>("Child", 0u);
-    deeper->SetProperty(kKeyA, "deeper", true);
-    const NodeRef children[] = {MakeLeaf("Child"), Seal(deeper)};
-    const NodeRef effects[] = {MakeLeaf("Effect1"), MakeLeaf("Effect2")};
-    auto build = [&](int inChild, std::int64_t inOffset, int inFirstEffect)
-    {
-        auto node = MakeMutable<TestNode>("Clip", 0u);
-        node->AddInput(children[inChild], Ticks(inOffset));
-        node->AddOperator(effects[inFirstEffect]);
-        node->AddOperator(effects[1 - inFirstEffect]);
-        return HashOf(node);
-    };
-    const QRT::Guid base = build(0, 10, 0);
-    EXPECT_EQ(build(0, 10, 0), base);
-    EXPECT_NE(build(0, 11, 0), base);
-    EXPECT_NE(build(1, 10, 0), base);
-    EXPECT_NE(build(0, 10, 1), base);
 }
 
 TEST_F(RenderableNodeCommonImplTest, PropertyLookupPrefersHashedAndEmptyValueRemoves)
@@ -126,7 +85,6 @@ TEST_F(RenderableNodeCommonImplTest, PropertyLookupPrefersHashedAndEmptyValueRem
 
     MF::RenderablePropertyValue value = "untouched";
     EXPECT_EQ(node->GetProperty(kKeyLong, value), QRT::kResult_NotFound);
-    EXPECT_EQ(value, "untouched");
     EXPECT_EQ(node->GetProperty(kKeyA, value), QRT::kResult_Success);
     EXPECT_EQ(value, "hashed");
     MF::RenderablePropertyMap all{{kKeyLong, "stale"}};
@@ -152,49 +110,34 @@ TEST_F(RenderableNodeCommonImplTest, SealedNodesRefuseWritesAndMutableNodesRefus
     EXPECT_INPUT_CONTRACT(node->GetOperator(0, got), "!mMutable");
     EXPECT_INPUT_CONTRACT(node->Prefetch(Range(0, 1), ML::CutlistRenderParams(), prefetches),
                           "!mMutable");
-    EXPECT_EQ(node->GetInputCount(), 0u) << "counts may be read while building";
-    // A mutable input cannot be sealed into a parent.
+    // A mutable input cannot be sealed into a parent, nor an empty operator.
     auto parent = MakeMutable<TestNode>("Parent", 0u);
     parent->AddInput(NodeRef(node.Get()), Ticks(0));
     EXPECT_INPUT_CONTRACT(parent->MakeImmutable(), "!mMutable");
-    EXPECT_TRUE(parent->IsMutable());
+    auto clip = MakeMutable<TestNode>("Clip", 0u);
+    clip->AddOperator(nullptr);
+    EXPECT_THROW(clip->MakeImmutable(), QRT::NullInterfaceException);
+    EXPECT_TRUE(parent->IsMutable() && clip->IsMutable());
 
     node->MakeImmutable();
     EXPECT_INPUT_CONTRACT(node->SetProperty(kKeyA, "1", true), "mMutable");
     EXPECT_INPUT_CONTRACT(node->AddInput(nullptr, Ticks(0)), "mMutable");
     EXPECT_INPUT_CONTRACT(node->AddOperator(MakeLeaf("Effect")), "mMutable");
     EXPECT_INPUT_CONTRACT(node->MakeImmutable(), "mMutable");
-    MF::RenderablePropertyValue value;
-    EXPECT_EQ(node->GetProperty(kKeyA, value), QRT::kResult_NotFound);
-}
-
-TEST_F(RenderableNodeCommonImplTest, EmptyOperatorFailsTheSealAndLeavesTheNodeMutable)
-{
-    auto node = MakeMutable<TestNode>("Clip", 0u);
-    node->AddOperator(nullptr);
-    EXPECT_THROW(node->MakeImmutable(), QRT::NullInterfaceException);
-    EXPECT_TRUE(node->IsMutable());
-}
-
-TEST_F(RenderableNodeCommonImplTest, SealedNodeHasItsKindsFlagsAndOnlyThePrefetchInterface)
-{
-    const NodeRef node = MakeLeaf("Leaf", 84u);
-    EXPECT_EQ(node->GetRenderFlags(), 84u);
-    EXPECT_TRUE(QRT::QueryRef<ML::IRenderableNodePrefetchProvider>(node));
-    EXPECT_FALSE(QRT::QueryRef<ML::IRenderableNodeProducerProvider>(node));
 }
 
 TEST_F(RenderableNodeCommonImplTest, PrefetchShiftsInputRangesByOffsetsThenMapsThem)
 {
     auto first = MakeMutable<TestNode>("Media", 0u);
     auto second = MakeMutable<TestNode>("Media", 0u);
-    auto parent = MakeMutable<TestNode>("Clip", 0u);
+    auto parent = MakeMutable<TestNode>("Clip", 84u);
     parent->AddInput(Seal(first), Ticks(100));
     parent->AddInput(nullptr, Ticks(0));
     parent->AddInput(Seal(second), Ticks(-50));
     // Media time = 1000 + 2 * t.
     parent->mTransform = MF::CreateTimeTransform(2.0, Ticks(0), Ticks(1000));
     parent->MakeImmutable();
+    EXPECT_EQ(parent->GetRenderFlags(), 84u);
 
     ML::RenderableNodePrefetchList prefetches;
     parent->Prefetch(Range(300, 400), ML::CutlistRenderParams(), prefetches);

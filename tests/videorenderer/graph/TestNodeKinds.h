@@ -3,7 +3,7 @@
 // The graph tests' doubles and hash helpers: a plain node kind with a chosen
 // type name and flags that records its prefetch ranges; a kind that also
 // answers IRenderableNodeProducerProvider with scripted still ranges and
-// smart-render times and records what it was asked; and an independent
+// smart-render times and records the ranges it was asked about; and an independent
 // re-computation of hashes from their byte runs, so the tests check the exact
 // order and length of every run mixed, not merely that a hash changed.
 
@@ -86,10 +86,9 @@ public:
         ioRanges.insert(ioRanges.end(), mStillRanges.begin(), mStillRanges.end());
     }
     void GetSmartRenderTimes(TickTime inStart, TickTime inEnd, const mvxmediatypes::FrameRate&,
-                             bool inFlag, std::set<TickTime>& ioTimes) const override
+                             bool, std::set<TickTime>& ioTimes) const override
     {
         mSmartQuestions.emplace_back(inStart, inEnd);
-        mSmartFlags.push_back(inFlag);
         ioTimes.insert(mSmartTimes.begin(), mSmartTimes.end());
     }
 
@@ -97,7 +96,6 @@ public:
     std::set<TickTime> mSmartTimes;
     mutable MF::TickTimeRangeList mStillQuestions;
     mutable MF::TickTimeRangeList mSmartQuestions;
-    mutable std::vector<bool> mSmartFlags;
 
 protected:
     ~ScriptedProviderNode() = default;
