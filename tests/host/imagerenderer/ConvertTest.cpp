@@ -32,18 +32,6 @@ TEST_F(ConvertTest, EightBitToFloatAndBackIsExact)
     EXPECT_EQ(MaxDifference(opaque, again), 0);
 }
 
-TEST_F(ConvertTest, PremultipliedToStraightInPlaceWithTheAlphaBits)
-{
-    Image frame(kBGRA8, 3, 1);
-    const Pixel in[] = {{64, 32, 0, 128}, {9, 9, 9, 0}, {200, 100, 50, 255}};
-    const Pixel out[] = {{128, 64, 0, 128}, {0, 0, 0, 0}, {200, 100, 50, 255}};
-    for (std::int32_t x = 0; x < 3; ++x)
-        frame.Set(x, 0, in[x]);
-    ASSERT_EQ(IR_Convert(frame.Data(), 12, kBGRP8, frame.Data(), 12, kBGRA8, 3, 1, 4), kIR_NoError);
-    for (std::int32_t x = 0; x < 3; ++x)
-        EXPECT_EQ(frame.Get(x, 0), out[x]) << x;
-}
-
 TEST_F(ConvertTest, YUV420KnownColoursByMatrix)
 {
     // BT.601 red (81, 90, 240), white and black, one 2x2 block each.

@@ -126,40 +126,6 @@ TEST_F(MotionTest, FieldPassTouchesOnlyItsRowsAndClearsThemWithoutALowerFrame)
             }
 }
 
-TEST_F(MotionTest, AlignedHalfSizeAveragesEachTwoByTwoBlock)
-{
-    // A 5 x 3 opaque source halved from the origin: each destination pixel is the mean of
-    // a 2 x 2 block; the last column and row take half of a block that is transparent
-    // outside the source; the rest of the cleared destination stays transparent.
-    Image src(kBGRP8, 5, 3, 1);
-    src.Fill({200, 200, 200, 255});
-    src.Set(0, 0, {10, 100, 0, 255});
-    src.Set(1, 0, {20, 110, 4, 255});
-    src.Set(0, 1, {30, 120, 8, 255});
-    src.Set(1, 1, {40, 130, 12, 255});
-    Image dst(kBGRP8, 4, 3, 2);
-    dst.Fill({9, 9, 9, 9});
-    const IR_AffineMatrix half{.a = 0.5, .d = 0.5};
-    ASSERT_EQ(Draw(src, dst, half, 4), kIR_NoError);
-    EXPECT_EQ(dst.Get(0, 0), (Pixel{25, 115, 6, 255}));
-    EXPECT_EQ(dst.Get(1, 0), (Pixel{200, 200, 200, 255}));
-    EXPECT_EQ(dst.Get(2, 0), (Pixel{100, 100, 100, 128}));
-    EXPECT_EQ(dst.Get(1, 1), (Pixel{100, 100, 100, 128}));
-    EXPECT_EQ(dst.Get(2, 1), (Pixel{50, 50, 50, 64}));
-    for (std::int32_t i = 0; i < 4; ++i)
-    {
-        EXPECT_EQ(dst.Get(3, std::min(i, 2)), (Pixel{0, 0, 0, 0})) << i;
-        EXPECT_EQ(dst.Get(i, 2), (Pixel{0, 0, 0, 0})) << i;
-    }
-    // The same halving onto an opaque lower frame composites the averages over it.
-    Image lower(kBGRP8, 4, 3, 1);
-    lower.Fill({0, 0, 0, 255});
-    ASSERT_EQ(Draw(src, lower, half, 4, kIR_Field_All, true), kIR_NoError);
-    EXPECT_EQ(lower.Get(0, 0), (Pixel{25, 115, 6, 255}));
-    EXPECT_EQ(lower.Get(2, 0), (Pixel{100, 100, 100, 255}));
-    EXPECT_EQ(lower.Get(3, 0), (Pixel{0, 0, 0, 255}));
-}
-
 TEST_F(MotionTest, BottomLeftBuffersUsePictureCoordinates)
 {
     const IR_PixelFormat bottomLeft = kBGRP8 | kIR_FormatBit_BottomLeft;
