@@ -75,32 +75,6 @@ TEST_F(FastKernelTest, CompositeMatchesReferenceAtEveryTailLengthAndKeepsThePadd
             }
 }
 
-TEST_F(FastKernelTest, StraightCompositeCoversEveryAlphaPair)
-{
-    // Source alpha runs along x, destination alpha along y: all 65536 pairs, with colours
-    // far apart (the weight error shows most) and close together.
-    for (float opacity : {1.0f, 0.5f, 0.03f})
-    {
-        Image src(kBGRA8, 256, 256, 1), dst(kBGRA8, 256, 256, 3);
-        for (std::int32_t y = 0; y < 256; ++y)
-            for (std::int32_t x = 0; x < 256; ++x)
-            {
-                src.Set(x, y, {255, 0, std::uint8_t((x * 7 + y) % 256), std::uint8_t(x)});
-                dst.Set(x, y, {0, 255, std::uint8_t((x + y * 5) % 256), std::uint8_t(y)});
-            }
-        Image expected = Copy(dst, 0);
-        IR::Reference::Composite(src.Data(), src.RowBytes(), expected.Data(), expected.RowBytes(),
-                                 kBGRA8, 256, 256, opacity);
-        ASSERT_EQ(IR_Composite(src.Data(), src.RowBytes(), dst.Data(), dst.RowBytes(), kBGRA8, 256,
-                               256, opacity, 4),
-                  kIR_NoError);
-        EXPECT_LE(MaxDifference(dst, expected), 1) << opacity;
-        // At full opacity the alpha is exact.
-        for (std::int32_t i = 0; i < 256 * 256 && opacity == 1.0f; ++i)
-            ASSERT_EQ(dst.Get(i % 256, i / 256)[3], expected.Get(i % 256, i / 256)[3]) << i;
-    }
-}
-
 TEST_F(FastKernelTest, MixMatchesReferenceOnMisalignedOddRows)
 {
     std::mt19937 random(5);

@@ -18,13 +18,8 @@ using namespace vftest;
 Frame MakePattern(uint32_t inWidth, uint32_t inHeight)
 {
     const Frame frame = MakeFrame(mt::kPixelFormat_BGRA_4444_8u, inWidth, inHeight);
-    for (uint32_t y = 0; y < inHeight; ++y)
-        for (uint32_t x = 0; x < inWidth; ++x)
-        {
-            const uint8_t pixel[4] = {uint8_t(x * 13 + y), uint8_t(y * 29), uint8_t(255 - x),
-                                      uint8_t(x * 40 + y * 3)};
-            std::memcpy(Row(frame, int32_t(y), int32_t(x)), pixel, 4);
-        }
+    for (uint32_t i = 0; i < 4 * inWidth * inHeight; ++i)
+        Row(frame, int32_t(i / (4 * inWidth)))[i % (4 * inWidth)] = uint8_t(i * 13 + i / 7);
     return frame;
 }
 
