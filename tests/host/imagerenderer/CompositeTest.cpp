@@ -137,15 +137,6 @@ TEST_F(BlendModeTest, EachModeGivesItsFunctionUnderTheAlphaRule)
         }
 }
 
-TEST_F(BlendModeTest, EightBitMultiplyIsWithinOneCodeValue)
-{
-    Image dst = One(kBGRA8, {200, 100, 10, 255});
-    ASSERT_EQ(BlendMotion(One(kBGRA8, {128, 64, 255, 255}), dst, kIR_BlendMode_Multiply),
-              kIR_NoError);
-    // 128 * 200 / 255 = 100.4, 64 * 100 / 255 = 25.1, 255 * 10 / 255 = 10.
-    EXPECT_EQ(dst.Get(0, 0), (Pixel{100, 25, 10, 255}));
-}
-
 TEST_F(BlendModeTest, OnlyTheListedModesAreValid)
 {
     for (std::uint32_t mode = 0; mode <= 20; ++mode)

@@ -115,18 +115,6 @@ TEST_F(SharedVideoFrameCacheTest, BudgetHoldsAfterEveryInsertion)
     EXPECT_LE(cache.GetStatistics().mBytes, 2 * kFrameBytes);
 }
 
-TEST_F(SharedVideoFrameCacheTest, FrameHeldElsewhereSurvivesEviction)
-{
-    const Frame held = MakeTagged(42);
-    mCache.InsertIntoCache(held, KeyFor(0), 0);
-    for (uint32_t i = 1; i <= 5; ++i)
-        Insert(i, 0);
-    EXPECT_EQ(Held(1), Keys{});
-    // The cache dropped only its own reference: ours is the last one.
-    EXPECT_EQ(ReferenceCount(held), 1u);
-    EXPECT_EQ(TagOf(held), 42);
-}
-
 TEST_F(SharedVideoFrameCacheTest, DependencyPinsAFrameUntilUnregisteredAndSurvivesClear)
 {
     // Registered before the frames arrive, as a prefetch does; pinned frames may exceed the

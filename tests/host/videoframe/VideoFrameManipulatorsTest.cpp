@@ -125,26 +125,6 @@ TEST_F(VideoFrameManipulatorsTest, EightBitThroughEachStagedFormatAndBack)
         EXPECT_NEAR(PixelF(yuv, 0, 0)[c], c == 2 ? 1.0f : 0.0f, 1e-5f) << c;
 }
 
-TEST_F(VideoFrameManipulatorsTest, HalvingTakesNearestAtLowQualityAndAveragesAtHigh)
-{
-    const Frame source = MakeFrame(kBGRA8, 4, 4);
-    for (int32_t i = 0; i < 16; ++i)
-        SetPixel8(source, i % 4, i / 4, {uint8_t(8 * i), 0, 0, 255});
-    // Nearest: destination (x, y) samples source (2x + 1, 2y + 1). Bilinear: block (0, 0) holds
-    // 0, 8, 32, 40 -> 20.
-    const std::pair<mt::RenderQuality, std::array<int, 4>> cases[] = {
-        {mt::kRenderQuality_Low, {40, 56, 104, 120}}, {mt::kRenderQuality_High, {20, 36, 84, 100}}};
-    for (const auto& [quality, expected] : cases)
-    {
-        const Frame half = MakeFrame(kBGRA8, 2, 2);
-        ASSERT_EQ(Copy(source, half, quality), QRT::kResult_Success);
-        for (int32_t i = 0; i < 4; ++i)
-            EXPECT_EQ(std::pair(int{Row(half, i / 2, i % 2)[0]}, int{Row(half, i / 2, i % 2)[3]}),
-                      std::pair(expected[i], 255))
-                << quality << " " << i;
-    }
-}
-
 TEST_F(VideoFrameManipulatorsTest, FieldsStoredApartAreReorderedExactly)
 {
     const Frame interleaved = MakeFrame(mt::kPixelFormat_YUYV_422_8u, 4, 5);
