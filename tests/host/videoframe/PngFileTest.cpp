@@ -71,14 +71,14 @@ TEST_F(PngFileTest, WriteThenReadIsExactForRGBAOpaqueForRGBAndConvertsFloat)
         const VF::PngStatus status = VF::WritePngFile(PathOf("pattern.png"), written);
         ASSERT_TRUE(status.Succeeded()) << status.mMessage;
         ASSERT_EQ(Read(PathOf("pattern.png"), read).mMessage, "");
-        EXPECT_EQ(read->GetPixelFormat(), mt::kPixelFormat_BGRA_4444_8u);
-        EXPECT_EQ(read->GetAlphaChannel(), mt::kAlphaChannel_Straight);
-        EXPECT_TRUE(SamePixels(read, frame));
+        EXPECT_EQ(
+            std::tuple(read->GetPixelFormat(), read->GetAlphaChannel(), SamePixels(read, frame)),
+            std::tuple(mt::kPixelFormat_BGRA_4444_8u, mt::kAlphaChannel_Straight, true));
     }
     ASSERT_TRUE(VF::WritePngFile(PathOf("rgb.png"), frame, VF::PngChannels::kRGB).Succeeded());
     ASSERT_TRUE(Read(PathOf("rgb.png"), read).Succeeded());
-    EXPECT_EQ(std::memcmp(Row(read, 1, 2), Row(frame, 1, 2), 3), 0);
-    EXPECT_EQ(Row(read, 1, 2)[3], 255);
+    EXPECT_EQ(std::pair(std::memcmp(Row(read, 1, 2), Row(frame, 1, 2), 3), int{Row(read, 1, 2)[3]}),
+              std::pair(0, 255));
 }
 
 TEST_F(PngFileTest, TruncatedOrCorruptedFileIsMalformedNotACrash)

@@ -271,9 +271,8 @@ TEST_F(SharedVideoFrameCacheTest, EnvironmentSwitchTurnsTheCacheOffAndTheSharedO
     disabled.SetNotificationFunction([&](const Guid&) { ++notified; });
     const Frame frame = MakeTagged(5);
     disabled.InsertIntoCache(frame, KeyFor(5), 10);
-    EXPECT_TRUE(frame->IsShared());
-    EXPECT_EQ(notified, 1);
-    EXPECT_FALSE(disabled.RetrieveFromCache(KeyFor(5)));
+    EXPECT_EQ(std::tuple(frame->IsShared(), notified, bool(disabled.RetrieveFromCache(KeyFor(5)))),
+              std::tuple(true, 1, false));
     EXPECT_EQ(Counts(disabled), (Expected{0, 1, 0, 1, 0, 0, 0}));
     // The process-wide cache serves the static functions.
     EXPECT_LE(VF::SharedVideoFrameCache::GetInstance().GetByteBudget(), size_t{4} << 30);

@@ -317,9 +317,9 @@ TEST_F(VideoFrameManipulatorsTest, AddressableFrameIsTheFrameItselfOrACopy)
     // Another format: a converted copy with the frame's attributes.
     const Frame floats = addressable(frame, kBGRA32f);
     ASSERT_TRUE(floats);
-    EXPECT_NE(floats.Get(), frame.Get());
-    EXPECT_EQ(floats->GetPixelFormat(), kBGRA32f);
-    EXPECT_EQ(floats->GetFieldType(), mt::kFieldType_LowerFirst);
+    EXPECT_EQ(
+        std::tuple(floats.Get() != frame.Get(), floats->GetPixelFormat(), floats->GetFieldType()),
+        std::tuple(true, kBGRA32f, mt::kFieldType_LowerFirst));
     EXPECT_NEAR(PixelF(floats, 1, 1)[1], 0.4f, 1e-6f);
 }
 
