@@ -177,21 +177,6 @@ TEST_F(VideoFrameTest, SharedFrameRefusesEveryWriteButRenderTime)
     EXPECT_INPUT_CONTRACT(frame->GetPlaneRowBytes(1), "inPlane < mLayout.mPlaneCount");
 }
 
-TEST_F(VideoFrameTest, PixelAccessInterfacesAnswerRowBytesAndBaseAddress)
-{
-    const Frame frame = MakeFrame(mt::kPixelFormat_BGRA_4444_16u, 21, 4);
-    const auto rowBytes = QRT::QueryRef<MF::IVideoFrameRowBytes>(frame);
-    const auto baseAddress = QRT::QueryRef<MF::IVideoFrameBaseAddress>(frame);
-    ASSERT_TRUE(rowBytes && baseAddress);
-    EXPECT_EQ(rowBytes->GetRowBytes(), 192); // 21 * 8 = 168 -> 192
-    EXPECT_EQ(baseAddress->GetBaseAddress(), frame->GetBaseAddress());
-    EXPECT_EQ(baseAddress->GetWritableBaseAddress(), frame->GetBaseAddress());
-    frame->MarkShared(1);
-    EXPECT_INPUT_CONTRACT(baseAddress->GetWritableBaseAddress(), "!IsShared()");
-    // Back to the frame interface through the access interface.
-    EXPECT_TRUE(QRT::QueryRef<MF::IVideoFrame>(rowBytes) == frame);
-}
-
 TEST_F(VideoFrameTest, AlphaAnalysisIsRememberedUntilAlphaChanged)
 {
     const Frame frame = MakeFrame(kBGRA8, 5, 3);
