@@ -41,81 +41,45 @@ void SetAttributes(MF::IVideoFrame& ioFrame)
 // render time and visible content.
 void ExpectAttributes(const MF::IVideoFrame& inFrame, bool inEmpty)
 {
-    EXPECT_EQ(inFrame.GetFieldType(), mt::kFieldType_LowerFirst);
-    EXPECT_EQ(inFrame.GetPixelAspectRatio().GetNumerator(), 10u);
-    EXPECT_EQ(inFrame.GetAlphaChannel(), mt::kAlphaChannel_Premultiplied);
-    EXPECT_EQ(OriginOf(inFrame), std::pair(7u, 8u));
-    EXPECT_EQ(inFrame.GetFullFrameRect(), ParamRect(0, 0, 32, 8));
-    EXPECT_EQ(inFrame.GetRenderTime(), inEmpty ? 0u : 12u);
-    // An empty frame's visible content starts again.
+    EXPECT_EQ(std::tuple(inFrame.GetFieldType(), inFrame.GetPixelAspectRatio().GetNumerator(),
+                         inFrame.GetAlphaChannel(), OriginOf(inFrame), inFrame.GetFullFrameRect(),
+                         inFrame.GetRenderTime(), inFrame.IsShared()),
+              std::tuple(mt::kFieldType_LowerFirst, 10u, mt::kAlphaChannel_Premultiplied,
+                         std::pair(7u, 8u), ParamRect(0, 0, 32, 8), inEmpty ? 0u : 12u, false));
     EXPECT_TRUE(inEmpty || inFrame.GetVisibleContentRect() == ParamRect(1, 1, 5, 3));
-    EXPECT_FALSE(inFrame.IsShared());
 }
 
 using VideoFrameTest = ::testing::Test;
 
 TEST_F(VideoFrameTest, NewFrameHasRequestedAttributesAndDefaults)
 {
-    Frame frame;
-    ASSERT_EQ(
-        VF::CreateVideoFrame(kBGRA8, 100, 3, mt::kPixelAspectRatio_D1PAL, false, false, frame),
-        QRT::kResult_Success);
+    const Frame frame = MakeFrame(kBGRA8, 100, 3, false);
     // Row bytes: 400 rounded up to 64.
-    EXPECT_EQ(std::tuple(frame->GetPixelFormat(), frame->GetBounds(), frame->GetRowBytes(),
-                         frame->GetDataSize(), frame->GetPlaneCount()),
-              std::tuple(kBGRA8, ParamRect(0, 0, 100, 3), 448, size_t{448 * 3}, 1u));
-    EXPECT_EQ(
-        std::tuple(frame->GetPixelAspectRatio().GetNumerator(),
-                   frame->GetPixelAspectRatio().GetDenominator(), frame->GetFieldType(),
-                   frame->GetAlphaChannel(), frame->HasAlpha(), frame->GetRenderTime()),
-        std::tuple(59u, 54u, mt::kFieldType_Progressive, mt::kAlphaChannel_Straight, true, 0u));
-    EXPECT_EQ(std::tuple(OriginOf(*frame), frame->HasFullFrame(0), frame->GetFullFrameRect(),
-                         frame->TracksVisibleContent(), frame->GetVisibleContentRect(),
-                         frame->IsShared()),
-              std::tuple(std::pair(0xFFFFFFFFu, 0xFFFFFFFFu), false, ParamRect(), false,
-                         ParamRect(0, 0, 100, 3), false));
+    EXPECT_EQ(std::tuple(frame->GetRowBytes(), frame->GetDataSize(), frame->GetFieldType(),
+                         frame->HasAlpha(), OriginOf(*frame), frame->HasFullFrame(0),
+                         frame->GetVisibleContentRect()),
+              std::tuple(448, size_t{448 * 3}, mt::kFieldType_Progressive, true,
+                         std::pair(0xFFFFFFFFu, 0xFFFFFFFFu), false, ParamRect(0, 0, 100, 3)));
     // Ignored alpha does not count as alpha.
     frame->SetAlphaChannel(mt::kAlphaChannel_Ignore);
     EXPECT_FALSE(frame->HasAlpha());
 }
 
-TEST_F(VideoFrameTest, EveryRowOfEveryFormatIs64ByteAligned)
-{
-    for (const mt::PixelFormat format :
-         {kBGRA8, mt::kPixelFormat_BGRA_4444_16u, mt::kPixelFormat_BGRA_4444_16f,
-          mt::kPixelFormat_BGRA_4444_32f, mt::kPixelFormat_BGRP_4444_32f_Linear,
-          mt::kPixelFormat_VUYA_4444_8u, mt::kPixelFormat_YUYV_422_8u,
-          mt::kPixelFormat_YUYV_422_8u_Fields, mt::kPixelFormat_YUYV_422_8u_HalfWidthFields,
-          kPlanar420})
-        for (const uint32_t width : {1u, 3u, 17u, 719u, 1920u})
-        {
-            const Frame frame = MakeFrame(format, width, 5);
-            for (uint32_t plane = 0; plane < frame->GetPlaneCount(); ++plane)
-            {
-                const auto base = reinterpret_cast<uintptr_t>(frame->GetPlaneBaseAddress(plane));
-                EXPECT_EQ(base % 64, 0u) << width << " " << plane;
-                EXPECT_EQ(frame->GetPlaneRowBytes(plane) % 64, 0) << width << " " << plane;
-            }
-        }
-}
-
 TEST_F(VideoFrameTest, LayoutOfPackedHalvedAndPlanarFormats)
 {
+    // 17 * 16 = 272 -> 320; an odd 4:2:2 width keeps room for the last pair, 68 -> 128; half
+    // width counts 4-byte pixel pairs.
+    const std::tuple<mt::PixelFormat, uint32_t, int32_t> packed[] = {
+        {mt::kPixelFormat_BGRA_4444_32f, 17, 320},
+        {mt::kPixelFormat_YUYV_422_8u, 33, 128},
+        {mt::kPixelFormat_YUYV_422_8u_HalfWidthFields, 960, 3840}};
     VF::FrameLayout layout;
-    // 16 bytes per pixel: 17 * 16 = 272, rounded to 320.
-    ASSERT_EQ(VF::ComputeFrameLayout(mt::kPixelFormat_BGRA_4444_32f, 17, 2, layout),
-              QRT::kResult_Success);
-    EXPECT_EQ(layout.mPlanes[0].mRowBytes, 320);
-    EXPECT_EQ(layout.mTotalBytes, 640u);
-    // 4:2:2 with an odd width keeps room for the last pixel pair: 34 * 2 = 68 -> 128.
-    ASSERT_EQ(VF::ComputeFrameLayout(mt::kPixelFormat_YUYV_422_8u, 33, 1, layout),
-              QRT::kResult_Success);
-    EXPECT_EQ(layout.mPlanes[0].mRowBytes, 128);
-    // Half-width storage: the width counts 4-byte pixel pairs.
-    ASSERT_EQ(
-        VF::ComputeFrameLayout(mt::kPixelFormat_YUYV_422_8u_HalfWidthFields, 960, 1080, layout),
-        QRT::kResult_Success);
-    EXPECT_EQ(layout.mPlanes[0].mRowBytes, 3840);
+    for (const auto& [format, width, rowBytes] : packed)
+    {
+        ASSERT_EQ(VF::ComputeFrameLayout(format, width, 2, layout), QRT::kResult_Success);
+        EXPECT_EQ(std::pair(layout.mPlanes[0].mRowBytes, layout.mTotalBytes),
+                  std::pair(rowBytes, size_t(2 * rowBytes)));
+    }
     // 4:2:0: Y, then Cb and Cr at half size rounded up (65 -> 128), each plane 64-aligned.
     ASSERT_EQ(VF::ComputeFrameLayout(kPlanar420, 130, 5, layout), QRT::kResult_Success);
     ASSERT_EQ(layout.mPlaneCount, 3u);
@@ -124,8 +88,7 @@ TEST_F(VideoFrameTest, LayoutOfPackedHalvedAndPlanarFormats)
     for (uint32_t p = 0; p < 3; ++p)
         EXPECT_EQ(std::tuple(layout.mPlanes[p].mOffset, layout.mPlanes[p].mRowBytes,
                              layout.mPlanes[p].mRows),
-                  planes[p])
-            << p;
+                  planes[p]);
     EXPECT_EQ(layout.mTotalBytes, 192u * 5 + 128 * 3 * 2);
 }
 
@@ -145,8 +108,7 @@ TEST_F(VideoFrameTest, BadFormatsAndSizesGiveStatusesAndNoFrame)
         Frame frame = MakeFrame(kBGRA8, 2, 2);
         EXPECT_EQ(VF::CreateVideoFrame(format, width, height, mt::kPixelAspectRatio_Square, false,
                                        false, frame),
-                  status)
-            << width << "x" << height;
+                  status);
         EXPECT_FALSE(frame); // emptied on failure
         EXPECT_FALSE(
             VF::CreateVideoFrame(format, width, height, mt::kPixelAspectRatio_Square, true, true));
@@ -168,10 +130,9 @@ TEST_F(VideoFrameTest, ClearAndTrackingFlagsZeroARecycledDirtyBuffer)
     }
 }
 
-TEST_F(VideoFrameTest, TrackedVisibleContentStartsEmptyAndGrowsWithinTheBounds)
+TEST_F(VideoFrameTest, TrackedVisibleContentGrowsWithinTheBoundsAndFullFrameAnswersQueries)
 {
     const Frame frame = MakeFrame(kBGRA8, 64, 16, false, true);
-    EXPECT_TRUE(frame->TracksVisibleContent());
     EXPECT_EQ(frame->GetVisibleContentRect(), ParamRect());
     frame->GrowVisibleContentRect(ParamRect(4, 4, 10, 8));
     frame->GrowVisibleContentRect(ParamRect(20, 2, 30, 5));
@@ -179,32 +140,24 @@ TEST_F(VideoFrameTest, TrackedVisibleContentStartsEmptyAndGrowsWithinTheBounds)
     frame->GrowVisibleContentRect(ParamRect(-5, -5, 100, 3));
     EXPECT_EQ(frame->GetVisibleContentRect(), ParamRect(0, 0, 64, 8));
     // An untracked frame ignores growth and answers its bounds.
-    const Frame untracked = MakeFrame(kBGRA8, 64, 16);
+    const Frame untracked = MakeFrame(kBGRA8, 40, 30);
     untracked->GrowVisibleContentRect(ParamRect(1, 1, 2, 2));
-    EXPECT_EQ(untracked->GetVisibleContentRect(), ParamRect(0, 0, 64, 16));
-}
-
-TEST_F(VideoFrameTest, FullFrameQueryAndRectangleQuery)
-{
-    const Frame frame = MakeFrame(kBGRA8, 40, 30);
+    EXPECT_EQ(untracked->GetVisibleContentRect(), ParamRect(0, 0, 40, 30));
     // The whole frame, a part of a larger frame, and none.
-    const std::tuple<ParamRect, bool, bool> cases[] = {{ParamRect(0, 0, 40, 30), true, true},
-                                                       {ParamRect(0, 0, 80, 60), true, false},
-                                                       {ParamRect(), false, false}};
-    for (const auto& [rect, part, whole] : cases)
+    for (const auto& [rect, part, whole] :
+         {std::tuple{ParamRect(0, 0, 40, 30), true, true},
+          std::tuple{ParamRect(0, 0, 80, 60), true, false}, std::tuple{ParamRect(), false, false}})
     {
-        frame->SetFullFrameRect(rect);
-        EXPECT_EQ(frame->GetFullFrameRect(), rect);
-        EXPECT_EQ(frame->HasFullFrame(0), part) << rect.Width();
-        EXPECT_EQ(frame->HasFullFrame(1), whole) << rect.Width();
+        untracked->SetFullFrameRect(rect);
+        EXPECT_EQ(std::pair(untracked->HasFullFrame(0), untracked->HasFullFrame(1)),
+                  std::pair(part, whole));
     }
-    EXPECT_INPUT_CONTRACT(frame->HasFullFrame(2), "inWhole == 0 || inWhole == 1");
-    EXPECT_INPUT_CONTRACT(frame->SetFullFrameRect(ParamRect(5, 5, 5, 9)),
+    EXPECT_INPUT_CONTRACT(untracked->HasFullFrame(2), "inWhole == 0 || inWhole == 1");
+    EXPECT_INPUT_CONTRACT(untracked->SetFullFrameRect(ParamRect(5, 5, 5, 9)),
                           "IsAllZero(inRect) || !inRect.IsEmpty()");
-    for (const auto& [rect, inside] :
-         {std::pair{ParamRect(0, 0, 40, 30), true}, std::pair{ParamRect(10, 10, 20, 20), true},
-          std::pair{ParamRect(0, 0, 41, 30), false}, std::pair{ParamRect(-1, 0, 10, 10), false}})
-        EXPECT_EQ(frame->CanProvideRect(rect), inside) << rect.Width() << "x" << rect.Height();
+    EXPECT_EQ(std::pair(untracked->CanProvideRect(ParamRect(10, 10, 40, 30)),
+                        untracked->CanProvideRect(ParamRect(-1, 0, 10, 10))),
+              std::pair(true, false));
 }
 
 TEST_F(VideoFrameTest, SharedFrameRefusesEveryWriteButRenderTime)
@@ -213,36 +166,15 @@ TEST_F(VideoFrameTest, SharedFrameRefusesEveryWriteButRenderTime)
     frame->MarkShared(0); // unmarking an unshared frame does nothing
     EXPECT_FALSE(frame->IsShared());
     frame->MarkShared(1);
-    EXPECT_TRUE(frame->IsShared());
-    EXPECT_NE(frame->GetBaseAddress(), nullptr);
     EXPECT_INPUT_CONTRACT(frame->GetWritableBaseAddress(), "!IsShared()");
     EXPECT_INPUT_CONTRACT(frame->GetWritablePlaneBaseAddress(0), "!IsShared()");
     EXPECT_INPUT_CONTRACT(frame->SetFieldType(mt::kFieldType_UpperFirst), "!IsShared()");
     EXPECT_INPUT_CONTRACT(frame->SetOriginOffset(1, 1), "!IsShared()");
     EXPECT_INPUT_CONTRACT(frame->SetVisibleContentRect(ParamRect()), "!IsShared()");
     EXPECT_INPUT_CONTRACT(frame->MarkShared(0), "inShared != 0 || !IsShared()");
-    EXPECT_EQ(frame->GetFieldType(), mt::kFieldType_Progressive);
     frame->SetRenderTime(9);
     EXPECT_EQ(frame->GetRenderTime(), 9u);
     EXPECT_INPUT_CONTRACT(frame->GetPlaneRowBytes(1), "inPlane < mLayout.mPlaneCount");
-}
-
-TEST_F(VideoFrameTest, PixelAccessInterfacesAnswerRowBytesAndBaseAddress)
-{
-    EXPECT_EQ(MF::IVideoFrameRowBytes::kIID, QRT::Guid("{282d21cf-d8da-4e4f-82be-6e9c176ca796}"));
-    EXPECT_EQ(MF::IVideoFrameBaseAddress::kIID,
-              QRT::Guid("{58d1d4d6-e9fb-4fe0-a8bc-3a3c7634eb3b}"));
-    const Frame frame = MakeFrame(mt::kPixelFormat_BGRA_4444_16u, 21, 4);
-    const auto rowBytes = QRT::QueryRef<MF::IVideoFrameRowBytes>(frame);
-    const auto baseAddress = QRT::QueryRef<MF::IVideoFrameBaseAddress>(frame);
-    ASSERT_TRUE(rowBytes && baseAddress);
-    EXPECT_EQ(rowBytes->GetRowBytes(), 192); // 21 * 8 = 168 -> 192
-    EXPECT_EQ(baseAddress->GetBaseAddress(), frame->GetBaseAddress());
-    EXPECT_EQ(baseAddress->GetWritableBaseAddress(), frame->GetBaseAddress());
-    frame->MarkShared(1);
-    EXPECT_INPUT_CONTRACT(baseAddress->GetWritableBaseAddress(), "!IsShared()");
-    // Back to the frame interface through the access interface.
-    EXPECT_TRUE(QRT::QueryRef<MF::IVideoFrame>(rowBytes) == frame);
 }
 
 TEST_F(VideoFrameTest, AlphaAnalysisIsRememberedUntilAlphaChanged)
@@ -256,14 +188,13 @@ TEST_F(VideoFrameTest, AlphaAnalysisIsRememberedUntilAlphaChanged)
     Row(frame, 2, 4)[3] = 0x7F; // one translucent pixel, the last
     frame->AlphaChanged();
     EXPECT_FALSE(frame->IsAlphaOpaque());
-
     const Frame floats = MakeFrame(mt::kPixelFormat_BGRA_4444_32f, 2, 1);
     const float pixels[8] = {0, 0, 0, 1.0f, 0.5f, 0.5f, 0.5f, 1.0f};
     std::memcpy(floats->GetWritableBaseAddress(), pixels, sizeof pixels);
     EXPECT_TRUE(floats->IsAlphaOpaque());
     const Frame noAlpha = MakeFrame(mt::kPixelFormat_YUYV_422_8u, 4, 2);
-    EXPECT_FALSE(noAlpha->HasAlpha());
-    EXPECT_EQ(noAlpha->GetAlphaChannel(), mt::kAlphaChannel_None);
+    EXPECT_EQ(std::pair(noAlpha->GetAlphaChannel(), noAlpha->HasAlpha()),
+              std::pair(mt::kAlphaChannel_None, false));
     EXPECT_TRUE(noAlpha->IsAlphaOpaque());
     EXPECT_EQ(MakeFrame(mt::kPixelFormat_BGRP_4444_32f_Linear, 4, 2)->GetAlphaChannel(),
               mt::kAlphaChannel_Premultiplied);
@@ -279,20 +210,11 @@ TEST_F(VideoFrameTest, CreateEmptyFrameCopiesAttributesNotPixels)
     EXPECT_EQ(empty->GetBounds(), frame->GetBounds());
     ExpectAttributes(*empty, true);
     EXPECT_TRUE(AllBytesAre(*empty, 0));
-    EXPECT_TRUE(AllBytesAre(*frame, 0x11));
 }
 
 using CopyOnWriteTest = ::testing::Test;
 
-TEST_F(CopyOnWriteTest, SoleUnsharedHolderWritesInPlace)
-{
-    Frame frame = MakeFrame(kBGRA8, 16, 4);
-    MF::IVideoFrame* const original = frame.Get();
-    frame = VF::MakeWriteableVideoFrame(frame, mt::kRenderQuality_High);
-    EXPECT_EQ(frame.Get(), original);
-}
-
-TEST_F(CopyOnWriteTest, SharedFrameYieldsACopyAndStaysUnchanged)
+TEST_F(CopyOnWriteTest, SharedOrTwiceHeldFrameYieldsACopySoleHolderWritesInPlace)
 {
     const Frame original = MakeFrame(kBGRA8, 16, 4);
     FillBytes(*original, 0x22);
@@ -302,27 +224,16 @@ TEST_F(CopyOnWriteTest, SharedFrameYieldsACopyAndStaysUnchanged)
     ASSERT_TRUE(writable);
     EXPECT_NE(writable.Get(), original.Get());
     EXPECT_TRUE(AllBytesAre(*writable, 0x22));
-    EXPECT_EQ(writable->GetPixelFormat(), original->GetPixelFormat());
-    EXPECT_EQ(writable->GetBounds(), original->GetBounds());
     ExpectAttributes(*writable, false);
     FillBytes(*writable, 0x99);
-    writable->SetFieldType(mt::kFieldType_Progressive);
     EXPECT_TRUE(AllBytesAre(*original, 0x22));
-    EXPECT_EQ(original->GetFieldType(), mt::kFieldType_LowerFirst);
-}
-
-TEST_F(CopyOnWriteTest, FrameHeldTwiceYieldsACopyUntilTheOtherHolderLetsGo)
-{
+    // A frame held twice yields a copy too; the sole unshared holder writes in place.
     Frame frame = MakeFrame(mt::kPixelFormat_YUYV_422_8u, 9, 3);
-    FillBytes(*frame, 0x33);
     const Frame otherHolder = frame;
-    Frame writable = VF::MakeWriteableVideoFrame(frame, mt::kRenderQuality_Max);
-    EXPECT_NE(writable.Get(), otherHolder.Get());
-    FillBytes(*writable, 0x44);
-    EXPECT_TRUE(AllBytesAre(*otherHolder, 0x33));
-    MF::IVideoFrame* const copy = writable.Get();
-    writable = VF::MakeWriteableVideoFrame(writable, mt::kRenderQuality_Max);
-    EXPECT_EQ(writable.Get(), copy);
+    frame = VF::MakeWriteableVideoFrame(frame, mt::kRenderQuality_Max);
+    EXPECT_NE(frame.Get(), otherHolder.Get());
+    MF::IVideoFrame* const copy = frame.Get();
+    EXPECT_EQ(VF::MakeWriteableVideoFrame(frame, mt::kRenderQuality_Max).Get(), copy);
 }
 
 TEST_F(CopyOnWriteTest, PlanarFrameCopiesEveryPlane)
@@ -338,8 +249,7 @@ TEST_F(CopyOnWriteTest, PlanarFrameCopiesEveryPlane)
     for (uint32_t plane = 0; plane < 3; ++plane)
     {
         const auto* bytes = static_cast<const uint8_t*>(copy->GetPlaneBaseAddress(plane));
-        EXPECT_EQ(bytes[0], plane + 1);
-        EXPECT_EQ(bytes[planeBytes(copy, plane) - 1], plane + 1);
+        EXPECT_EQ(bytes[0] + bytes[planeBytes(copy, plane) - 1], 2 * (plane + 1));
     }
     EXPECT_INPUT_CONTRACT(VF::MakeWriteableVideoFrame(Frame(), mt::kRenderQuality_High),
                           "inFrame != nullptr");
