@@ -90,34 +90,48 @@ TEST_F(FieldFiltersTest, DeinterlacePassesProgressiveFramesAndKeepsTheSecondTime
               MF::FrameTime(mT, mTField));
 }
 
-TEST_F(FieldFiltersTest, DeinterlaceStepTakesOneFieldOfATwiceTallFieldByFieldFrame)
+// Stored fields apart at twice the requested height, the kept field's rows go
+// one to one, in order, into a frame of the requested height. At four times
+// the height, from quality 3 on each row is the mean of the field's two rows
+// it stands for, below it the first of them.
+TEST_F(FieldFiltersTest, DeinterlaceStepTakesOneFieldOfATallFieldByFieldFrame)
 {
-    // Stored fields apart at twice the requested height: the kept field's rows
-    // go one to one, in order, into a frame of the requested height.
     const auto source = [&](std::int32_t, std::int32_t inY)
     { return inY % 2 == 0 ? GradientMarker(mT, 1, inY) : GradientMarker(mTField, 2, inY); };
     const auto fieldsFormat = mvxmediatypes::kPixelFormat_YUYV_422_8u_Fields;
-    const FrameRef fields = Converted(MakeFrame(kWidth, 2 * kHeight, source), fieldsFormat);
-    fields->SetFieldType(mvxmediatypes::kFieldType_UpperFirst);
-    CutlistRenderParams params = mParams;
-    params.mPixelFormat = fieldsFormat;
-    for (const std::int32_t kept : {0, 1})
+    const struct
     {
+        std::int32_t mMultiple;
+        std::uint32_t mQuality;
+        std::int32_t mKept;
+    } cases[] = {{2, 4, 0}, {2, 4, 1}, {4, 3, 1}, {4, 2, 0}};
+    for (const auto& c : cases)
+    {
+        SCOPED_TRACE(testing::Message() << "height x" << c.mMultiple << " quality " << c.mQuality
+                                        << " kept field " << c.mKept + 1);
+        const FrameRef fields =
+            Converted(MakeFrame(kWidth, c.mMultiple * kHeight, source), fieldsFormat);
+        fields->SetFieldType(mvxmediatypes::kFieldType_UpperFirst);
+        const CutlistRenderParams params = MakeParams(kWidth, kHeight, c.mQuality, fieldsFormat);
         const FrameRef result =
-            FieldFilterSteps::DeinterlaceKeepingField(fields, params, kept == 1);
+            FieldFilterSteps::DeinterlaceKeepingField(fields, params, c.mKept == 1);
         ASSERT_TRUE(result);
         EXPECT_EQ(result->GetBounds(), QRT::ParamRect(0, 0, kWidth, kHeight));
         EXPECT_EQ(result->GetPixelFormat(), fieldsFormat);
         EXPECT_EQ(result->GetFieldType(), mvxmediatypes::kFieldType_Progressive);
+        const bool mean = c.mMultiple == 4 && c.mQuality >= 3;
+        const auto expected = [&](std::int32_t inX, std::int32_t inY)
+        {
+            Pixel pixel = source(inX, c.mMultiple * inY + c.mKept);
+            pixel.mR = static_cast<std::uint8_t>(pixel.mR + (mean ? 10 : 0));
+            return pixel;
+        };
         // Compared after the same round trip through the fields format.
         const FrameRef want =
-            Converted(Converted(MakeFrame(kWidth, kHeight,
-                                          [&](std::int32_t inX, std::int32_t inY)
-                                          { return source(inX, 2 * inY + kept); }),
-                                fieldsFormat));
-        EXPECT_TRUE(PixelsAre(Converted(result), [&](std::int32_t inX, std::int32_t inY)
-                              { return ReadPixel(*want, inX, inY); }))
-            << "kept field " << kept + 1;
+            Converted(Converted(MakeFrame(kWidth, kHeight, expected), fieldsFormat));
+        EXPECT_TRUE(PixelsAre(
+            Converted(result),
+            [&](std::int32_t inX, std::int32_t inY) { return ReadPixel(*want, inX, inY); }, 4));
     }
 }
 

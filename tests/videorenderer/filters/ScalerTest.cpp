@@ -45,24 +45,6 @@ TEST_F(ScalerTest, AFrameAlreadyAtTheRequestedBoundsAndRatioPassesUnchanged)
                 Render(*ScaleAndPARCorrectSource(upper), MF::FrameTime(mT, mTField), params));
 }
 
-TEST_F(ScalerTest, AnotherPixelAspectRatioIsCorrectedIntoANewFrameKeepingEveryRow)
-{
-    // 16 square columns become 8 of twice the width; rows stay as they were.
-    CutlistRenderParams wide = MakeParams(8, 6);
-    wide.mPixelAspectRatio = mvxmediatypes::PixelAspectRatio(2, 1);
-    for (const std::uint32_t width : {8u, 16u})
-    {
-        auto native = MakeMarkedSource(Delivery::kProgressive, width, 6);
-        const FrameRef corrected =
-            Render(*ScaleAndPARCorrectSource(native), MF::FrameTime(mT), wide);
-        ASSERT_TRUE(corrected);
-        EXPECT_FALSE(corrected == native->LastFrame());
-        EXPECT_EQ(corrected->GetPixelAspectRatio(), mvxmediatypes::PixelAspectRatio(2, 1));
-        EXPECT_EQ(corrected->GetBounds(), QRT::ParamRect(0, 0, 8, 6));
-        EXPECT_TRUE(RowsFrom(corrected, MF::FrameTime(mT))) << "from width " << width;
-    }
-}
-
 TEST_F(ScalerTest, Reducing1080iTo576iKeepsEveryFieldsRowsFromTheSameFieldAndEvenHeights)
 {
     for (const Delivery delivery : {Delivery::kUpperFirst, Delivery::kLowerFirst})

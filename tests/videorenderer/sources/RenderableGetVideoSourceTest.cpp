@@ -192,30 +192,6 @@ TEST_F(RenderableGetVideoSourceTest, ConvertsTimeByFrameNumberOnlyBetweenVideoRa
     }
 }
 
-TEST_F(RenderableGetVideoSourceTest, DrawnAlphaIsMadeStraightOrOpaqueAndARealPatternDraws)
-{
-    BE::VideoSourceRef pattern;
-    ASSERT_TRUE(BE::OpenVideoSource("pattern:solid?size=8x4&color=336699", pattern).Succeeded());
-    const FrameRef drawn = Render(*Make(pattern, {}), MF::FrameTime(Ticks(kFrame25)), m4x2);
-    ASSERT_TRUE(drawn);
-    EXPECT_EQ(drawn->GetPixelFormat(), mvxmediatypes::kPixelFormat_BGRA_4444_8u);
-    EXPECT_TRUE(AllPixelsAre(drawn, Pixel{0x99, 0x66, 0x33, 255}));
-
-    // Red at alpha 128 premultiplied over blue.
-    const ScriptedSourceRef scripted = MakeScriptedSource();
-    scripted->mDrawPixel = Pixel{0x7F, 0, 0x80, 0x80};
-    Declaration declaration;
-    declaration.mAlphaKind = mvxmediatypes::kAlphaChannel_Premultiplied;
-    declaration.mMatte = QRT::ParamColor::FromRGBA(0, 0, 0xFF);
-    FrameRef frame = Render(*Make(scripted, declaration), MF::FrameTime(), m4x2);
-    EXPECT_TRUE(AllPixelsAre(frame, Pixel{0, 0, 255, 128}));
-    EXPECT_EQ(frame->GetAlphaChannel(), mvxmediatypes::kAlphaChannel_Straight);
-    // Ignore and invert together: opaque alpha, colour as drawn.
-    declaration.mIgnoreAlpha = declaration.mInvertAlpha = true;
-    frame = Render(*Make(scripted, declaration), MF::FrameTime(), m4x2);
-    EXPECT_TRUE(AllPixelsAre(frame, Pixel{0x7F, 0, 0x80, 255}));
-}
-
 TEST_F(RenderableGetVideoSourceTest, FailuresAreThrownWithTheirStatusAndNoPrefetchIsCollected)
 {
     const ScriptedSourceRef failing = MakeScriptedSource();

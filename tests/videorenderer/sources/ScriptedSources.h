@@ -439,10 +439,8 @@ public:
     FrameRef mFrame;
     bool mNewFrames = false;
     bool mHoldsReadFrames = true;
-    // DrawVideoFrame answers mDrawStatus; on success it fills a BGRA 8-bit
-    // destination with mDrawPixel.
+    // DrawVideoFrame answers mDrawStatus.
     QRT::Result mDrawStatus = QRT::kResult_Success;
-    Pixel mDrawPixel{0, 0, 0, 255};
     bool mPrefetchWanted = false;
     // Keys are mKeySalt with the time in Data1, or null keys.
     bool mNullKeys = false;
@@ -569,11 +567,7 @@ public:
             std::lock_guard lock(mMutex);
             mDrawCalls.push_back({inTime, ioDestination.Get(), arguments.str()});
         }
-        if (QRT::Failed(mDrawStatus))
-            return mDrawStatus;
-        if (ioDestination->GetPixelFormat() == mvxmediatypes::kPixelFormat_BGRA_4444_8u)
-            Paint(*ioDestination, [this](std::int32_t, std::int32_t) { return mDrawPixel; });
-        return QRT::kResult_Success;
+        return mDrawStatus;
     }
 
     bool IsPrefetchWanted(TickTime) const override { return mPrefetchWanted; }
