@@ -154,6 +154,9 @@ TEST_P(PulldownRemovalTest, FourTelecinedFilmFramesComeBackExactlyInEveryCadence
         }
         // One of every four film frames is split over two video frames.
         EXPECT_EQ(splits, 1u);
+        // Film rate over 29.97 material.
+        EXPECT_EQ(RateOf(*filter), mvxmediatypes::kFrameRate_Video2398);
+        EXPECT_EQ(FieldRateOf(*filter), mvxmediatypes::kFrameRate_Video2398);
     }
 }
 
@@ -177,15 +180,6 @@ TEST_P(PulldownRemovalTest, ASplitFilmFrameInAFieldByFieldFormatIsAssembledFromB
                                               fieldsFormat));
     EXPECT_TRUE(PixelsAre(Converted(frame), [&](std::int32_t inX, std::int32_t inY)
                           { return ReadPixel(*want, inX, inY); }));
-}
-
-TEST(PulldownRemovalRates, FilmRateOver2997MaterialIs23976)
-{
-    const SourceRef filter =
-        RemovePulldownFromSource(MakeTelecine(mvxmediatypes::kPulldownCadence_23_AA, 6),
-                                 mvxmediatypes::kPulldownCadence_23_AA);
-    EXPECT_EQ(RateOf(*filter), mvxmediatypes::kFrameRate_Video2398);
-    EXPECT_EQ(FieldRateOf(*filter), mvxmediatypes::kFrameRate_Video2398);
 }
 
 } // namespace

@@ -37,33 +37,15 @@ TEST_F(ScalerTest, AFrameAlreadyAtTheRequestedBoundsAndRatioPassesUnchanged)
 {
     const CutlistRenderParams params = MakeParams(8, 6);
     auto progressive = MakeMarkedSource(Delivery::kProgressive);
-    EXPECT_TRUE(progressive->IsLastFrame(
-        Render(*ScaleAndPARCorrectSource(progressive), MF::FrameTime(mT), params)));
+    EXPECT_TRUE(progressive->LastFrame() ==
+                Render(*ScaleAndPARCorrectSource(progressive), MF::FrameTime(mT), params));
     // Interlaced in the requested order passes too.
     auto upper = MakeMarkedSource(Delivery::kUpperFirst);
-    EXPECT_TRUE(upper->IsLastFrame(
-        Render(*ScaleAndPARCorrectSource(upper), MF::FrameTime(mT, mTField), params)));
+    EXPECT_TRUE(upper->LastFrame() ==
+                Render(*ScaleAndPARCorrectSource(upper), MF::FrameTime(mT, mTField), params));
 }
 
-TEST_F(ScalerTest, AnotherPixelAspectRatioIsCorrectedIntoANewFrameKeepingEveryRow)
-{
-    // 16 square columns become 8 of twice the width; rows stay as they were.
-    CutlistRenderParams wide = MakeParams(8, 6);
-    wide.mPixelAspectRatio = mvxmediatypes::PixelAspectRatio(2, 1);
-    for (const std::uint32_t width : {8u, 16u})
-    {
-        auto native = MakeMarkedSource(Delivery::kProgressive, width, 6);
-        const FrameRef corrected =
-            Render(*ScaleAndPARCorrectSource(native), MF::FrameTime(mT), wide);
-        ASSERT_TRUE(corrected);
-        EXPECT_FALSE(corrected == native->LastFrame());
-        EXPECT_EQ(corrected->GetPixelAspectRatio(), mvxmediatypes::PixelAspectRatio(2, 1));
-        EXPECT_EQ(corrected->GetBounds(), QRT::ParamRect(0, 0, 8, 6));
-        EXPECT_TRUE(RowsFrom(corrected, MF::FrameTime(mT))) << "from width " << width;
-    }
-}
-
-TEST_F(ScalerTest, Reducing1080iTo576iKeepsEveryFieldsRowsFromTheSameField)
+TEST_F(ScalerTest, Reducing1080iTo576iKeepsEveryFieldsRowsFromTheSameFieldAndEvenHeights)
 {
     for (const Delivery delivery : {Delivery::kUpperFirst, Delivery::kLowerFirst})
     {
@@ -77,20 +59,16 @@ TEST_F(ScalerTest, Reducing1080iTo576iKeepsEveryFieldsRowsFromTheSameField)
         EXPECT_EQ(frame->GetFieldType(), request.GetFieldOrder());
         EXPECT_TRUE(RowsFrom(frame, request));
     }
-}
-
-TEST_F(ScalerTest, AnInterlacedRequestForAnOddHeightIsRenderedOneRowTaller)
-{
+    // An interlaced request for an odd height is rendered one row taller; a
+    // progressive one keeps the odd height.
     const SourceRef scaler =
         ScaleAndPARCorrectSource(MakeMarkedSource(Delivery::kUpperFirst, 16, 1080));
-    EXPECT_EQ(Render(*scaler, MF::FrameTime(mT, mTField), Reducing(575))->GetBounds(),
-              QRT::ParamRect(0, 0, 16, 576));
-    // A progressive request keeps the odd height.
-    EXPECT_EQ(Render(*scaler, MF::FrameTime(mTField), Reducing(575))->GetBounds(),
-              QRT::ParamRect(0, 0, 16, 575));
+    EXPECT_EQ(Render(*scaler, MF::FrameTime(mT, mTField), Reducing(575))->GetBounds().Height(),
+              576);
+    EXPECT_EQ(Render(*scaler, MF::FrameTime(mTField), Reducing(575))->GetBounds().Height(), 575);
 }
 
-TEST_F(ScalerTest, AProgressiveRequestWhileReducingTakesTheNearestField)
+TEST_F(ScalerTest, WhileReducingAProgressiveRequestTakesTheNearestFieldAndOrderIsSwapped)
 {
     auto upper = MakeMarkedSource(Delivery::kUpperFirst, 16, 1080);
     const SourceRef upperScaler = ScaleAndPARCorrectSource(upper);
@@ -104,8 +82,16 @@ TEST_F(ScalerTest, AProgressiveRequestWhileReducingTakesTheNearestField)
     EXPECT_EQ(Conform(*upperScaler, halfway, params), MF::FrameTime(mT));
     const MF::FrameTime nearLater(mTField - Ticks(1));
     EXPECT_EQ(Conform(*upperScaler, nearLater, params), MF::FrameTime(mTField));
-    // Without a vertical reduction upstream's answer stands.
+    // Without a vertical reduction upstream's answer stands; with one the
+    // opposite field order is reported swapped.
     EXPECT_EQ(Conform(*upperScaler, nearLater, MakeParams(16, 1080)), MF::FrameTime(mT, mTField));
+    const MF::FrameTime lowerFirst(mTField, mT);
+    EXPECT_EQ(Conform(*upperScaler, lowerFirst, Reducing(576)), lowerFirst);
+    EXPECT_EQ(Conform(*upperScaler, lowerFirst, MakeParams(16, 1080)), MF::FrameTime(mT, mTField));
+    RenderableNodePrefetchList prefetches;
+    upperScaler->CollectPrefetches(lowerFirst, Reducing(576), prefetches);
+    EXPECT_EQ(upper->Prefetched().at(0), MF::FrameTime(mT, mTField));
+    EXPECT_EQ(FieldRateOf(*upperScaler), mvxmediatypes::kFrameRate_Video5994);
 
     // Every row comes from the field nearest the requested time.
     for (const auto& [scaler, slot] : {std::pair{upperScaler, 2}, std::pair{lowerScaler, 1}})
@@ -115,19 +101,6 @@ TEST_F(ScalerTest, AProgressiveRequestWhileReducingTakesTheNearestField)
         EXPECT_EQ(frame->GetBounds(), QRT::ParamRect(0, 0, 16, 540));
         EXPECT_TRUE(AllPixelsAre(frame, Marker(mTField, slot)));
     }
-}
-
-TEST_F(ScalerTest, OppositeFieldOrderIsReportedSwappedWhenReducing)
-{
-    auto upper = MakeMarkedSource(Delivery::kUpperFirst, 16, 1080);
-    const SourceRef scaler = ScaleAndPARCorrectSource(upper);
-    const MF::FrameTime lowerFirst(mTField, mT);
-    EXPECT_EQ(Conform(*scaler, lowerFirst, Reducing(576)), MF::FrameTime(mTField, mT));
-    EXPECT_EQ(Conform(*scaler, lowerFirst, MakeParams(16, 1080)), MF::FrameTime(mT, mTField));
-    RenderableNodePrefetchList prefetches;
-    scaler->CollectPrefetches(lowerFirst, Reducing(576), prefetches);
-    EXPECT_EQ(upper->Prefetched().at(0), MF::FrameTime(mT, mTField));
-    EXPECT_EQ(FieldRateOf(*scaler), mvxmediatypes::kFrameRate_Video5994);
 }
 
 // Below quality 3 a full-frame rendering delivered at exactly the requested

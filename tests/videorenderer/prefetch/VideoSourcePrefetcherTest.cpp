@@ -188,12 +188,9 @@ TEST_F(VideoSourcePrefetcherTest, EnqueueWithoutExecutorsViolatesItsInputContrac
 TEST_F(VideoSourcePrefetcherTest, ConcurrentEnqueueAndCancelEndEveryJobExactlyOnce)
 {
     const ExecutorRef video = UseTwoVideoThreads();
-    std::vector<ScriptedSourceRef> sources;
-    for (int i = 0; i < 3; ++i)
-    {
-        sources.push_back(MakeScriptedSource());
-        sources.back()->mNewFrames = true;
-    }
+    const std::vector<ScriptedSourceRef> sources{mSource, MakeScriptedSource(),
+                                                 MakeScriptedSource()};
+    sources[1]->mNewFrames = sources[2]->mNewFrames = true;
     constexpr int kThreads = 4;
     constexpr int kJobsPerThread = 200;
     std::atomic<int> completed{0}, cancelled{0}, other{0};

@@ -15,6 +15,7 @@ namespace
 {
 
 using mvxmediatypes::PixelAspectRatio;
+using Pair = std::pair<std::int64_t, std::int64_t>;
 
 class RenderableGetVideoSourceTest : public ::testing::Test
 {
@@ -22,31 +23,26 @@ protected:
     struct Declaration
     {
         TickTime mOrigin;
-        TickTime mSecondTime = Ticks(4242);
         QRT::ParamColor mMatte;
         mvxmediatypes::AlphaChannel mAlphaKind = mvxmediatypes::kAlphaChannel_Straight;
         bool mIgnoreAlpha = false;
         bool mInvertAlpha = false;
-        bool mThirdFlag = true;
-        double mValue = 0.625;
-        FrameRate mFrameRate = mvxmediatypes::kFrameRate_Video25;
+        FrameRate mFrameRate = k25;
     };
 
     SourceRef Make(const BE::VideoSourceRef& inSource, const Declaration& inDeclaration) const
     {
-        return CreateRenderableGetVideoSource(inSource, mBinaryData, inDeclaration.mOrigin,
-                                              inDeclaration.mSecondTime, inDeclaration.mMatte,
-                                              inDeclaration.mAlphaKind, inDeclaration.mIgnoreAlpha,
-                                              inDeclaration.mInvertAlpha, inDeclaration.mThirdFlag,
-                                              inDeclaration.mValue, inDeclaration.mFrameRate);
+        return CreateRenderableGetVideoSource(
+            inSource, mBinaryData, inDeclaration.mOrigin, Ticks(4242), inDeclaration.mMatte,
+            inDeclaration.mAlphaKind, inDeclaration.mIgnoreAlpha, inDeclaration.mInvertAlpha, true,
+            0.625, inDeclaration.mFrameRate);
     }
     SourceRef Make(const ScriptedSourceRef& inScripted, const Declaration& inDeclaration) const
     {
         return Make(BE::VideoSourceRef(inScripted), inDeclaration);
     }
     // The two field times of the conformed request, in ticks.
-    static std::pair<std::int64_t, std::int64_t> Conformed(const SourceRef& inSource,
-                                                           TickTime inFirst, TickTime inSecond)
+    static Pair Conformed(const SourceRef& inSource, TickTime inFirst, TickTime inSecond)
     {
         const MF::FrameTime conformed = Conform(*inSource, MF::FrameTime(inFirst, inSecond));
         return {conformed.GetFirstFieldTime().GetTicks(),
@@ -75,36 +71,29 @@ TEST_F(RenderableGetVideoSourceTest, RatesFollowKindStillAndSourceFieldType)
 {
     const ScriptedSourceRef scripted = MakeScriptedSource();
     const SourceRef source = Make(scripted, {});
+    const std::int32_t clip = BE::Deprecated::kMediaInfoKind_Clip;
     const struct
     {
         mvxmediatypes::FieldType mFieldType;
         bool mStill;
         std::int32_t mKind;
-        FrameRate mRate;
-        FrameRate mFieldRate;
+        FrameRate mRate, mFieldRate;
     } cases[] = {
-        {mvxmediatypes::kFieldType_Progressive, false, BE::Deprecated::kMediaInfoKind_Clip,
-         mvxmediatypes::kFrameRate_Video25, mvxmediatypes::kFrameRate_Video25},
-        {mvxmediatypes::kFieldType_UpperFirst, false, BE::Deprecated::kMediaInfoKind_Clip,
-         mvxmediatypes::kFrameRate_Video25, mvxmediatypes::kFrameRate_Video50},
-        {mvxmediatypes::kFieldType_LowerFirst, false, BE::Deprecated::kMediaInfoKind_Clip,
-         mvxmediatypes::kFrameRate_Video25, mvxmediatypes::kFrameRate_Video50},
-        {mvxmediatypes::kFieldType_AsSource, false, BE::Deprecated::kMediaInfoKind_Clip,
-         mvxmediatypes::kFrameRate_Video25, mvxmediatypes::kFrameRate_Video50},
-        {mvxmediatypes::kFieldType_Unknown, false, BE::Deprecated::kMediaInfoKind_Clip,
-         mvxmediatypes::kFrameRate_Video25, mvxmediatypes::kFrameRate_Video25},
-        {mvxmediatypes::kFieldType_UpperFirst, true, BE::Deprecated::kMediaInfoKind_Clip,
-         mvxmediatypes::kFrameRate_Video1000, mvxmediatypes::kFrameRate_Video1000},
-        {mvxmediatypes::kFieldType_UpperFirst, false, BE::Deprecated::kMediaInfoKind_TimeInvariant,
-         mvxmediatypes::kFrameRate_Zero, mvxmediatypes::kFrameRate_Zero},
+        {kProg, false, clip, k25, k25},
+        {kLower, false, clip, k25, k50},
+        {kAsSource, false, clip, k25, k50},
+        {mvxmediatypes::kFieldType_Unknown, false, clip, k25, k25},
+        {kUpper, true, clip, k1000, k1000},
+        {kUpper, false, BE::Deprecated::kMediaInfoKind_TimeInvariant, kNoRate, kNoRate},
     };
     for (const auto& c : cases)
     {
+        SCOPED_TRACE(testing::Message() << c.mFieldType << " still " << c.mStill);
         scripted->mFieldType = c.mFieldType;
         scripted->mStill = c.mStill;
         scripted->mKind = c.mKind;
-        EXPECT_EQ(RateOf(*source), c.mRate) << c.mFieldType << " still " << c.mStill;
-        EXPECT_EQ(FieldRateOf(*source), c.mFieldRate) << c.mFieldType << " still " << c.mStill;
+        EXPECT_EQ(RateOf(*source), c.mRate);
+        EXPECT_EQ(FieldRateOf(*source), c.mFieldRate);
     }
 }
 
@@ -121,22 +110,21 @@ TEST_F(RenderableGetVideoSourceTest, FrameGridIsAnchoredAtTheOriginAndKeepsTheRe
     EXPECT_EQ(progressive(999), 1000 - kFrame25);
 
     const ScriptedSourceRef scripted = MakeScriptedSource();
-    scripted->mFieldType = mvxmediatypes::kFieldType_UpperFirst;
+    scripted->mFieldType = kUpper;
     const SourceRef source = Make(scripted, {});
     const std::int64_t frame = kFrame25 * 6;
     const TickTime early = Ticks(frame + 77);
     const TickTime late = Ticks(frame + 77 + kField25);
-    using Pair = std::pair<std::int64_t, std::int64_t>;
     EXPECT_EQ(Conformed(source, early, late), Pair(frame, frame + kField25));
     EXPECT_EQ(Conformed(source, late, early), Pair(frame + kField25, frame));
     // A progressive request stays progressive, on the frame grid.
     EXPECT_EQ(Conformed(source, late, late), Pair(frame, frame));
     // Over a progressive source the second field lies a whole frame later.
-    scripted->mFieldType = mvxmediatypes::kFieldType_Progressive;
+    scripted->mFieldType = kProg;
     EXPECT_EQ(Conformed(source, early, late), Pair(frame, frame + kFrame25));
 
     // Stills are not aligned; time-invariant media and clips without a rate conform to 0.
-    scripted->mFieldType = mvxmediatypes::kFieldType_UpperFirst;
+    scripted->mFieldType = kUpper;
     scripted->mStill = true;
     EXPECT_EQ(Conformed(source, early, late), Pair(frame + 77, frame + 77));
     scripted->mStill = false;
@@ -144,7 +132,7 @@ TEST_F(RenderableGetVideoSourceTest, FrameGridIsAnchoredAtTheOriginAndKeepsTheRe
     EXPECT_EQ(Conformed(source, early, late), Pair(0, 0));
     scripted->mKind = BE::Deprecated::kMediaInfoKind_Clip;
     Declaration noRate;
-    noRate.mFrameRate = mvxmediatypes::kFrameRate_Zero;
+    noRate.mFrameRate = kNoRate;
     EXPECT_EQ(Conformed(Make(scripted, noRate), early, late), Pair(0, 0));
 }
 
@@ -164,32 +152,22 @@ TEST_F(RenderableGetVideoSourceTest, DrawsIntoNearestFormatWithTheClipsArguments
 
     const FrameRef frame = Render(*source, MF::FrameTime(late, early), params);
     ASSERT_TRUE(frame);
-    EXPECT_EQ(frame->GetFieldType(), mvxmediatypes::kFieldType_LowerFirst);
+    // The YUV model is nearer than depth: the 8-bit VUYA the source offers.
+    EXPECT_EQ(frame->GetPixelFormat(), mvxmediatypes::kPixelFormat_VUYA_4444_8u);
+    EXPECT_EQ(frame->GetBounds(), QRT::ParamRect(0, 0, 6, 4));
+    EXPECT_EQ(frame->GetPixelAspectRatio(), PixelAspectRatio(4, 3));
+    EXPECT_EQ(frame->GetFieldType(), kLower);
     const std::vector<DrawCall> calls = scripted->DrawCalls();
     ASSERT_EQ(calls.size(), 1u);
-    const DrawCall& call = calls[0];
-    // The YUV model is nearer than depth: the 8-bit VUYA the source offers.
-    EXPECT_EQ(call.mDestinationFormat, mvxmediatypes::kPixelFormat_VUYA_4444_8u);
-    EXPECT_EQ(call.mDestinationBounds, QRT::ParamRect(0, 0, 6, 4));
-    EXPECT_EQ(call.mDestinationRatio, PixelAspectRatio(4, 3));
-    EXPECT_EQ(call.mDestinationFieldType, mvxmediatypes::kFieldType_LowerFirst);
     // Its own frame is worked on in place (here: the inverted alpha).
-    EXPECT_EQ(call.mDestination, static_cast<const void*>(frame.Get()));
-    EXPECT_EQ(call.mTime, early);
-    EXPECT_EQ(call.mBinaryData, mBinaryData);
-    EXPECT_EQ(call.mFrameGridOrigin, Ticks(300));
-    EXPECT_EQ(call.mSecondTime, Ticks(4242));
-    EXPECT_EQ(call.mQuality, mvxmediatypes::kRenderQuality_Low);
-    EXPECT_EQ(call.mFieldType, mvxmediatypes::kFieldType_LowerFirst);
-    EXPECT_FALSE(call.mProgressive);
-    EXPECT_FALSE(call.mIgnoreAlpha);
-    EXPECT_TRUE(call.mInvertAlpha);
-    EXPECT_TRUE(call.mThirdFlag);
-    EXPECT_EQ(call.mValue, 0.625);
-
+    EXPECT_EQ(calls[0].mDestination, static_cast<const void*>(frame.Get()));
+    EXPECT_EQ(calls[0].mTime, early);
+    // Quality 2 of the params is kRenderQuality_Low; field type 2 is lower first.
+    EXPECT_EQ(calls[0].mArguments, "data 2 origin 300 second 4242 quality 2 field 2 progressive 0 "
+                                   "ignore 0 invert 1 third 1 value 0.625");
     Render(*source, MF::FrameTime(early), params);
-    EXPECT_TRUE(scripted->DrawCalls().at(1).mProgressive);
-    EXPECT_EQ(scripted->DrawCalls().at(1).mFieldType, mvxmediatypes::kFieldType_Progressive);
+    EXPECT_NE(scripted->DrawCalls().at(1).mArguments.find("field 0 progressive 1"),
+              std::string::npos);
 }
 
 TEST_F(RenderableGetVideoSourceTest, ConvertsTimeByFrameNumberOnlyBetweenVideoRates)
@@ -197,16 +175,15 @@ TEST_F(RenderableGetVideoSourceTest, ConvertsTimeByFrameNumberOnlyBetweenVideoRa
     const ScriptedSourceRef scripted = MakeScriptedSource();
     const MF::FrameTime time(Ticks(kFrame25 * 9 + 3));
     Declaration noRate;
-    noRate.mFrameRate = mvxmediatypes::kFrameRate_Zero;
+    noRate.mFrameRate = kNoRate;
     // Still rates are not numbered against video rates, nor is a clip without a rate.
     const struct
     {
         FrameRate mSourceRate;
         Declaration mDeclaration;
         std::int64_t mTicks;
-    } cases[] = {{mvxmediatypes::kFrameRate_Video50, {}, 9 * kField25},
-                 {mvxmediatypes::kFrameRate_Video1000, {}, kFrame25 * 9 + 3},
-                 {mvxmediatypes::kFrameRate_Video50, noRate, kFrame25 * 9 + 3}};
+    } cases[] = {
+        {k50, {}, 9 * kField25}, {k1000, {}, kFrame25 * 9 + 3}, {k50, noRate, kFrame25 * 9 + 3}};
     for (const auto& c : cases)
     {
         scripted->mFrameRate = c.mSourceRate;
@@ -215,41 +192,7 @@ TEST_F(RenderableGetVideoSourceTest, ConvertsTimeByFrameNumberOnlyBetweenVideoRa
     }
 }
 
-TEST_F(RenderableGetVideoSourceTest, DrawnAlphaIsMadeStraightOrOpaqueAndARealPatternDraws)
-{
-    BE::VideoSourceRef pattern;
-    ASSERT_TRUE(BE::OpenVideoSource("pattern:solid?size=8x4&color=336699", pattern).Succeeded());
-    const FrameRef drawn = Render(*Make(pattern, {}), MF::FrameTime(Ticks(kFrame25)), m4x2);
-    ASSERT_TRUE(drawn);
-    EXPECT_EQ(drawn->GetPixelFormat(), mvxmediatypes::kPixelFormat_BGRA_4444_8u);
-    EXPECT_TRUE(AllPixelsAre(drawn, Pixel{0x99, 0x66, 0x33, 255}));
-
-    // Red at alpha 128 premultiplied over blue.
-    const ScriptedSourceRef scripted = MakeScriptedSource();
-    scripted->mDrawPixel = Pixel{0x7F, 0, 0x80, 0x80};
-    Declaration declaration;
-    declaration.mAlphaKind = mvxmediatypes::kAlphaChannel_Premultiplied;
-    declaration.mMatte = QRT::ParamColor::FromRGBA(0, 0, 0xFF);
-    FrameRef frame = Render(*Make(scripted, declaration), MF::FrameTime(), m4x2);
-    EXPECT_TRUE(AllPixelsAre(frame, Pixel{0, 0, 255, 128}));
-    EXPECT_EQ(frame->GetAlphaChannel(), mvxmediatypes::kAlphaChannel_Straight);
-    // Ignore and invert together: opaque alpha, colour as drawn.
-    declaration.mIgnoreAlpha = declaration.mInvertAlpha = true;
-    frame = Render(*Make(scripted, declaration), MF::FrameTime(), m4x2);
-    EXPECT_TRUE(AllPixelsAre(frame, Pixel{0x7F, 0, 0x80, 255}));
-}
-
-TEST_F(RenderableGetVideoSourceTest, CollectsNoPrefetches)
-{
-    const ScriptedSourceRef scripted = MakeScriptedSource();
-    scripted->mPrefetchWanted = true;
-    RenderableNodePrefetchList prefetches;
-    Make(scripted, {})->CollectPrefetches(MF::FrameTime(), m4x2, prefetches);
-    EXPECT_TRUE(prefetches.empty());
-    EXPECT_TRUE(scripted->PrefetchCalls().empty());
-}
-
-TEST_F(RenderableGetVideoSourceTest, DrawAndFrameCreationFailuresAreThrownWithTheirStatus)
+TEST_F(RenderableGetVideoSourceTest, FailuresAreThrownWithTheirStatusAndNoPrefetchIsCollected)
 {
     const ScriptedSourceRef failing = MakeScriptedSource();
     failing->mDrawStatus = BE::kResult_MediaMalformed;
@@ -269,14 +212,16 @@ TEST_F(RenderableGetVideoSourceTest, DrawAndFrameCreationFailuresAreThrownWithTh
     EXPECT_EQ(RenderStatus(Make(formatless, {}), frame), expected);
     EXPECT_FALSE(frame);
     EXPECT_TRUE(formatless->DrawCalls().empty());
-}
 
-TEST_F(RenderableGetVideoSourceTest, EmptySourceThrowsNullInterface)
-{
-    const SourceRef source = Make(BE::VideoSourceRef(), {});
-    ASSERT_TRUE(source);
-    EXPECT_THROW(Render(*source, MF::FrameTime(), m4x2), QRT::NullInterfaceException);
-    EXPECT_THROW(RateOf(*source), QRT::NullInterfaceException);
+    const SourceRef empty = Make(BE::VideoSourceRef(), {});
+    EXPECT_THROW(Render(*empty, MF::FrameTime(), m4x2), QRT::NullInterfaceException);
+    EXPECT_THROW(RateOf(*empty), QRT::NullInterfaceException);
+
+    formatless->mPrefetchWanted = true;
+    RenderableNodePrefetchList prefetches;
+    Make(formatless, {})->CollectPrefetches(MF::FrameTime(), m4x2, prefetches);
+    EXPECT_TRUE(prefetches.empty());
+    EXPECT_TRUE(formatless->PrefetchCalls().empty());
 }
 
 } // namespace

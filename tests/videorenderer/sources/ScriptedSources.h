@@ -27,14 +27,17 @@
 #include "VF/VideoFrameManipulators.h"
 
 #include <atomic>
-#include <condition_variable>
+#include <cstdlib>
 #include <cstring>
 #include <functional>
+#include <future>
 #include <map>
 #include <memory>
 #include <mutex>
 #include <ostream>
+#include <sstream>
 #include <stdexcept>
+#include <string>
 #include <thread>
 #include <vector>
 
@@ -59,6 +62,16 @@ inline constexpr std::int64_t kFrame = 23'543'520;
 inline constexpr std::int64_t kField = kFrame / 2;
 inline constexpr std::int64_t kFrame25 = 28'224'000;
 inline constexpr std::int64_t kField25 = kFrame25 / 2;
+
+// Short names for the tables of the source tests.
+inline constexpr mvxmediatypes::FieldType kProg = mvxmediatypes::kFieldType_Progressive;
+inline constexpr mvxmediatypes::FieldType kUpper = mvxmediatypes::kFieldType_UpperFirst;
+inline constexpr mvxmediatypes::FieldType kLower = mvxmediatypes::kFieldType_LowerFirst;
+inline constexpr mvxmediatypes::FieldType kAsSource = mvxmediatypes::kFieldType_AsSource;
+inline const FrameRate k25 = mvxmediatypes::kFrameRate_Video25;
+inline const FrameRate k50 = mvxmediatypes::kFrameRate_Video50;
+inline const FrameRate k1000 = mvxmediatypes::kFrameRate_Video1000;
+inline const FrameRate kNoRate = mvxmediatypes::kFrameRate_Zero;
 
 // A BGRA 8-bit pixel as stored in memory.
 struct Pixel
@@ -113,20 +126,27 @@ inline FrameRef MakeFilledFrame(std::uint32_t inWidth, std::uint32_t inHeight, P
     return MakeFrame(inWidth, inHeight, [inPixel](std::int32_t, std::int32_t) { return inPixel; });
 }
 
-// Checks every pixel of inFrame (rows and columns of its bounds) against inExpected(x, y).
+// Checks every pixel of inFrame (rows and columns of its bounds) against
+// inExpected(x, y), each channel within inTolerance.
 inline ::testing::AssertionResult
 PixelsAre(const FrameRef& inFrame,
-          const std::function<Pixel(std::int32_t, std::int32_t)>& inExpected)
+          const std::function<Pixel(std::int32_t, std::int32_t)>& inExpected, int inTolerance = 0)
 {
     if (!inFrame)
         return ::testing::AssertionFailure() << "no frame";
     const QRT::ParamRect bounds = inFrame->GetBounds();
     for (std::int32_t y = 0; y < bounds.Height(); ++y)
         for (std::int32_t x = 0; x < bounds.Width(); ++x)
-            if (ReadPixel(*inFrame, x, y) != inExpected(x, y))
+        {
+            const Pixel got = ReadPixel(*inFrame, x, y);
+            const Pixel want = inExpected(x, y);
+            if (std::abs(got.mB - want.mB) > inTolerance ||
+                std::abs(got.mG - want.mG) > inTolerance ||
+                std::abs(got.mR - want.mR) > inTolerance ||
+                std::abs(got.mA - want.mA) > inTolerance)
                 return ::testing::AssertionFailure()
-                       << "pixel (" << x << ", " << y << ") is " << ReadPixel(*inFrame, x, y)
-                       << ", expected " << inExpected(x, y);
+                       << "pixel (" << x << ", " << y << ") is " << got << ", expected " << want;
+        }
     return ::testing::AssertionSuccess();
 }
 
@@ -136,10 +156,12 @@ inline ::testing::AssertionResult AllPixelsAre(const FrameRef& inFrame, Pixel in
 }
 
 // Rows alternate between the two slots' pixels (slot 1 on even rows).
-inline ::testing::AssertionResult RowsAre(const FrameRef& inFrame, Pixel inFirst, Pixel inSecond)
+inline ::testing::AssertionResult RowsAre(const FrameRef& inFrame, Pixel inFirst, Pixel inSecond,
+                                          int inTolerance = 0)
 {
-    return PixelsAre(inFrame, [&](std::int32_t, std::int32_t inY)
-                     { return inY % 2 == 0 ? inFirst : inSecond; });
+    return PixelsAre(
+        inFrame, [&](std::int32_t, std::int32_t inY) { return inY % 2 == 0 ? inFirst : inSecond; },
+        inTolerance);
 }
 
 // A copy of inFrame in inFormat (BGRA 8-bit unless told), converted at high quality.
@@ -248,8 +270,6 @@ public:
         std::lock_guard lock(mLogLock);
         return mLastFrame;
     }
-    // True when inFrame is the frame this source rendered last (the same object).
-    bool IsLastFrame(const FrameRef& inFrame) const { return inFrame == LastFrame(); }
 
 protected:
     // Marks inFrame shared, logs it and hands it out.
@@ -295,26 +315,13 @@ public:
                           MF::FrameTime& outConformed) override
     {
         const TickTime frame = inRequested.GetTime().AlignToFrame(mRate);
-        const TickTime half = (mRate * 2).GetFrameDuration();
-        switch (mDelivery)
-        {
-        case Delivery::kProgressive:
+        if (mDelivery == Delivery::kProgressive)
             outConformed = MF::FrameTime(frame);
-            return;
-        case Delivery::kUpperFirst:
-        case Delivery::kLowerFirst:
-            outConformed = MF::FrameTime::Make(frame,
-                                               mDelivery == Delivery::kUpperFirst
-                                                   ? mvxmediatypes::kFieldType_UpperFirst
-                                                   : mvxmediatypes::kFieldType_LowerFirst,
-                                               half);
-            return;
-        case Delivery::kFollowRequest:
-            outConformed = inRequested.IsProgressive()
-                               ? MF::FrameTime(inRequested.GetTime().AlignToFrame(mRate * 2))
-                               : MF::FrameTime::Make(frame, inRequested.GetFieldOrder(), half);
-            return;
-        }
+        else if (mDelivery == Delivery::kFollowRequest && inRequested.IsProgressive())
+            outConformed = MF::FrameTime(inRequested.GetTime().AlignToFrame(mRate * 2));
+        else
+            outConformed =
+                MF::FrameTime::Make(frame, OrderOf(inRequested), (mRate * 2).GetFrameDuration());
     }
 
     void RenderFrame(const MF::FrameTime& inTime, const CutlistRenderParams& inParams,
@@ -340,6 +347,14 @@ public:
     }
 
 private:
+    mvxmediatypes::FieldType OrderOf(const MF::FrameTime& inRequested) const
+    {
+        if (mDelivery == Delivery::kFollowRequest)
+            return inRequested.GetFieldOrder();
+        return mDelivery == Delivery::kUpperFirst ? mvxmediatypes::kFieldType_UpperFirst
+                                                  : mvxmediatypes::kFieldType_LowerFirst;
+    }
+
     const Delivery mDelivery;
     const FrameRate mRate;
     const std::uint32_t mWidth;
@@ -356,28 +371,13 @@ inline QRT::InterfaceRef<MarkedSource> MakeMarkedSource(Delivery inDelivery,
         inDelivery, mvxmediatypes::kFrameRate_Video2997, inWidth, inHeight, inGradient);
 }
 
-// A one-shot latch: Wait blocks until Open.
-class Gate
+// A one-shot latch: Wait blocks until Open (called once).
+struct Gate
 {
-public:
-    void Open()
-    {
-        {
-            std::lock_guard lock(mMutex);
-            mOpen = true;
-        }
-        mChanged.notify_all();
-    }
-    void Wait()
-    {
-        std::unique_lock lock(mMutex);
-        mChanged.wait(lock, [this] { return mOpen; });
-    }
-
-private:
-    std::mutex mMutex; // guards mOpen
-    std::condition_variable mChanged;
-    bool mOpen = false;
+    std::promise<void> mOpened;
+    std::shared_future<void> mFuture = mOpened.get_future().share();
+    void Open() { mOpened.set_value(); }
+    void Wait() const { mFuture.wait(); }
 };
 
 // A frame key unique to this process run, so that tests never meet each
@@ -410,26 +410,14 @@ struct PrefetchCall
     MF::BinaryData mBinaryData;
 };
 
+// A draw request: its time, destination (the address only: holding a
+// reference would make the adaptor copy the frame before it writes) and the
+// other arguments as one text.
 struct DrawCall
 {
     TickTime mTime;
-    MF::BinaryData mBinaryData;
-    TickTime mFrameGridOrigin;
-    TickTime mSecondTime;
-    // The destination's address only: holding a reference would make the
-    // adaptor copy the frame before it writes.
     const void* mDestination = nullptr;
-    mvxmediatypes::PixelFormat mDestinationFormat;
-    QRT::ParamRect mDestinationBounds;
-    mvxmediatypes::PixelAspectRatio mDestinationRatio;
-    mvxmediatypes::FieldType mDestinationFieldType = mvxmediatypes::kFieldType_Invalid;
-    mvxmediatypes::RenderQuality mQuality = mvxmediatypes::kRenderQuality_Draft;
-    mvxmediatypes::FieldType mFieldType = mvxmediatypes::kFieldType_Invalid;
-    bool mProgressive = false;
-    bool mIgnoreAlpha = false;
-    bool mInvertAlpha = false;
-    bool mThirdFlag = false;
-    double mValue = 0.0;
+    std::string mArguments;
 };
 
 class ScriptedVideoSource
@@ -445,18 +433,14 @@ public:
     std::int32_t mKind = BE::Deprecated::kMediaInfoKind_Clip;
     std::vector<mvxmediatypes::PixelFormat> mPixelFormats = {
         mvxmediatypes::kPixelFormat_BGRA_4444_8u};
-    // A read waits for mReadGate (when set), then answers mFrameStatus and on
-    // success mFrame, or with mNewFrames a new 4x2 frame per read. Frames read
-    // are held (when mHoldsReadFrames) and answer kFrameRequestFlag_NoBlock.
+    // A read answers mFrameStatus and on success mFrame, or with mNewFrames a new 4x2 frame per
+    // read. Frames read are held (when mHoldsReadFrames) and answer kFrameRequestFlag_NoBlock.
     QRT::Result mFrameStatus = QRT::kResult_Success;
     FrameRef mFrame;
     bool mNewFrames = false;
     bool mHoldsReadFrames = true;
-    std::shared_ptr<Gate> mReadGate;
-    // DrawVideoFrame answers mDrawStatus; on success it fills a BGRA 8-bit
-    // destination with mDrawPixel.
+    // DrawVideoFrame answers mDrawStatus.
     QRT::Result mDrawStatus = QRT::kResult_Success;
-    Pixel mDrawPixel{0, 0, 0, 255};
     bool mPrefetchWanted = false;
     // Keys are mKeySalt with the time in Data1, or null keys.
     bool mNullKeys = false;
@@ -539,8 +523,6 @@ public:
                               FrameRef& outFrame) override
     {
         outFrame = nullptr;
-        if (inFlags == BE::Deprecated::kFrameRequestFlag_Read && mReadGate)
-            mReadGate->Wait();
         std::lock_guard lock(mMutex);
         mFrameCalls.push_back(
             {inTime, inRequest, inBinaryData, inColorProfile, inFlags, std::this_thread::get_id()});
@@ -575,19 +557,17 @@ public:
                                bool inIgnoreAlpha, bool inInvertAlpha, bool inThirdFlag,
                                double inValue) override
     {
+        std::ostringstream arguments;
+        arguments << "data " << inBinaryData.GetSize() << " origin " << inFrameGridOrigin.GetTicks()
+                  << " second " << inSecondTime.GetTicks() << " quality " << inQuality << " field "
+                  << inFieldType << " progressive " << inProgressive << " ignore " << inIgnoreAlpha
+                  << " invert " << inInvertAlpha << " third " << inThirdFlag << " value "
+                  << inValue;
         {
             std::lock_guard lock(mMutex);
-            mDrawCalls.push_back(
-                {inTime, inBinaryData, inFrameGridOrigin, inSecondTime, ioDestination.Get(),
-                 ioDestination->GetPixelFormat(), ioDestination->GetBounds(),
-                 ioDestination->GetPixelAspectRatio(), ioDestination->GetFieldType(), inQuality,
-                 inFieldType, inProgressive, inIgnoreAlpha, inInvertAlpha, inThirdFlag, inValue});
+            mDrawCalls.push_back({inTime, ioDestination.Get(), arguments.str()});
         }
-        if (QRT::Failed(mDrawStatus))
-            return mDrawStatus;
-        if (ioDestination->GetPixelFormat() == mvxmediatypes::kPixelFormat_BGRA_4444_8u)
-            Paint(*ioDestination, [this](std::int32_t, std::int32_t) { return mDrawPixel; });
-        return QRT::kResult_Success;
+        return mDrawStatus;
     }
 
     bool IsPrefetchWanted(TickTime) const override { return mPrefetchWanted; }
