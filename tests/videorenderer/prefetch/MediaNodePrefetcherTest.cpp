@@ -168,6 +168,28 @@ TEST_F(MediaNodePrefetcherTest, CachedFrameIsTakenAtOnce)
     EXPECT_TRUE(mSource->ReadTicks().empty());
 }
 
+// A frame that reaches the cache by another road while the key's read is still
+// queued: the last handle, taking it, withdraws the read instead of leaving it
+// counted and running for nobody.
+TEST_F(MediaNodePrefetcherTest, FrameCachedWhileTheReadIsQueuedWithdrawsTheRead)
+{
+    const Guid key = mSource->KeyFor(At(5));
+    {
+        const auto gate = BlockVideoExecutor();
+        const PrefetchRef handle = Make(5);
+        EXPECT_EQ(handle->InitiatePrefetch(), QRT::kResult_Success);
+        EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 1u);
+        const FrameRef cached = MakeFilledFrame(6, 2, Pixel{});
+        VF::SharedVideoFrameCache::InsertIntoCache(cached, key, VF::kCachePriority_High);
+        EXPECT_EQ(Taken(handle).Get(), cached.Get());
+        EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 0u);
+        EXPECT_EQ(GetMediaNodePrefetchReferenceCount(key), 0u);
+        gate->Open();
+    }
+    Drain(mVideo);
+    EXPECT_TRUE(mSource->ReadTicks().empty());
+}
+
 TEST_F(MediaNodePrefetcherTest, FailedReadEndsEveryWaitWithoutAFrame)
 {
     mSource->mFrameStatus = static_cast<QRT::Result>(0xA0100003u);

@@ -391,15 +391,19 @@ private:
     }
 
     // Gives up the key reference once the frame is there or the read is over.
-    // Requires mMutex.
+    // When the frame came by another road (the cache, or frames the source
+    // holds) while the key's read still waits on the video source prefetcher,
+    // the last handle takes that read back, so that it neither runs for nobody
+    // nor stays counted. Requires mMutex.
     void ReleaseRegistration()
     {
         if (mRegistered)
         {
             PrefetchRegistry& registry = GetRegistry();
             QRT::CriticalSectionLock lock(registry.mLock, "UnregisterPrefetch");
-            if (!mKey.IsNil())
-                ReleaseKeyLocked(registry.mKeys, mKey);
+            if (!mKey.IsNil() && ReleaseKeyLocked(registry.mKeys, mKey) && mRead &&
+                !mRead->mAsync && !mRead->mFinished.load(std::memory_order_acquire))
+                CancelVideoSourcePrefetch(mRead->mSource, mKey);
             mRegistered = false;
         }
         mRead.reset();
