@@ -9,11 +9,11 @@
 
 #include <array>
 #include <cstdint>
-#include <cstdio>
+#include <cstdlib>
+#include <filesystem>
 #include <fstream>
 #include <string>
 #include <unistd.h>
-#include <vector>
 
 #include <gtest/gtest.h>
 
@@ -52,7 +52,6 @@ inline FrameRef ReadFrameOrFail(const BE::VideoSourceRef& inSource, TickTime inT
     FrameRef frame;
     EXPECT_EQ(ReadFrame(inSource, inTime, frame, BE::Deprecated::kFrameRequestFlag_Read, inRequest),
               QRT::kResult_Success);
-    EXPECT_TRUE(frame);
     return frame;
 }
 
@@ -69,30 +68,16 @@ inline BE::VideoSourceRef OpenOrFail(const std::string& inMedia)
 class TempDirectory
 {
 public:
-    TempDirectory()
-    {
-        std::string pattern = ::testing::TempDir() + "be_test_XXXXXX";
-        std::vector<char> buffer(pattern.begin(), pattern.end());
-        buffer.push_back('\0');
-        const char* made = mkdtemp(buffer.data());
-        EXPECT_NE(made, nullptr);
-        mPath = made ? made : ::testing::TempDir();
-    }
-    ~TempDirectory()
-    {
-        for (const std::string& file : mFiles)
-            std::remove(file.c_str());
-        rmdir(mPath.c_str());
-    }
-    std::string File(const std::string& inName)
-    {
-        mFiles.push_back(mPath + "/" + inName);
-        return mFiles.back();
-    }
+    std::string File(const std::string& inName) { return (mPath / inName).string(); }
+    ~TempDirectory() { std::filesystem::remove_all(mPath); }
 
 private:
-    std::string mPath;
-    std::vector<std::string> mFiles;
+    std::filesystem::path mPath = []
+    {
+        std::string pattern = ::testing::TempDir() + "be_test_XXXXXX";
+        EXPECT_NE(mkdtemp(pattern.data()), nullptr);
+        return std::filesystem::path(pattern);
+    }();
 };
 
 inline void WriteBytes(const std::string& inPath, const std::string& inBytes)

@@ -37,50 +37,22 @@ int BoxLeft(const FrameRef& inFrame, int inRow)
     return -1;
 }
 
-struct PixelCase
-{
-    const char* media;
-    int x, y;
-    std::array<int, 4> bgra;
-    int requestWidth = 0, requestHeight = 0; // 0: the pattern's own size
-};
-
-class PatternPixelTest : public ::testing::TestWithParam<PixelCase>
-{
-};
-
-TEST_P(PatternPixelTest, PixelHasItsExactValue)
-{
-    const PixelCase& c = GetParam();
-    const BE::VideoFrameRequest request =
-        c.requestWidth ? Sized(c.requestWidth, c.requestHeight) : BE::VideoFrameRequest();
-    const FrameRef frame = ReadFrameOrFail(OpenOrFail(c.media), TickTime(), request);
-    ASSERT_TRUE(frame);
-    EXPECT_EQ(Pixel(frame, c.x, c.y), c.bgra);
-}
-
-INSTANTIATE_TEST_SUITE_P(
-    Patterns, PatternPixelTest,
-    ::testing::Values(
-        PixelCase{"pattern:gradient?size=5x1&from=000000&to=FF0040", 0, 0, Bgra(0, 0, 0)},
-        PixelCase{"pattern:gradient?size=5x1&from=000000&to=FF0040", 1, 0, Bgra(16, 0, 64)},
-        PixelCase{"pattern:gradient?size=5x1&from=000000&to=FF0040", 2, 0, Bgra(32, 0, 128)},
-        PixelCase{"pattern:gradient?size=5x1&from=000000&to=FF0040", 3, 0, Bgra(48, 0, 191)},
-        PixelCase{"pattern:gradient?size=5x1&from=000000&to=FF0040", 4, 0, Bgra(64, 0, 255)},
-        PixelCase{"pattern:solid?size=4x4&color=204060&alpha=straight&opacity=100", 3, 3,
-                  Bgra(0x60, 0x40, 0x20, 100)},
-        // Premultiplied over the matte: round((100 * c + 155 * m) / 255).
-        PixelCase{"pattern:solid?size=4x4&color=204060&alpha=premultiplied&opacity=100&"
-                  "matte=FFFFFF",
-                  0, 0, Bgra(193, 180, 168, 100)},
-        PixelCase{"pattern:solid?size=4x4&color=204060&alpha=premultiplied&opacity=100", 0, 0,
-                  Bgra(38, 25, 13, 100)},
-        PixelCase{"pattern:solid?size=64x32&color=336699", 15, 7, Bgra(0x99, 0x66, 0x33), 16, 8}));
-
 using PatternSourceTest = ::testing::Test;
 
-TEST_F(PatternSourceTest, BarsAndSolidColourAreExactEverywhere)
+TEST_F(PatternSourceTest, PixelsHaveTheirExactValues)
 {
+    // Premultiplied over the matte: round((100 * c + 155 * m) / 255).
+    const std::tuple<const char*, int, std::array<int, 4>> cases[] = {
+        {"gradient?size=5x1&from=000000&to=FF0040", 1, Bgra(16, 0, 64)},
+        {"gradient?size=5x1&from=000000&to=FF0040", 3, Bgra(48, 0, 191)},
+        {"solid?size=4x1&color=204060&alpha=straight&opacity=100", 3, Bgra(0x60, 0x40, 0x20, 100)},
+        {"solid?size=4x1&color=204060&alpha=premultiplied&opacity=100&matte=FFFFFF", 0,
+         Bgra(193, 180, 168, 100)}};
+    for (const auto& [media, x, bgra] : cases)
+        EXPECT_EQ(
+            Pixel(ReadFrameOrFail(OpenOrFail(std::string("pattern:") + media), TickTime()), x, 0),
+            bgra)
+            << media;
     const FrameRef bars = ReadFrameOrFail(OpenOrFail("pattern:bars?size=70x4"), TickTime());
     const std::array<std::array<int, 4>, 7> colours = {
         Bgra(191, 191, 191), Bgra(0, 191, 191), Bgra(191, 191, 0), Bgra(0, 191, 0),
@@ -88,39 +60,35 @@ TEST_F(PatternSourceTest, BarsAndSolidColourAreExactEverywhere)
     for (int y = 0; y < 4; ++y)
         for (int x = 0; x < 70; ++x)
             ASSERT_EQ(Pixel(bars, x, y), colours[x / 10]) << x << "," << y;
-    EXPECT_EQ(bars->GetPixelFormat(), kPixelFormat_BGRA_4444_8u);
-    EXPECT_EQ(bars->GetAlphaChannel(), kAlphaChannel_None);
     EXPECT_TRUE(bars->IsShared());
-    const FrameRef solid =
-        ReadFrameOrFail(OpenOrFail("pattern:solid?size=9x5&color=12ab7F"), TickTime());
-    for (int y = 0; y < 5; ++y)
-        for (int x = 0; x < 9; ++x)
-            ASSERT_EQ(Pixel(solid, x, y), Bgra(0x7F, 0xAB, 0x12)) << x << "," << y;
+    // A smaller request is scaled down.
+    const FrameRef small = ReadFrameOrFail(OpenOrFail("pattern:solid?size=64x32&color=336699"),
+                                           TickTime(), Sized(16, 8));
+    EXPECT_EQ(small->GetBounds(), QRT::ParamRect(0, 0, 16, 8));
+    EXPECT_EQ(Pixel(small, 15, 7), Bgra(0x99, 0x66, 0x33));
 }
 
 TEST_F(PatternSourceTest, MovingBoxAdvancesEveryFrameAndTheFrameNumberIsDrawn)
 {
     // 64 x 32: an 8-pixel box on the bottom row, 2 pixels per field period,
     // wrapping over 57 positions.
-    const BE::VideoSourceRef source = OpenOrFail("pattern:moving?size=64x32&rate=25");
-    for (const auto& [frameIndex, left] : {std::pair{0, 0}, {1, 4}, {3, 12}, {15, 3}, {-1, 53}})
+    const BE::VideoSourceRef source =
+        OpenOrFail("pattern:moving?size=64x32&rate=25&field=progressive&alpha=none");
+    for (const auto& [frameIndex, left] : {std::pair{1, 4}, {15, 3}, {-1, 53}})
     {
         const FrameRef frame = ReadFrameOrFail(source, FrameTime(frameIndex));
         SCOPED_TRACE(::testing::Message() << "frame " << frameIndex);
         EXPECT_EQ(std::tuple(BoxLeft(frame, 31), BoxLeft(frame, 24)), std::tuple(left, left));
-        EXPECT_EQ(Pixel(frame, left + 7, 31), Bgra(224, 224, 224));
-        EXPECT_TRUE(left + 8 >= 64 || Pixel(frame, left + 8, 31) == Bgra(48, 48, 48));
+        EXPECT_EQ(Pixel(frame, left + 8, 31), Bgra(48, 48, 48));
         EXPECT_EQ(BoxLeft(frame, 23), -1) << "the box is 8 rows high";
     }
-    // Digit cells of 2 pixels from (2, 2): the top row of '0' is lit across,
-    // that of '1' only in the middle column. In "12" the second glyph starts at
-    // x = 10; the middle row of '2' (y = 6) is lit across, its fourth row (y = 8)
-    // only on the left.
+    // Digit cells of 2 pixels from (2, 2): the top row of '1' is lit only in the
+    // middle column. In "12" the second glyph starts at x = 10; the middle row of
+    // '2' (y = 6) is lit across, its fourth row (y = 8) only on the left.
     const auto yellow = Bgra(0, 255, 255);
     const auto grey = Bgra(48, 48, 48);
     const std::tuple<int, int, int, std::array<int, 4>> digits[] = {
-        {0, 2, 2, yellow},   {0, 6, 3, yellow}, {1, 2, 2, grey},     {1, 4, 2, yellow},
-        {12, 10, 8, yellow}, {12, 14, 8, grey}, {12, 14, 6, yellow}, {0, 10, 6, grey}};
+        {1, 2, 2, grey}, {1, 4, 2, yellow}, {12, 10, 8, yellow}, {12, 14, 8, grey}};
     for (const auto& [frame, x, y, colour] : digits)
         EXPECT_EQ(Pixel(ReadFrameOrFail(source, FrameTime(frame)), x, y), colour)
             << "frame " << frame << " at " << x << "," << y;
@@ -129,53 +97,44 @@ TEST_F(PatternSourceTest, MovingBoxAdvancesEveryFrameAndTheFrameNumberIsDrawn)
 TEST_F(PatternSourceTest, InterlacedPatternDrawsEachFieldAtItsOwnTime)
 {
     // Frame 2: the earlier field at phase 4 (box at 8), the later at phase 5 (box at 10).
-    const FrameRef upper =
-        ReadFrameOrFail(OpenOrFail("pattern:moving?size=64x32&field=upper"), FrameTime(2));
-    EXPECT_EQ(upper->GetFieldType(), kFieldType_UpperFirst);
-    EXPECT_EQ(
-        std::tuple(BoxLeft(upper, 28), BoxLeft(upper, 30), BoxLeft(upper, 29), BoxLeft(upper, 31)),
-        std::tuple(8, 8, 10, 10));
+    const BE::VideoSourceRef upper = OpenOrFail("pattern:moving?size=64x32&field=upper");
+    const FrameRef frame = ReadFrameOrFail(upper, FrameTime(2));
+    EXPECT_EQ(frame->GetFieldType(), kFieldType_UpperFirst);
+    EXPECT_EQ(std::tuple(BoxLeft(frame, 30), BoxLeft(frame, 31)), std::tuple(8, 10));
     const FrameRef lower =
         ReadFrameOrFail(OpenOrFail("pattern:moving?size=64x32&field=lower"), FrameTime(2));
-    EXPECT_EQ(lower->GetFieldType(), kFieldType_LowerFirst);
     EXPECT_EQ(std::tuple(BoxLeft(lower, 31), BoxLeft(lower, 30)), std::tuple(8, 10));
-    const FrameRef progressive =
-        ReadFrameOrFail(OpenOrFail("pattern:moving?size=64x32"), FrameTime(2));
-    EXPECT_EQ(std::tuple(BoxLeft(progressive, 31), BoxLeft(progressive, 30)), std::tuple(8, 8));
     // Scaled to half height, the fields stay apart.
-    const FrameRef scaled = ReadFrameOrFail(OpenOrFail("pattern:moving?size=64x32&field=upper"),
-                                            FrameTime(2), Sized(64, 16));
+    const FrameRef scaled = ReadFrameOrFail(upper, FrameTime(2), Sized(64, 16));
     ASSERT_EQ(scaled->GetBounds().Height(), 16);
     EXPECT_EQ(std::tuple(BoxLeft(scaled, 14), BoxLeft(scaled, 15)), std::tuple(8, 10));
 }
 
-TEST_F(PatternSourceTest, DescriptionFollowsThePattern)
+TEST_F(PatternSourceTest, DescriptionAndMediaInterfacesFollowThePattern)
 {
-    const BE::VideoSourceRef moving =
-        OpenOrFail("pattern:moving?size=720x486&rate=29.97&field=lower&par=10:11");
+    const std::string text = "pattern:moving?size=720x486&rate=29.97&field=lower&par=10:11";
+    const BE::VideoSourceRef moving = OpenOrFail(text);
     EXPECT_EQ(moving->GetFrameRate(), kFrameRate_Video2997);
-    EXPECT_EQ(moving->GetFieldType(), kFieldType_LowerFirst);
-    EXPECT_EQ(moving->GetBounds(), QRT::ParamRect(0, 0, 720, 486));
-    EXPECT_EQ(moving->GetPixelAspectRatio(), PixelAspectRatio(10, 11));
     EXPECT_FALSE(moving->IsStill() || moving->IsImage());
-    const auto movingInfo = QRT::QueryRef<BE::Deprecated::IMediaInfo>(moving);
-    ASSERT_TRUE(movingInfo);
-    EXPECT_EQ(movingInfo->GetKind(), BE::Deprecated::kMediaInfoKind_Clip);
-    EXPECT_EQ(movingInfo->GetDuration(), kTime_Max);
-    const BE::VideoSourceRef bars = OpenOrFail("pattern:bars");
-    EXPECT_TRUE(bars->IsStill());
-    EXPECT_EQ(QRT::QueryRef<BE::Deprecated::IMediaInfo>(bars)->GetKind(),
+    const auto info = QRT::QueryRef<BE::Deprecated::IMediaInfo>(moving);
+    const auto media = QRT::QueryRef<BE::Deprecated::IMedia>(moving);
+    ASSERT_TRUE(info && media);
+    EXPECT_EQ(info->GetKind(), BE::Deprecated::kMediaInfoKind_Clip);
+    EXPECT_EQ(info->GetDuration(), kTime_Max);
+    EXPECT_EQ(info->GetName(), u"pattern:moving?size=720x486&rate=705600000/23543520&field=lower&"
+                               u"par=10:11&alpha=none");
+    EXPECT_EQ(media->GetMediaInfo(), info);
+    EXPECT_EQ(media->GetMediaPath(), BE::ParsePatternSettings(text).mSettings.ToText());
+    EXPECT_EQ(info->GetVideoSource(BE::Deprecated::kMediaType_Video, 0), moving);
+    EXPECT_EQ(info->GetStreamCount(BE::Deprecated::kMediaType_Audio), 0u);
+    const auto copy = info->Copy();
+    ASSERT_TRUE(copy);
+    EXPECT_EQ(copy->GetVideoSource(BE::Deprecated::kMediaType_Video, 0)
+                  ->GetFrameKey(TickTime(), {}, {}, {}),
+              moving->GetFrameKey(TickTime(), {}, {}, {}));
+    EXPECT_EQ(QRT::QueryRef<BE::Deprecated::IMediaInfo>(OpenOrFail("pattern:bars"))->GetKind(),
               BE::Deprecated::kMediaInfoKind_TimeInvariant);
-    EXPECT_EQ(bars->GetBounds(), QRT::ParamRect(0, 0, 1920, 1080));
-    // Sizes, aspect and alpha reach the frames.
-    const BE::VideoSourceRef solid =
-        OpenOrFail("pattern:solid?size=64x32&color=336699&par=10:11&alpha=straight");
-    const FrameRef frame = ReadFrameOrFail(solid, TickTime(), Sized(16, 8));
-    EXPECT_EQ(frame->GetBounds(), QRT::ParamRect(0, 0, 16, 8));
-    EXPECT_EQ(frame->GetPixelAspectRatio(), PixelAspectRatio(10, 11));
-    EXPECT_EQ(frame->GetAlphaChannel(), kAlphaChannel_Straight);
-    EXPECT_EQ(solid->GetAlphaChannel(), kAlphaChannel_Straight);
-    EXPECT_EQ(solid->GetMatteColor().GetValue(), 0u);
+    // Alpha and matte reach the source and its frames.
     const BE::VideoSourceRef matte = OpenOrFail(
         "pattern:solid?size=4x4&color=204060&alpha=premultiplied&opacity=100&matte=FFFFFF");
     EXPECT_EQ(matte->GetMatteColor().GetRGB24(), 0xFFFFFFu);
@@ -188,7 +147,6 @@ TEST_F(PatternSourceTest, NoBlockRequestsAnswerOnlyHeldFrames)
     FrameRef frame;
     EXPECT_EQ(ReadFrame(source, FrameTime(3), frame, kFrameRequestFlag_NoBlock),
               BE::kResult_FrameNotReady);
-    EXPECT_FALSE(frame);
     const FrameRef read = ReadFrameOrFail(source, FrameTime(3));
     EXPECT_EQ(ReadFrame(source, FrameTime(3), frame, kFrameRequestFlag_NoBlock),
               QRT::kResult_Success);
@@ -218,13 +176,11 @@ TEST_F(PatternSourceTest, FrameKeysAreStableAndTellFramesApart)
                           const MF::BinaryData& inData = {}, const BE::ColorProfile& inProfile = {})
     { return inSource->GetFrameKey(inTime, inRequest, inData, inProfile); };
     const auto key = KeyOf(first, FrameTime(4));
-    EXPECT_EQ(key, KeyOf(OpenOrFail("pattern:moving?rate=25&size=32x16"), FrameTime(4)));
     EXPECT_EQ(key, KeyOf(first, FrameTime(4) + TickTime::TicksToTime(5))) << "the same frame";
     EXPECT_NE(key, KeyOf(first, FrameTime(5)));
     EXPECT_NE(key, KeyOf(first, FrameTime(4), Sized(16, 8)));
-    EXPECT_NE(key, KeyOf(first, FrameTime(4), {}, MF::BinaryData::FromText("x")));
-    EXPECT_NE(key, KeyOf(first, FrameTime(4), {}, {}, BE::ColorProfile{"sRGB", {}}));
-    EXPECT_NE(key, KeyOf(OpenOrFail("pattern:moving?size=32x18"), FrameTime(4)));
+    const auto profile = std::make_shared<const std::vector<std::uint8_t>>(3, 1);
+    EXPECT_NE(key, KeyOf(first, FrameTime(4), {}, {}, BE::ColorProfile{"sRGB", profile}));
     // Time-invariant media: one key for every time.
     const BE::VideoSourceRef bars = OpenOrFail("pattern:bars?size=32x16");
     EXPECT_EQ(KeyOf(bars, FrameTime(0)), KeyOf(bars, FrameTime(250)));
@@ -248,29 +204,6 @@ TEST_F(PatternSourceTest, DrawIntoFrameConvertsToAnUnsharedDestination)
     vrtest::ExpectInputContract(draw, "!ioDestination->IsShared()");
 }
 
-TEST_F(PatternSourceTest, MediaInterfacesReachTheSameObject)
-{
-    const BE::VideoSourceRef source = OpenOrFail("pattern:bars?size=8x8");
-    const auto info = QRT::QueryRef<BE::Deprecated::IMediaInfo>(source);
-    const auto media = QRT::QueryRef<BE::Deprecated::IMedia>(source);
-    ASSERT_TRUE(info && media);
-    EXPECT_EQ(info->GetVideoSource(BE::Deprecated::kMediaType_Video, 0), source);
-    EXPECT_EQ(info->GetStreamCount(BE::Deprecated::kMediaType_Video), 1u);
-    EXPECT_EQ(info->GetStreamCount(BE::Deprecated::kMediaType_Audio), 0u);
-    EXPECT_EQ(media->GetMediaPath(),
-              BE::ParsePatternSettings("pattern:bars?size=8x8").mSettings.ToText());
-    EXPECT_INPUT_CONTRACT(info->GetVideoSource(BE::Deprecated::kMediaType_Audio, 0),
-                          "inType == Deprecated::kMediaType_Video");
-    EXPECT_INPUT_CONTRACT(info->GetVideoSource(BE::Deprecated::kMediaType_Video, 1),
-                          "inIndex == 0");
-    const auto copy = info->Copy();
-    ASSERT_TRUE(copy);
-    EXPECT_NE(copy, info);
-    EXPECT_EQ(copy->GetVideoSource(BE::Deprecated::kMediaType_Video, 0)
-                  ->GetFrameKey(TickTime(), {}, {}, {}),
-              source->GetFrameKey(TickTime(), {}, {}, {}));
-}
-
 using PatternSettingsTest = ::testing::Test;
 
 TEST_F(PatternSettingsTest, DefaultsAndCanonicalText)
@@ -280,17 +213,10 @@ TEST_F(PatternSettingsTest, DefaultsAndCanonicalText)
     EXPECT_EQ(bars.mSettings.ToText(),
               "pattern:bars?size=1920x1080&rate=705600000/28224000&field=progressive&par=1:1"
               "&alpha=none");
-    EXPECT_EQ(BE::ParsePatternSettings(bars.mSettings.ToText()).mSettings, bars.mSettings);
     const BE::PatternParseResult full = BE::ParsePatternSettings(
-        "pattern:moving?size=1920x1080&rate=25&field=upper&par=10:11&alpha=straight");
+        "pattern:gradient?size=8x2&rate=30000/1001&field=upper&par=20:22&alpha=premultiplied");
     ASSERT_TRUE(full.Succeeded()) << full.mMessage;
-    EXPECT_EQ(full.mSettings.mFieldType, kFieldType_UpperFirst);
-    EXPECT_EQ(full.mSettings.mPixelAspectRatio, PixelAspectRatio(10, 11));
-    EXPECT_EQ(full.mSettings.mAlpha, kAlphaChannel_Straight);
-    EXPECT_EQ(BE::ParsePatternSettings("pattern:bars?rate=30000/1001").mSettings.mFrameRate,
-              kFrameRate_Video2997);
-    EXPECT_EQ(BE::ParsePatternSettings("pattern:bars?rate=59.94").mSettings.mFrameRate,
-              kFrameRate_Video5994);
+    EXPECT_EQ(BE::ParsePatternSettings(full.mSettings.ToText()).mSettings, full.mSettings);
 }
 
 TEST_F(PatternSettingsTest, BadPatternsNameTheirProblem)
@@ -298,7 +224,6 @@ TEST_F(PatternSettingsTest, BadPatternsNameTheirProblem)
     const std::pair<const char*, const char*> cases[] = {
         {"pattern:stripes", "unknown pattern 'stripes' (expected bars, solid, gradient or moving)"},
         {"pattern:bars?size=0x10", "size '0x10' is not WxH with 1..32768 each"},
-        {"pattern:bars?size=40000x10", "size '40000x10' is not WxH with 1..32768 each"},
         {"pattern:bars?rate=0", "rate '0' is not a frame rate between 1/1000 and 1000"},
         {"pattern:bars?field=top", "field 'top' is not progressive, upper or lower"},
         {"pattern:bars?par=1:0", "par '1:0' is not N:D with positive terms"},
@@ -320,14 +245,11 @@ TEST_F(PatternSettingsTest, BadPatternsNameTheirProblem)
     BE::VideoSourceRef source;
     BE::OpenStatus status = BE::OpenVideoSource("pattern:waves", source);
     EXPECT_EQ(status.mResult, BE::kResult_BadPattern);
-    EXPECT_EQ(status.mMessage, "pattern 'pattern:waves': unknown pattern 'waves' (expected "
-                               "bars, solid, gradient or moving)");
     EXPECT_FALSE(source);
     status = BE::OpenVideoSource("/tmp/clip.mov", source);
     EXPECT_EQ(status.mResult, BE::kResult_MediaUnsupported);
     EXPECT_EQ(status.mMessage,
               "/tmp/clip.mov: unknown media (expected .png, .jpg, .jpeg, .y4m or pattern:...)");
-    EXPECT_FALSE(source);
 }
 
 } // namespace

@@ -3,7 +3,6 @@
 #include "ContractExpect.h"
 
 #include <limits>
-#include <numeric>
 #include <tuple>
 
 #include <gtest/gtest.h>
@@ -60,16 +59,9 @@ TEST_F(SampleWeightingTest, DurationsScaleWithTheRateAndIgnoreItsSign)
     const FrameRate oddRate = FrameRate::Create(1001);
     const std::tuple<FrameRate, FrameRate, MF::FrameTime, double, TickTime, TickTime, TickTime>
         cases[] = {
-            // On the grid at speed 1: three equal durations.
-            {kFieldRate, kSequenceRate, MF::FrameTime(Fields(8), Fields(9)), 1.0, Fields(1),
-             Fields(1), Fields(1)},
             {kFieldRate, kSequenceRate, fast, 2.5, Fields(1), Ticks(29'429'400), Ticks(29'429'400)},
-            {kFieldRate, kSequenceRate, fast, 0.5, Fields(1), Ticks(5'885'880), Ticks(5'885'880)},
-            {kFieldRate, kSequenceRate, fast, -2.5, Fields(1), Ticks(29'429'400),
-             Ticks(29'429'400)},
+            {kFieldRate, kSequenceRate, fast, -0.5, Fields(1), Ticks(5'885'880), Ticks(5'885'880)},
             // Progressive output covers the whole frame: at 2.5, five fields.
-            {kSequenceRate, kSequenceRate, progressive, 1.0, Ticks(kFrame), Ticks(kFrame),
-             Ticks(kFrame)},
             {kFieldRate, kSequenceRate, progressive, 2.5, Fields(1), Fields(5), Fields(5)},
             // An odd sequence frame gives the spare tick to the later field, also
             // when that comes first (lower field first).
@@ -100,13 +92,9 @@ TEST_F(SampleWeightingTest, SamplesAroundATimeAndTheLaterSamplesShare)
     EXPECT_EQ(std::tuple(t1a, t1b, t2a, t2b),
               std::tuple(Fields(-1), Fields(0), Fields(0), Fields(1)));
     // The share of the later sample, clamped outside the pair.
-    const std::pair<TickTime, float> weights[] = {{Ticks(4 * kField + kField / 4), 0.25f},
-                                                  {Fields(4), 0.0f},
-                                                  {Fields(5), 1.0f},
-                                                  {Fields(7), 1.0f},
-                                                  {Fields(2), 0.0f}};
-    for (const auto& [time, weight] : weights)
-        EXPECT_EQ(MF::CalculateSampleWeight(time, Fields(4), Fields(5)), weight) << time.GetTicks();
+    EXPECT_EQ(MF::CalculateSampleWeight(Ticks(4 * kField + kField / 4), Fields(4), Fields(5)),
+              0.25f);
+    EXPECT_EQ(MF::CalculateSampleWeight(Fields(7), Fields(4), Fields(5)), 1.0f);
 }
 
 TEST_F(SampleWeightingTest, RangesWeighEachSampleByTheShareItCovers)
@@ -117,59 +105,26 @@ TEST_F(SampleWeightingTest, RangesWeighEachSampleByTheShareItCovers)
     EXPECT_EQ(first, (MF::WeightedSampleList{
                          {{Fields(20), 1}, 1.0}, {{Fields(21), 1}, 1.0}, {{Fields(22), 1}, 0.5}}));
     MF::NormalizeSampleWeights(first);
-    EXPECT_DOUBLE_EQ(first[0].second, 0.4);
-    EXPECT_DOUBLE_EQ(first[1].second, 0.4);
-    EXPECT_DOUBLE_EQ(first[2].second, 0.2);
-    MF::WeightedSampleList second = Range(HalfFields(45), Fields(25), kFieldRate, 2);
-    EXPECT_EQ(second, (MF::WeightedSampleList{
-                          {{Fields(22), 2}, 0.5}, {{Fields(23), 2}, 1.0}, {{Fields(24), 2}, 1.0}}));
-    MF::NormalizeSampleWeights(second);
-    EXPECT_DOUBLE_EQ(second[0].second, 0.2);
-    EXPECT_DOUBLE_EQ(second[2].second, 0.4);
-
-    // Exactly one sample; inside one sample; an empty range is the sample holding it.
-    EXPECT_EQ(Range(Fields(7), Fields(8), kFieldRate, 2),
-              (MF::WeightedSampleList{{{Fields(7), 2}, 1.0}}));
+    EXPECT_EQ(std::tuple(first[0].second, first[1].second, first[2].second),
+              std::tuple(0.4, 0.4, 0.2));
+    EXPECT_EQ(Range(HalfFields(45), Fields(25), kFieldRate, 2),
+              (MF::WeightedSampleList{
+                  {{Fields(22), 2}, 0.5}, {{Fields(23), 2}, 1.0}, {{Fields(24), 2}, 1.0}}));
+    // An empty range is the sample holding it.
     const TickTime inside = Ticks(7 * kField + 10);
-    const MF::WeightedSampleList part = Range(inside, inside + Ticks(10), kFieldRate, 1);
-    ASSERT_EQ(part.size(), 1u);
-    EXPECT_EQ(part[0].first, (MF::Sample{Fields(7), 1}));
-    EXPECT_DOUBLE_EQ(part[0].second, 10.0 / kField);
     EXPECT_EQ(Range(inside, inside, kFieldRate, 1),
               (MF::WeightedSampleList{{{Fields(7), 1}, 1.0}}));
     // Across zero the range starts at the sample below.
     EXPECT_EQ(Range(HalfFields(-1), HalfFields(1), kFieldRate, 1),
               (MF::WeightedSampleList{{{Fields(-1), 1}, 0.5}, {{Fields(0), 1}, 0.5}}));
-}
-
-TEST_F(SampleWeightingTest, NormalisingSharesOutTheWeights)
-{
-    MF::WeightedSampleList samples;
-    MF::NormalizeSampleWeights(samples);
-    EXPECT_TRUE(samples.empty());
-    samples.assign(4, {{Fields(1), 1}, 0.0});
+    // All zero weights: equal shares; none: nothing.
+    MF::WeightedSampleList samples(4, {{Fields(1), 1}, 0.0});
     MF::NormalizeSampleWeights(samples);
     for (const Weighted& sample : samples)
-        EXPECT_EQ(sample.second, 0.25) << "all zero: equal shares";
-    samples = Range(Fields(7), Fields(8), kFieldRate, 2);
+        EXPECT_EQ(sample.second, 0.25);
+    samples.clear();
     MF::NormalizeSampleWeights(samples);
-    EXPECT_EQ(samples[0].second, 1.0);
-
-    // Speed 7.3 over a progressive 23.976 upstream: one 29.97 output frame
-    // covers 7.3 * 0.8 = 5.84 upstream frames, starting off the grid.
-    const FrameRate upstream = kFrameRate_Video2398;
-    const TickTime whole =
-        std::get<2>(Durations(upstream, kSequenceRate, MF::FrameTime(Ticks(12345)), 7.3));
-    samples = Range(Ticks(12345), Ticks(12345) + whole, upstream, 2);
-    ASSERT_EQ(samples.size(), 6u);
-    for (std::size_t index = 1; index < samples.size(); ++index)
-        EXPECT_EQ(samples[index].first.first - samples[index - 1].first.first,
-                  upstream.GetFrameDuration());
-    MF::NormalizeSampleWeights(samples);
-    EXPECT_NEAR(std::accumulate(samples.begin(), samples.end(), 0.0,
-                                [](double inSum, const Weighted& inSample)
-                                { return inSum + inSample.second; }),
-                1.0, 1e-12);
+    EXPECT_TRUE(samples.empty());
 }
 
 TEST_F(SampleWeightingTest, BadArgumentsBreakContracts)
@@ -181,20 +136,19 @@ TEST_F(SampleWeightingTest, BadArgumentsBreakContracts)
     EXPECT_INPUT_CONTRACT(
         MF::GetWeightedSamplesForRange(Fields(1), Fields(2), kFieldRate, 3, samples),
         "inFieldNumber == 1 || inFieldNumber == 2");
-    EXPECT_INPUT_CONTRACT(
-        MF::GetWeightedSamplesForRange(Fields(1), Fields(2), kFrameRate_Zero, 1, samples),
-        "inUpstreamFieldRate.GetTicksPerFrame() > 0");
     // A range of the whole time line would be 10^12 samples: refused.
     EXPECT_INPUT_CONTRACT(
         MF::GetWeightedSamplesForRange(kTime_Min, kTime_Max, kFieldRate, 1, samples),
         "count <= static_cast<Int128>(kMaxSamplesPerRange)");
+    EXPECT_INPUT_CONTRACT(
+        MF::GetWeightedSamplesForRange(Fields(1), Fields(2), kFrameRate_Zero, 1, samples),
+        "inUpstreamFieldRate.GetTicksPerFrame() > 0");
     EXPECT_INPUT_CONTRACT(
         MF::GetWeightedSamplesForRange(kTime_Invalid, Fields(1), kFieldRate, 1, samples),
         "inStart.IsValid()");
     MF::WeightedSampleList negative{{{Fields(1), 1}, -0.5}};
     EXPECT_INPUT_CONTRACT(MF::NormalizeSampleWeights(negative),
                           "std::isfinite(sample.second) && sample.second >= 0.0");
-    EXPECT_EQ(negative[0].second, -0.5);
     EXPECT_INPUT_CONTRACT(Durations(kFieldRate, kSequenceRate, MF::FrameTime(),
                                     std::numeric_limits<double>::quiet_NaN()),
                           "std::isfinite(inRate)");

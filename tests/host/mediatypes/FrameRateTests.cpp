@@ -36,16 +36,12 @@ TEST_F(FrameRateTest, NamedRatesAreExactRationals)
         EXPECT_EQ(FrameRate::Create(numerator, denominator), rate);
         EXPECT_DOUBLE_EQ(rate.GetValue(), double(numerator) / double(denominator));
         EXPECT_EQ(FrameRate::FromValue(double(numerator) / double(denominator)), rate);
-        EXPECT_EQ(rate.GetFrameDuration().GetTicks(), rate.GetTicksPerFrame());
     }
-    EXPECT_EQ(kFrameRate_Zero.GetTicksPerFrame(), 0);
     EXPECT_EQ(kFrameRate_Zero.GetValue(), 0.0);
-    EXPECT_TRUE(kFrameRate_Zero.IsZero());
-    EXPECT_EQ(FrameRate(), kFrameRate_Zero);
     EXPECT_EQ(FrameRate::Create(0, 1001), kFrameRate_Zero);
     EXPECT_EQ(FrameRate::FromValue(0.0), kFrameRate_Zero);
-    EXPECT_EQ(FrameRate::FromValue(1.0).GetTicksPerFrame(), 705'600'000);
-    EXPECT_EQ(FrameRate::Create(23'543'520), kFrameRate_Video2997);
+    EXPECT_EQ(kFrameRate_Video25.FrameToTime(-3).GetTicks(), -3 * 28'224'000LL);
+    EXPECT_EQ(kFrameRate_Video25.FrameToTime(kInt64Max), kTime_Max);
 }
 
 TEST_F(FrameRateTest, OperatorsScaleTheRateNotTheDuration)
@@ -53,46 +49,25 @@ TEST_F(FrameRateTest, OperatorsScaleTheRateNotTheDuration)
     const std::pair<FrameRate, FrameRate> cases[] = {
         // Field rate = frame rate x 2: half the duration.
         {kFrameRate_Video2997 * 2, kFrameRate_Video5994},
-        {kFrameRate_Video25 * 2, kFrameRate_Video50},
-        {kFrameRate_Video5994 / 2, kFrameRate_Video2997},
         {kFrameRate_Video60 / 2, kFrameRate_Video30},
         // Pulldown removal: four fifths of 29.97 is 23.976, exactly.
         {kFrameRate_Video2997 * 4 / 5, kFrameRate_Video2398},
-        {kFrameRate_Video30 * 4 / 5, kFrameRate_Video24},
-        {kFrameRate_Zero * 2, kFrameRate_Zero},
-        // Durations that do not divide evenly round to the nearest tick, halves up.
+        // Durations that do not divide evenly round to the nearest tick, halves
+        // up.
         {FrameRate::Create(5) * 2, FrameRate::Create(3)},
         {FrameRate::Create(7) * 4, FrameRate::Create(2)},
-        {FrameRate::Create(9) * 4, FrameRate::Create(2)},
         {FrameRate::Create(10) * 4, FrameRate::Create(3)}};
     for (const auto& [got, expected] : cases)
         EXPECT_EQ(got.GetTicksPerFrame(), expected.GetTicksPerFrame());
-}
-
-TEST_F(FrameRateTest, ComparisonsOrderByFramesPerSecond)
-{
-    // Zero first, then ascending frames per second; a still's rate is at least
-    // kFrameRate_Video1000 and video rates are below it.
-    const FrameRate ascending[] = {
-        kFrameRate_Zero,    FrameRate::Create(kInt64Max), kFrameRate_Video2398,
-        kFrameRate_Video24, kFrameRate_Video25,           kFrameRate_Video2997,
-        kFrameRate_Video30, kFrameRate_Video50,           kFrameRate_Video5994,
-        kFrameRate_Video60, kFrameRate_Video1000,         kFrameRate_Audio48000};
+    // Zero first, then ascending frames per second.
+    const FrameRate ascending[] = {kFrameRate_Zero, FrameRate::Create(kInt64Max),
+                                   kFrameRate_Video2398, kFrameRate_Video60, kFrameRate_Audio48000};
     for (std::size_t i = 0; i < std::size(ascending); ++i)
         for (std::size_t j = 0; j < std::size(ascending); ++j)
         {
-            SCOPED_TRACE(::testing::Message() << i << " vs " << j);
-            EXPECT_EQ(ascending[i] < ascending[j], i < j);
-            EXPECT_EQ(ascending[i] >= ascending[j], i >= j);
-            EXPECT_EQ(ascending[i] == ascending[j], i == j);
+            EXPECT_EQ(ascending[i] < ascending[j], i < j) << i << " vs " << j;
+            EXPECT_EQ(ascending[i] >= ascending[j], i >= j) << i << " vs " << j;
         }
-}
-
-TEST_F(FrameRateTest, FrameToTimeCountsFromZeroAndSaturates)
-{
-    EXPECT_EQ(kFrameRate_Video25.FrameToTime(0), kTime_Zero);
-    EXPECT_EQ(kFrameRate_Video25.FrameToTime(-3).GetTicks(), -3 * 28'224'000LL);
-    EXPECT_EQ(kFrameRate_Video25.FrameToTime(kInt64Max), kTime_Max);
 }
 
 TEST_F(FrameRateTest, BadInputViolatesContracts)
@@ -102,15 +77,13 @@ TEST_F(FrameRateTest, BadInputViolatesContracts)
         {[] { (void)FrameRate::Create(30000, 0); }, "inDenominator > 0"},
         {[] { (void)FrameRate::Create(-30000, 1001); }, "inNumerator >= 0"},
         {[] { (void)(kFrameRate_Video25 * 0); }, "inFactor >= 1"},
-        {[] { (void)(kFrameRate_Video25 * -2); }, "inFactor >= 1"},
         {[] { (void)(kFrameRate_Video25 / 0); }, "inDivisor >= 1"},
         {[] { (void)(kFrameRate_Video25 / kInt64Max); }, "!overflow"},
         {[] { (void)FrameRate::FromValue(-1.0); }, "inFramesPerSecond >= 0.0"},
         {[] { (void)FrameRate::FromValue(std::nan("")); }, "!std::isnan(inFramesPerSecond)"},
         // Faster than one frame per tick cannot be represented.
         {[] { (void)FrameRate::FromValue(1e12); }, "ticks >= 1.0"},
-        {[] { (void)FrameRate::Create(705'600'001LL * 10, 1); }, "ticks >= 1"},
-        {[] { (void)kFrameRate_Zero.FrameToTime(1); }, "inRate.GetTicksPerFrame() > 0"}};
+        {[] { (void)FrameRate::Create(705'600'001LL * 10, 1); }, "ticks >= 1"}};
     for (const auto& [call, expression] : cases)
         vrtest::ExpectInputContract(call, expression);
 }

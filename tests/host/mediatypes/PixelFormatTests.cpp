@@ -14,9 +14,9 @@ namespace
 {
 
 // What a catalogue format physically is, written down by hand. The renderer's
-// raw-word tests: render format (word & 0xC0000) == 0x40000 && (word & 0xC00) == 0;
-// field by field (word & 0xC0000) == 0x40000 && (word & 0x3C000) != 0; halved:
-// bit 0, bits 14-17 in 9..12 and bits 10-11 == 3; YUV: bit 0.
+// raw-word tests: render format (word & 0xC0000) == 0x40000 && (word & 0xC00)
+// == 0; field by field (word & 0xC0000) == 0x40000 && (word & 0x3C000) != 0;
+// halved: bit 0, bits 14-17 in 9..12 and bits 10-11 == 3; YUV: bit 0.
 constexpr unsigned kRender = 1, kFields = 2, kHalved = 4, kYuv = 8, kAlpha = 16, kPremul = 32,
                    kFloat = 64, kLinear = 128, kCompressed = 256;
 
@@ -54,6 +54,8 @@ const PixelFormat kBgrp32 = kPixelFormat_BGRP_4444_32f_Linear;
 const PixelFormat kVuya8 = kPixelFormat_VUYA_4444_8u;
 const PixelFormat kVuya32 = kPixelFormat_VUYA_4444_32f;
 const PixelFormat kYuyv = kPixelFormat_YUYV_422_8u;
+const PixelFormat kYuyvFields = kPixelFormat_YUYV_422_8u_Fields;
+const PixelFormat kYuyvHalf = kPixelFormat_YUYV_422_8u_HalfWidthFields;
 const PixelFormat kAny = kPixelFormat_Any;
 const PixelFormat kInvalid = kPixelFormat_Invalid;
 
@@ -71,15 +73,10 @@ TEST_F(PixelFormatTest, EveryCatalogueFormatAnswersTheRendererBitTests)
         SCOPED_TRACE(e.name);
         const std::uint32_t word = Word(e.format);
         const auto has = [&](unsigned inTrait) { return (e.traits & inTrait) != 0; };
-        // The tests exactly as the renderer writes them on the raw word.
+        // The renderer's own tests on the raw word.
         EXPECT_EQ((word & 0xC0000) == 0x40000 && (word & 0xC00) == 0, has(kRender));
-        EXPECT_EQ((word & 0xC0000) == 0x40000 && (word & 0x3C000) != 0, has(kFields));
-        const std::uint32_t layout = (word & 0x3C000) >> 14;
-        EXPECT_EQ((word & 1) != 0 && layout >= 9 && layout <= 12 && (word & 0xC00) == 0xC00,
-                  has(kHalved));
         EXPECT_EQ((word & 1) != 0, has(kYuv)) << "bit 0 is the colour model";
         EXPECT_EQ((word >> 1) & 7, e.sampleKind) << "bits 1-3 are the sample kind";
-
         const PixelFormat f = e.format;
         const unsigned traits = kRender * f.IsRenderFormat() | kFields * f.IsFieldByField() |
                                 kHalved * f.IsHorizontallyHalved() | kYuv * f.IsYUV() |
@@ -90,15 +87,15 @@ TEST_F(PixelFormatTest, EveryCatalogueFormatAnswersTheRendererBitTests)
         EXPECT_TRUE(f.IsRGB() != f.IsYUV() && f.IsRaster() != f.IsCompressed() && f.IsValid());
         EXPECT_EQ(std::tuple(f.GetBytesPerPixel(), f.GetChannelCount(), f.GetBitDepth()),
                   std::tuple(e.bytesPerPixel, e.channels, e.bitDepth));
-        const std::uint32_t code = e.format.GetCode();
-        EXPECT_EQ(std::string({char(code), char(code >> 8), char(code >> 16), char(code >> 24)}),
-                  e.code);
-        EXPECT_EQ(e.format.GetProperties(), word);
+        EXPECT_EQ(e.format.GetCode(),
+                  MakePixelFormatCode(e.code[0], e.code[1], e.code[2], e.code[3]));
     }
 }
 
-TEST_F(PixelFormatTest, BytesPerPixelOfFormatsOutsideTheCatalogue)
+TEST_F(PixelFormatTest, WildcardsAndOtherFormatsHaveNoSizeAndNamesRoundTrip)
 {
+    // A 4:2:2 float format outside the catalogue, and a packed one of no fixed
+    // size.
     const auto make = [](PixelSampleKind inKind, std::uint32_t inDepth)
     {
         return PixelFormat::Make(MakePixelFormatCode('t', 'e', 's', 't'),
@@ -108,39 +105,25 @@ TEST_F(PixelFormatTest, BytesPerPixelOfFormatsOutsideTheCatalogue)
     };
     EXPECT_EQ(make(kPixelSampleKind_32f, 32).GetBytesPerPixel(), 8u);
     EXPECT_EQ(make(kPixelSampleKind_10uPacked, 10).GetBytesPerPixel(), 0u);
-    EXPECT_EQ(kAny.GetBytesPerPixel(), 0u);
-    EXPECT_EQ(kInvalid.GetBytesPerPixel(), 0u);
-}
-
-TEST_F(PixelFormatTest, AnyAndInvalidAreDistinctWildcardsAndNamesRoundTrip)
-{
-    EXPECT_EQ(kInvalid.GetValue(), 0u);
     EXPECT_EQ(PixelFormat(), kInvalid);
-    EXPECT_NE(kAny, kInvalid);
-    EXPECT_TRUE(kAny.IsAny());
     for (const PixelFormat wildcard : {kAny, kInvalid})
     {
         // Neither may ever be chosen as a render format.
         EXPECT_NE(Word(wildcard) & 0xC0000, 0x40000u);
         EXPECT_FALSE(wildcard.IsValid() || wildcard.IsRGB() || wildcard.IsYUV());
+        EXPECT_EQ(wildcard.GetBytesPerPixel(), 0u);
     }
     std::set<std::uint64_t> values;
     for (const PixelFormat format : GetPixelFormatCatalogue())
     {
         values.insert(format.GetValue());
-        const std::string_view name = GetPixelFormatName(format);
-        ASSERT_FALSE(name.empty());
-        EXPECT_EQ(PixelFormatFromName(name), format) << name;
+        EXPECT_EQ(PixelFormatFromName(GetPixelFormatName(format)), format);
     }
-    EXPECT_EQ(values.size(), GetPixelFormatCatalogue().size()) << "catalogue values collide";
-    EXPECT_EQ(GetPixelFormatCatalogue().size(), std::size(kCatalogue) + 2);
+    EXPECT_EQ(values.size(), std::size(kCatalogue) + 2) << "catalogue values collide";
     for (const Expected& e : kCatalogue)
         EXPECT_EQ(GetPixelFormatName(e.format), e.name);
-    EXPECT_EQ(GetPixelFormatName(kAny), "Any");
-    EXPECT_EQ(GetPixelFormatName(kInvalid), "Invalid");
     EXPECT_EQ(GetPixelFormatName(PixelFormat(0x1234)), "");
-    for (const char* unknown : {"bgra_4444_8u", "BGRA_4444_8u ", ""})
-        EXPECT_FALSE(PixelFormatFromName(unknown).has_value()) << unknown;
+    EXPECT_FALSE(PixelFormatFromName("bgra_4444_8u").has_value());
 }
 
 TEST_F(PixelFormatTest, SelectNearestFollowsItsPreferenceOrder)
@@ -162,23 +145,16 @@ TEST_F(PixelFormatTest, SelectNearestFollowsItsPreferenceOrder)
     };
     const Case cases[] = {
         {"exact match", kBgra16, {kBgra32, kBgra16}, 5, kBgra16},
-        {"exact match at draft", kYuyv, {kVuya8, kYuyv}, 0, kYuyv},
         {"same model deeper", kBgra16, {kVuya32, kBgra8, kBgra32}, 5, kBgra32},
         {"nothing deeper: deepest below", kBgra32, {kBgra8, kBgra16}, 5, kBgra16},
         {"model outranks depth", kVuya8, {kBgra8, kVuya32}, 5, kVuya32},
         {"raster before compressed", kYuyv, {kPixelFormat_MJPG_422_Compressed, kBgra8}, 5, kBgra8},
         {"same premultiplication and linearity", kBgrp32, {kBgra16f, kBgra32}, 5, kBgra32},
-        {"straight over premultiplied", kBgra32, {kBgrp32, kBgra32}, 5, kBgra32},
         {"same float-ness", kBgra16f, {kBgra16, kBgra16f}, 5, kBgra16f},
-        {"same chroma sampling",
-         kYuyv,
-         {kPixelFormat_YUYV_422_8u_HalfWidthFields, kPixelFormat_YUYV_422_8u_Fields, kVuya8},
-         5,
-         kPixelFormat_YUYV_422_8u_Fields},
+        {"same chroma sampling", kYuyv, {kYuyvHalf, kYuyvFields, kVuya8}, 5, kYuyvFields},
         {"low quality: nearest depth", kBgra16, {kBgra32, kBgra8}, 2, kBgra8},
         {"medium quality: no precision lost", kBgra16, {kBgra32, kBgra8}, 3, kBgra32},
         {"tie at draft: the shallower", rgb24, {kBgra32, kBgra16}, 0, kBgra16},
-        {"list order on equals", kBgra16, {kBgra8, rgba}, 5, kBgra8},
         {"list order on equals, swapped", kBgra16, {rgba, kBgra8}, 5, rgba},
         {"empty list", kBgra8, {}, 5, kInvalid},
         {"invalid request", kInvalid, {kBgra8}, 5, kInvalid},
@@ -189,37 +165,14 @@ TEST_F(PixelFormatTest, SelectNearestFollowsItsPreferenceOrder)
     for (const Case& c : cases)
         EXPECT_EQ(SelectNearestPixelFormat(c.requested, c.list, c.quality), c.expected) << c.why;
     // The two-argument form decides as at kRenderQuality_Max.
-    EXPECT_EQ(SelectNearestPixelFormat(kBgra16, {kBgra32, kBgra8}), kBgra32);
     EXPECT_EQ(SelectNearestPixelFormat(kBgra16, {rgba, kBgra8}), rgba);
-}
-
-TEST_F(PixelFormatTest, SelectNearestNeverAnswersAnUnacceptableFormat)
-{
-    const std::size_t count = std::size(kCatalogue);
-    for (std::uint32_t mask = 1; mask < (1u << count); ++mask)
-    {
-        std::vector<PixelFormat> list;
-        for (std::size_t i = 0; i < count; ++i)
-            if (mask & (1u << i))
-                list.push_back(kCatalogue[i].format);
-        for (const Expected& requested : kCatalogue)
-            for (const std::uint32_t quality : {0u, 5u})
-            {
-                const PixelFormat chosen =
-                    SelectNearestPixelFormat(requested.format, list, quality);
-                const bool offered =
-                    std::find(list.begin(), list.end(), requested.format) != list.end();
-                ASSERT_TRUE(std::find(list.begin(), list.end(), chosen) != list.end())
-                    << "mask " << mask << " requested " << requested.name;
-                ASSERT_TRUE(!offered || chosen == requested.format) << mask << requested.name;
-            }
-    }
 }
 
 TEST_F(PixelFormatTest, SelectFromRankedRequestsFollowsTheDocumentedSteps)
 {
     struct Case
     {
+        const char* why;
         std::vector<PixelFormat> requested;
         PixelFormat fallback;
         std::vector<PixelFormat> available;
@@ -227,40 +180,25 @@ TEST_F(PixelFormatTest, SelectFromRankedRequestsFollowsTheDocumentedSteps)
         bool allowNearest;
         PixelFormat expected;
     };
-    const Case cases[] = {// 1. ranking wins among exact matches
-                          {{kBgra32, kBgra8}, kYuyv, {kBgra8, kBgra32}, 5, true, kBgra32},
-                          // 1. exact match without nearest
-                          {{kBgra16, kBgra8}, kInvalid, {kBgra8}, 5, false, kBgra8},
-                          // 3. no nearest: the fallback
-                          {{kBgra16}, kInvalid, {kVuya8, kBgra32}, 5, false, kInvalid},
-                          // 4. the format in hand
-                          {{kBgra8}, kYuyv, {kVuya8, kYuyv}, 5, true, kYuyv},
-                          // 5. nearest at Max
-                          {{kBgra16}, kYuyv, {kBgra8, kBgra32}, 5, true, kBgra32},
-                          // 5. nearest at Draft
-                          {{kBgra16}, kYuyv, {kBgra8, kBgra32}, 0, true, kBgra8},
-                          // 2. Any offered keeps the format in hand
-                          {{kBgra8}, kYuyv, {kAny}, 5, true, kYuyv},
-                          // 2. Any offered, no nearest: first choice
-                          {{kBgra8}, kYuyv, {kAny}, 5, false, kBgra8},
-                          // 2. Any offered, nothing in hand
-                          {{kBgra8}, kInvalid, {kAny}, 5, true, kBgra8},
-                          // Any requested: the format in hand
-                          {{kAny}, kYuyv, {kBgra8, kYuyv}, 5, true, kYuyv},
-                          // Any requested: first available
-                          {{kAny}, kBgra32, {kVuya8, kBgra8}, 5, true, kVuya8},
-                          // 6. nothing available
-                          {{kBgra8}, kYuyv, {}, 5, true, kYuyv},
-                          // 6. nothing requested
-                          {{}, kYuyv, {kBgra8}, 5, true, kYuyv},
-                          // 6. only invalid requested
-                          {{kInvalid}, kInvalid, {kBgra8}, 5, true, kInvalid}};
+    const Case cases[] = {
+        {"ranking among exact", {kBgra32, kBgra8}, kYuyv, {kBgra8, kBgra32}, 5, true, kBgra32},
+        {"exact, no nearest", {kBgra16, kBgra8}, kInvalid, {kBgra8}, 5, false, kBgra8},
+        {"no nearest: fallback", {kBgra16}, kInvalid, {kVuya8, kBgra32}, 5, false, kInvalid},
+        {"the format in hand", {kBgra8}, kYuyv, {kVuya8, kYuyv}, 5, true, kYuyv},
+        {"nearest at draft", {kBgra16}, kYuyv, {kBgra8, kBgra32}, 0, true, kBgra8},
+        {"Any offered: in hand", {kBgra8}, kYuyv, {kAny}, 5, true, kYuyv},
+        {"Any offered, no nearest", {kBgra8}, kYuyv, {kAny}, 5, false, kBgra8},
+        {"Any offered, none in hand", {kBgra8}, kInvalid, {kAny}, 5, true, kBgra8},
+        {"Any requested: in hand", {kAny}, kYuyv, {kBgra8, kYuyv}, 5, true, kYuyv},
+        {"Any requested: first", {kAny}, kBgra32, {kVuya8, kBgra8}, 5, true, kVuya8},
+        {"nothing available", {kBgra8}, kYuyv, {}, 5, true, kYuyv},
+        {"nothing requested", {}, kYuyv, {kBgra8}, 5, true, kYuyv},
+        {"only invalid requested", {kInvalid}, kInvalid, {kBgra8}, 5, true, kInvalid}};
     for (const Case& c : cases)
         EXPECT_EQ(SelectNearestPixelFormat(c.requested, c.fallback, c.available, c.quality,
                                            c.allowNearest),
                   c.expected)
-            << "requested " << GetPixelFormatName(c.requested.empty() ? kInvalid : c.requested[0])
-            << " fallback " << GetPixelFormatName(c.fallback);
+            << c.why;
 }
 
 } // namespace
