@@ -371,32 +371,6 @@ TEST_P(ExecutorTest, DroppingTheLastReferenceInsideItsOwnTaskEndsItAndItsParent)
     EXPECT_TRUE(Expires(mParent));
 }
 
-TEST_P(ExecutorTest, DroppingTheLastReferenceDiscardsPendingTasksAndWaitsForTheRunningOne)
-{
-    ExecutorRef executor = Make(1);
-    std::atomic<int> live{0};
-    std::atomic<int> ran{0};
-    std::atomic<bool> discardedWhileRunning{false};
-    Occupy(executor);
-    for (int i = 0; i < 5; ++i)
-        PostTracked(executor, live, ran);
-    // The running task is released only once the pending ones are gone.
-    std::thread opener(
-        [&]
-        {
-            const Clock::time_point deadline = Clock::now() + kHangGuard;
-            while (live.load() != 0 && Clock::now() < deadline)
-                std::this_thread::yield();
-            discardedWhileRunning = live.load() == 0;
-            mGate.Notify();
-        });
-    executor.reset();
-    opener.join();
-    EXPECT_TRUE(discardedWhileRunning.load());
-    EXPECT_TRUE(mOccupantDone.load());
-    EXPECT_EQ(ran.load(), 0);
-}
-
 TEST_P(ExecutorTest, BadTasksAndFactoryArgumentsAreInputContractErrors)
 {
     const ExecutorRef executor = Make(1);

@@ -2,7 +2,6 @@
 
 #include <cstdlib>
 #include <string>
-#include <thread>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -96,35 +95,6 @@ TEST_F(TraceTest, PatternsAreKeptOnceAndDisabledOrReplacedOneByOne)
     unsetenv(trace::kTraceEnvironmentVariable);
     trace::LoadFromEnvironment();
     EXPECT_TRUE(trace::GetEnabledCategories().empty());
-}
-
-TEST_F(TraceTest, LinesFromManyThreadsArriveWholeAndInEachThreadsOrder)
-{
-    trace::EnableCategory("Test.Threads");
-    constexpr int kThreads = 4;
-    constexpr int kLines = 500;
-    std::vector<std::thread> writers;
-    for (int t = 0; t < kThreads; ++t)
-    {
-        writers.emplace_back(
-            [t]
-            {
-                for (int i = 0; i < kLines; ++i)
-                    MVX_TRACE("Test.Threads", "thread %d line %d", t, i);
-            });
-    }
-    for (std::thread& writer : writers)
-        writer.join();
-    ASSERT_EQ(mLines.size(), static_cast<size_t>(kThreads * kLines));
-    std::vector<int> next(kThreads, 0);
-    for (const std::string& line : mLines)
-    {
-        // A whole line names a thread and that thread's next line number.
-        const int thread = line.size() > 22 ? line[21] - '0' : -1;
-        ASSERT_TRUE(thread >= 0 && thread < kThreads) << line;
-        EXPECT_EQ(line, "Test.Threads: thread " + std::to_string(thread) + " line " +
-                            std::to_string(next[thread]++));
-    }
 }
 
 TEST_F(TraceTest, LinesWrittenFromInsideTheSinkAreDropped)

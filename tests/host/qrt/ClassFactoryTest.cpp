@@ -126,6 +126,7 @@ TEST_F(ClassFactoryTest, FailedCreationsAnswerEmptyOrTheirStatus)
     ASSERT_EQ(Register(kGreeterB, "GreeterB", [](QRT::InterfaceRef<QRT::QRTUnknown>&) {}),
               QRT::kResult_Success);
     EXPECT_EQ(ClassFactory::CreateInstance(kGreeterB, out), QRT::kResult_NoInterface);
+    EXPECT_FALSE(QRT::CreateClassInstanceRef<IGreeter>(kGreeterB));
     ASSERT_EQ(Register(kGreeterC, "GreeterC",
                        [](QRT::InterfaceRef<QRT::QRTUnknown>&)
                        { throw QRT::InterfaceNotFoundException(); }),
@@ -163,19 +164,15 @@ TEST_F(ClassFactoryTest, CategoriesListTheirClassesInRegistrationOrderOrComeFrom
 
 TEST_F(ClassFactoryTest, BadRegistrationsAreContractViolations)
 {
-    const struct
-    {
-        QRT::Guid id;
-        const char* name;
-        const char* category;
-        QRT::ClassCreateFunction create;
-    } cases[] = {{QRT::Guid(), "X", "C", MakeGreeterCreator(1)},
-                 {kGreeterA, "", "C", MakeGreeterCreator(1)},
-                 {kGreeterA, "X", "", MakeGreeterCreator(1)},
-                 {kGreeterA, "X", "C", nullptr}};
-    for (const auto& c : cases)
-        EXPECT_THROW(Register(c.id, c.name, c.create, c.category), mvxcore::config::Error)
-            << c.name << "/" << c.category;
+    const auto bad = [](const QRT::Guid& inID, const char* inName, const char* inCategory,
+                        QRT::ClassCreateFunction inCreate) {
+        EXPECT_THROW(Register(inID, inName, std::move(inCreate), inCategory),
+                     mvxcore::config::Error);
+    };
+    bad(QRT::Guid(), "X", "C", MakeGreeterCreator(1));
+    bad(kGreeterA, "", "C", MakeGreeterCreator(1));
+    bad(kGreeterA, "X", "", MakeGreeterCreator(1));
+    bad(kGreeterA, "X", "C", nullptr);
     EXPECT_FALSE(ClassFactory::IsClassRegistered(kGreeterA));
 }
 

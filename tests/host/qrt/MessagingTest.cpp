@@ -10,7 +10,6 @@
 
 #include <atomic>
 #include <chrono>
-#include <cstring>
 #include <memory>
 #include <mutex>
 #include <numeric>
@@ -266,22 +265,6 @@ TEST_F(MessagingTest, StationDisposedBeforeDeliveryGetsNothingEvenWhenItsNameIsT
     mRelease->Signal();
     WaitForDispatcher();
     EXPECT_TRUE(recorder.Get().empty());
-}
-
-TEST_F(MessagingTest, DisposeWaitsForTheRunningReceiver)
-{
-    const QRT::ImmutableString station = HoldDispatcher();
-    std::atomic<bool> disposed{false};
-    std::thread disposer(
-        [&]
-        {
-            EXPECT_EQ(StationRegistry::DisposeStation(station), QRT::kResult_Success);
-            disposed = true;
-        });
-    std::this_thread::sleep_for(30ms);
-    EXPECT_FALSE(disposed.load());
-    mRelease->Signal();
-    disposer.join();
 }
 
 TEST_F(MessagingTest, ReceiversAreCalledInOrderUntilRemovedOrTheStationDisposedByOne)

@@ -222,22 +222,4 @@ TEST_F(ObjectModelTest, WeakLockRacingLastReleaseNeverRevives)
     }
 }
 
-TEST_F(ObjectModelTest, CopiesAcrossThreadsBalanceTheCount)
-{
-    const QRT::InterfaceRef<Square> square = QRT::Allocated<Square>::CreateInstance(4);
-    std::vector<std::thread> threads;
-    for (int i = 0; i < 4; ++i)
-    {
-        threads.emplace_back(
-            [square]
-            {
-                for (int n = 0; n < 10000; ++n)
-                    ASSERT_EQ(QRT::InterfaceRef<IShape>(square)->Area(), 16);
-            });
-    }
-    for (auto& t : threads)
-        t.join();
-    EXPECT_EQ(static_cast<QRT::Allocated<Square>*>(square.Get())->GetRefCountForTesting(), 1u);
-}
-
 } // namespace
