@@ -13,7 +13,6 @@ namespace
 {
 
 using mvxcore::config::Error;
-using mvxcore::debug::AssertFailure;
 using mvxcore::debug::ContractFailure;
 using mvxcore::debug::ContractKind;
 
@@ -43,39 +42,25 @@ int AssertThenContinue(int inValue)
     return inValue + 1;
 }
 
-bool EndsWith(const std::string& inText, const std::string& inEnd)
-{
-    return inText.ends_with(inEnd);
-}
-
-// Records every contract dialog and assertion report with copies of their texts.
+// Records every contract dialog (kind and line) and assertion report (texts
+// and line).
 class ContractTest : public ::testing::Test
 {
 protected:
-    struct Seen
-    {
-        ContractKind kind;
-        std::string expression;
-        std::string message;
-        std::string file;
-        int line;
-    };
-
     void SetUp() override
     {
         mvxcore::debug::SetContractDialogHook(
             [this](const ContractFailure& inFailure)
             {
-                mContracts.push_back({inFailure.kind, std::string(inFailure.expression), "",
-                                      std::string(inFailure.file), inFailure.line});
+                mContracts.emplace_back(inFailure.kind, inFailure.line);
                 return mAnswerBreak;
             });
         mvxcore::debug::SetAssertHook(
-            [this](const AssertFailure& inFailure)
+            [this](const mvxcore::debug::AssertFailure& inFailure)
             {
-                mAsserts.push_back({ContractKind::kInput, std::string(inFailure.condition),
-                                    std::string(inFailure.message), std::string(inFailure.file),
-                                    inFailure.line});
+                mAsserts.push_back(std::string(inFailure.condition) + " / " +
+                                   std::string(inFailure.message) + " / " +
+                                   std::to_string(inFailure.line));
             });
     }
 
@@ -86,8 +71,8 @@ protected:
     }
 
     bool mAnswerBreak = false;
-    std::vector<Seen> mContracts;
-    std::vector<Seen> mAsserts;
+    std::vector<std::pair<ContractKind, int>> mContracts;
+    std::vector<std::string> mAsserts;
 };
 
 TEST_F(ContractTest, ViolationThrowsLevelZeroError105WithItsTextsAndPlaceAndCallsTheDialogOnce)
@@ -129,14 +114,10 @@ TEST_F(ContractTest, ViolationThrowsLevelZeroError105WithItsTextsAndPlaceAndCall
         EXPECT_EQ(error->GetMinor(), c.minor);
         EXPECT_EQ(error->GetMessage(), c.message);
         EXPECT_EQ(error->GetExpression(), c.expression);
-        EXPECT_TRUE(EndsWith(error->GetFile(), "ContractTest.cpp")) << error->GetFile();
+        EXPECT_TRUE(error->GetFile().ends_with("ContractTest.cpp")) << error->GetFile();
         EXPECT_EQ(error->GetLine(), *c.line);
         EXPECT_NE(std::string(error->what()).find(c.expression), std::string::npos);
-        ASSERT_EQ(mContracts.size(), 1u);
-        EXPECT_EQ(mContracts[0].kind, c.kind);
-        EXPECT_EQ(mContracts[0].expression, c.expression);
-        EXPECT_TRUE(EndsWith(mContracts[0].file, "ContractTest.cpp"));
-        EXPECT_EQ(mContracts[0].line, *c.line);
+        EXPECT_EQ(mContracts, (std::vector<std::pair<ContractKind, int>>{{c.kind, *c.line}}));
     }
     EXPECT_TRUE(mAsserts.empty());
 }
@@ -147,26 +128,12 @@ TEST_F(ContractTest, AssertionReportsThroughTheHookAndContinuesAndPassingChecksC
     EXPECT_EQ(AssertThenContinue(3), 4);
     EXPECT_TRUE(mAsserts.empty());
     EXPECT_EQ(AssertThenContinue(12), 13);
-    ASSERT_EQ(mAsserts.size(), 1u);
-    EXPECT_EQ(mAsserts[0].expression, "inValue < 10");
-    EXPECT_EQ(mAsserts[0].message, "values stay below ten");
-    EXPECT_TRUE(EndsWith(mAsserts[0].file, "ContractTest.cpp"));
-    EXPECT_EQ(mAsserts[0].line, sAssertLine);
+    EXPECT_EQ(mAsserts, std::vector<std::string>{"inValue < 10 / values stay below ten / " +
+                                                 std::to_string(sAssertLine)});
     EXPECT_TRUE(mContracts.empty());
 }
 
-TEST_F(ContractTest, DialogAskingToBreakDoesNotTrapWithoutDebugger)
-{
-    if (mvxcore::debug::IsDebuggerAttached())
-        GTEST_SKIP() << "a debugger is attached; the break would be taken";
-    mAnswerBreak = true;
-    // Without a debugger the break is skipped and the error is thrown as usual
-    // (a trap would end this process).
-    EXPECT_THROW(RequirePositive(-1), Error);
-    EXPECT_EQ(mContracts.size(), 1u);
-}
-
-TEST_F(ContractTest, ReplacingAHookAnswersThePreviousOne)
+TEST_F(ContractTest, ReplacedHookAnswersAndABreakAnswerDoesNotTrapWithoutDebugger)
 {
     int calls = 0;
     const auto previous =
@@ -177,9 +144,13 @@ TEST_F(ContractTest, ReplacingAHookAnswersThePreviousOne)
     EXPECT_TRUE(mContracts.empty());
     // The fixture's hook comes back and sees the next failure.
     mvxcore::debug::SetContractDialogHook(previous);
+    if (mvxcore::debug::IsDebuggerAttached())
+        GTEST_SKIP() << "a debugger is attached; the break would be taken";
+    mAnswerBreak = true;
+    // Without a debugger the break is skipped and the error is thrown as usual
+    // (a trap would end this process).
     EXPECT_THROW(RequirePositive(-1), Error);
     EXPECT_EQ(mContracts.size(), 1u);
-    EXPECT_EQ(calls, 1);
 }
 
 } // namespace

@@ -7,78 +7,13 @@
 namespace
 {
 
-using mvxcore::utility::AsciiToUTF16;
 using mvxcore::utility::UTF16to8;
 using mvxcore::utility::UTF8to16;
 
 const std::string kR8 = "\xEF\xBF\xBD";
 constexpr char16_t kR = u'\xFFFD';
 
-TEST(StringsTest, WellFormedTextConvertsBothWays)
-{
-    const struct
-    {
-        std::u16string utf16;
-        std::string utf8;
-    } cases[] = {
-        {u"RenderFrame 42", "RenderFrame 42"},
-        {u"", ""},
-        // An embedded zero is a character like any other.
-        {std::u16string(u"a\0b", 3), std::string("a\0b", 3)},
-        {u"\u00E9\u20AC", "\xC3\xA9\xE2\x82\xAC"},
-        {u"\u07FF\u0800\uFFFF", "\xDF\xBF\xE0\xA0\x80\xEF\xBF\xBF"},
-        {{0xD83D, 0xDE00}, "\xF0\x9F\x98\x80"},
-        {{0xDBFF, 0xDFFF}, "\xF4\x8F\xBF\xBF"},
-        {{0xD800, 0xDC00}, "\xF0\x90\x80\x80"},
-    };
-    for (const auto& c : cases)
-    {
-        EXPECT_EQ(UTF16to8(c.utf16), c.utf8);
-        EXPECT_EQ(UTF8to16(c.utf8), c.utf16) << c.utf8;
-    }
-}
-
-TEST(StringsTest, UnpairedSurrogatesAreReplaced)
-{
-    EXPECT_EQ(UTF16to8(std::u16string{u'a', 0xD83D}), "a" + kR8);
-    EXPECT_EQ(UTF16to8(std::u16string{0xDE00, u'b'}), kR8 + "b");
-    EXPECT_EQ(UTF16to8(std::u16string{0xD83D, u'c'}), kR8 + "c");
-    // Reversed order is two lone surrogates.
-    EXPECT_EQ(UTF16to8(std::u16string{0xDE00, 0xD83D}), kR8 + kR8);
-    EXPECT_EQ(UTF16to8(std::u16string{0xD83D, 0xD83D, 0xDE00}), kR8 + "\xF0\x9F\x98\x80");
-}
-
-TEST(StringsTest, EachMaximalIllFormedUTF8SubsequenceIsReplacedOnce)
-{
-    const struct
-    {
-        const char* utf8;
-        std::u16string utf16;
-    } cases[] = {
-        // Lone continuation bytes and bytes that never start a sequence.
-        {"\x80", {kR}},
-        {"\xF5\xFF", {kR, kR}},
-        // Overlong forms, encoded surrogates and values above U+10FFFF.
-        {"\xC0\xAF", {kR, kR}},
-        {"\xE0\x80\xAF", {kR, kR, kR}},
-        {"\xF0\x80\x80\xAF", {kR, kR, kR, kR}},
-        {"\xED\xA0\x80", {kR, kR, kR}},
-        {"\xF4\x90\x80\x80", {kR, kR, kR, kR}},
-        // Cut-off sequences become one replacement each.
-        {"\xE2\x82", {kR}},
-        {"\xE2\x82"
-         "A",
-         {kR, u'A'}},
-        {"\xF0\x9F\x98", {kR}},
-        // The mixed example of the Unicode standard's recommended practice.
-        {"\x61\xF1\x80\x80\xE1\x80\xC2\x62\x80\x63\x80\xBF\x64",
-         {u'a', kR, kR, kR, u'b', kR, u'c', kR, kR, u'd'}},
-    };
-    for (const auto& c : cases)
-        EXPECT_EQ(UTF8to16(c.utf8), c.utf16) << testing::PrintToString(std::string(c.utf8));
-}
-
-TEST(StringsTest, RoundTripsEveryScalarValue)
+TEST(StringsTest, EveryScalarValueRoundTripsAtItsEncodedLength)
 {
     for (char32_t codePoint = 1; codePoint <= 0x10FFFF; ++codePoint)
     {
@@ -91,20 +26,49 @@ TEST(StringsTest, RoundTripsEveryScalarValue)
             utf16 = {static_cast<char16_t>(0xD800 + ((codePoint - 0x10000) >> 10)),
                      static_cast<char16_t>(0xDC00 + ((codePoint - 0x10000) & 0x3FF))};
         const std::string utf8 = UTF16to8(utf16);
-        const size_t expectedLength = codePoint < 0x80      ? 1
-                                      : codePoint < 0x800   ? 2
-                                      : codePoint < 0x10000 ? 3
-                                                            : 4;
-        ASSERT_EQ(utf8.size(), expectedLength) << std::hex << static_cast<uint32_t>(codePoint);
+        const size_t length = codePoint < 0x80      ? 1
+                              : codePoint < 0x800   ? 2
+                              : codePoint < 0x10000 ? 3
+                                                    : 4;
+        ASSERT_EQ(utf8.size(), length) << std::hex << static_cast<uint32_t>(codePoint);
         ASSERT_EQ(UTF8to16(utf8), utf16) << std::hex << static_cast<uint32_t>(codePoint);
     }
+    // An embedded zero is a character like any other.
+    EXPECT_EQ(UTF8to16(std::string("a\0b", 3)), std::u16string(u"a\0b", 3));
+    EXPECT_EQ(UTF16to8(u"\u00E9\u20AC"), "\xC3\xA9\xE2\x82\xAC");
 }
 
-TEST(StringsTest, AsciiWideningReplacesHighBytes)
+TEST(StringsTest, UnpairedSurrogatesAreReplaced)
 {
-    EXPECT_EQ(AsciiToUTF16("Still Image"), u"Still Image");
-    EXPECT_EQ(AsciiToUTF16("A\xE9Z"), std::u16string({u'A', kR, u'Z'}));
-    EXPECT_EQ(AsciiToUTF16(""), u"");
+    EXPECT_EQ(UTF16to8(std::u16string{u'a', 0xD83D}), "a" + kR8);
+    // Reversed order is two lone surrogates.
+    EXPECT_EQ(UTF16to8(std::u16string{0xDE00, 0xD83D}), kR8 + kR8);
+    EXPECT_EQ(UTF16to8(std::u16string{0xD83D, 0xD83D, 0xDE00}), kR8 + "\xF0\x9F\x98\x80");
+}
+
+TEST(StringsTest, EachMaximalIllFormedUTF8SubsequenceIsReplacedOnce)
+{
+    const struct
+    {
+        const char* utf8;
+        std::u16string utf16;
+    } cases[] = {
+        // Bytes that never start a sequence, overlong forms, encoded
+        // surrogates and values above U+10FFFF.
+        {"\xF5\xFF", {kR, kR}},
+        {"\xE0\x80\xAF", {kR, kR, kR}},
+        {"\xF0\x80\x80\xAF", {kR, kR, kR, kR}},
+        {"\xED\xA0\x80", {kR, kR, kR}},
+        {"\xF4\x90\x80\x80", {kR, kR, kR, kR}},
+        // A cut-off sequence becomes one replacement.
+        {"\xF0\x9F\x98", {kR}},
+        // The mixed example of the Unicode standard's recommended practice.
+        {"\x61\xF1\x80\x80\xE1\x80\xC2\x62\x80\x63\x80\xBF\x64",
+         {u'a', kR, kR, kR, u'b', kR, u'c', kR, kR, u'd'}},
+    };
+    for (const auto& c : cases)
+        EXPECT_EQ(UTF8to16(c.utf8), c.utf16) << testing::PrintToString(std::string(c.utf8));
+    EXPECT_EQ(mvxcore::utility::AsciiToUTF16("A\xE9Z"), std::u16string({u'A', kR, u'Z'}));
 }
 
 } // namespace

@@ -2,8 +2,6 @@
 
 #include "mvxcore/config/Error.h"
 
-#include <condition_variable>
-#include <mutex>
 #include <thread>
 #include <vector>
 
@@ -98,31 +96,6 @@ TEST(CriticalSectionTest, RelockingOrUnlockingWithoutHoldingIsAContractViolation
     EXPECT_TRUE(section.IsLockedByCurrentThread());
     lock.Unlock();
     EXPECT_THROW(lock.Unlock(), mvxcore::config::Error);
-}
-
-TEST(CriticalSectionTest, WorksWithStandardLockUtilities)
-{
-    QRT::CriticalSection first;
-    QRT::CriticalSection second;
-    {
-        std::scoped_lock both(first, second);
-        EXPECT_TRUE(first.IsLockedByCurrentThread() && second.IsLockedByCurrentThread());
-    }
-    std::condition_variable_any condition;
-    bool ready = false; // guarded by first
-    std::thread signaller(
-        [&]
-        {
-            std::unique_lock lock(first);
-            ready = true;
-            condition.notify_all();
-        });
-    {
-        std::unique_lock lock(first);
-        condition.wait(lock, [&] { return ready; });
-        EXPECT_TRUE(first.IsLockedByCurrentThread());
-    }
-    signaller.join();
 }
 
 } // namespace

@@ -3,10 +3,7 @@
 #include "QRT/Allocator.h"
 #include "mvxcore/config/Error.h"
 
-#include <map>
 #include <string>
-#include <thread>
-#include <unordered_set>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -83,51 +80,17 @@ TEST_F(ImmutableStringTest, ComparesByTextInUnsignedByteOrderShorterFirst)
     const auto s = [](const char* inText) { return ImmutableString::CreateStatic(inText); };
     const ImmutableString made = ImmutableString::CreateDynamic(std::string("Mot") + "ion");
     EXPECT_EQ(s("Motion"), made);
-    EXPECT_EQ(s("Motion").Compare(made), 0);
     EXPECT_EQ(std::hash<ImmutableString>{}(s("Motion")), std::hash<ImmutableString>{}(made));
     EXPECT_EQ(s("abc").Compare(std::string_view("abc")), 0);
-    EXPECT_LT(s(""), s("a"));
-    EXPECT_TRUE(s("abd") > s("abc"));
     // Each pair is in ascending order.
     const std::pair<const char*, const char*> ascending[] = {
         {"ab", "abc"}, {"B", "a"}, {"z", "\xC3\xA9"}, {"", "a"}};
     for (const auto& [lower, higher] : ascending)
     {
-        SCOPED_TRACE(lower);
-        EXPECT_LT(s(lower).Compare(s(higher)), 0);
-        EXPECT_GT(s(higher).Compare(s(lower)), 0);
+        EXPECT_LT(s(lower).Compare(s(higher)), 0) << lower;
+        EXPECT_GT(s(higher).Compare(s(lower)), 0) << lower;
+        EXPECT_TRUE(s(lower) < s(higher) && s(higher) > s(lower)) << lower;
     }
-
-    std::map<ImmutableString, int> ordered{{s("b"), 2}, {s("a"), 1}, {s("ab"), 3}};
-    std::vector<std::string> keys;
-    for (const auto& [key, value] : ordered)
-        keys.push_back(key.ToStdString());
-    EXPECT_EQ(keys, (std::vector<std::string>{"a", "ab", "b"}));
-    const std::unordered_set<ImmutableString> set{s("one"), ImmutableString::CreateDynamic("one"),
-                                                  ImmutableString::CreateDynamic("two")};
-    EXPECT_EQ(set.size(), 2u);
-    EXPECT_EQ(set.count(ImmutableString::CreateDynamic("two")), 1u);
-}
-
-TEST_F(ImmutableStringTest, CopiesOnManyThreadsKeepTheCountExact)
-{
-    const ImmutableString shared = ImmutableString::CreateDynamic("threaded");
-    std::vector<std::thread> threads;
-    for (int t = 0; t < 4; ++t)
-    {
-        threads.emplace_back(
-            [&shared]
-            {
-                for (int i = 0; i < 10000; ++i)
-                {
-                    const ImmutableString copy = shared;
-                    ASSERT_EQ(copy, "threaded");
-                }
-            });
-    }
-    for (std::thread& thread : threads)
-        thread.join();
-    EXPECT_EQ(shared.GetShareCountForTesting(), 1u);
 }
 
 } // namespace

@@ -123,16 +123,12 @@ TEST_F(ObjectModelTest, QueryAnswersOwnInterfacesParentsAndRootOnlyAndCountsRefe
 {
     QRT::InterfaceRef<Square> concrete = QRT::Allocated<Square>::CreateInstance(3);
     auto* counted = static_cast<QRT::Allocated<Square>*>(concrete.Get());
-    EXPECT_EQ(counted->GetRefCountForTesting(), 1u);
     void* out = reinterpret_cast<void*>(0x1);
     EXPECT_EQ(concrete->QueryInterface(IUnimplemented::kIID, &out), QRT::kResult_NoInterface);
     EXPECT_EQ(out, nullptr);
-    EXPECT_EQ(static_cast<uint32_t>(QRT::kResult_NoInterface), 0xA00A0001u);
     for (const QRT::Guid& iid : {ISquare::kIID, IShape::kIID, INamed::kIID, QRT::QRTUnknown::kIID})
     {
-        out = nullptr;
         ASSERT_EQ(concrete->QueryInterface(iid, &out), QRT::kResult_Success) << iid.ToString();
-        ASSERT_NE(out, nullptr);
         EXPECT_EQ(counted->GetRefCountForTesting(), 2u);
         static_cast<QRT::QRTUnknown*>(static_cast<IShape*>(concrete.Get()))->Release();
     }
@@ -144,7 +140,6 @@ TEST_F(ObjectModelTest, QueryAnswersOwnInterfacesParentsAndRootOnlyAndCountsRefe
         EXPECT_EQ(shape->Area(), 9);
     }
     EXPECT_EQ(counted->GetRefCountForTesting(), 1u);
-    EXPECT_EQ(sLiveObjects.load(), 1);
     concrete.Reset();
     EXPECT_EQ(sLiveObjects.load(), 0);
 
@@ -154,10 +149,15 @@ TEST_F(ObjectModelTest, QueryAnswersOwnInterfacesParentsAndRootOnlyAndCountsRefe
     EXPECT_THROW(QRT::Allocated<Thrower>::Create<IShape>(), std::runtime_error);
 }
 
-TEST_F(ObjectModelTest, ExceptionsCarryExactTexts)
+TEST_F(ObjectModelTest, ComparisonGoesThroughRootInterfacesAndFailuresCarryExactTexts)
 {
     const QRT::InterfaceRef<ISquare> square = QRT::Allocated<Square>::Create<ISquare>(1);
+    const QRT::InterfaceRef<ISquare> other = QRT::Allocated<Square>::Create<ISquare>(1);
     const QRT::InterfaceRef<ISquare> empty;
+    EXPECT_TRUE(square == QRT::InterfaceRef<INamed>(square));
+    EXPECT_FALSE(square == other);
+    EXPECT_NE((square <=> other), std::strong_ordering::equal);
+    EXPECT_TRUE(QRT::InterfaceRef<INamed>() == empty);
     Rootless rootless;
     EXPECT_EQ(
         WhatOf<QRT::InterfaceNotFoundException>([&] { QRT::InterfaceRef<IUnimplemented>{square}; }),
@@ -170,33 +170,17 @@ TEST_F(ObjectModelTest, ExceptionsCarryExactTexts)
               "A comparison of two refs has failed because we are unable to convert one of "
               "them to QRTUnknown.");
     EXPECT_EQ(rootless.mCount, 0u);
-
     // An empty reference converts to an empty one instead of throwing.
     EXPECT_FALSE(QRT::InterfaceRef<IUnimplemented>(empty));
     EXPECT_FALSE(QRT::QueryRef<IUnimplemented>(square));
     EXPECT_TRUE(QRT::QueryRef<INamed>(square));
 }
 
-TEST_F(ObjectModelTest, ComparisonGoesThroughRootInterfaces)
-{
-    const QRT::InterfaceRef<ISquare> square = QRT::Allocated<Square>::Create<ISquare>(1);
-    const QRT::InterfaceRef<ISquare> other = QRT::Allocated<Square>::Create<ISquare>(1);
-    EXPECT_TRUE(square == QRT::InterfaceRef<INamed>(square));
-    EXPECT_FALSE(square == other);
-    EXPECT_NE((square <=> other), std::strong_ordering::equal);
-    EXPECT_TRUE(QRT::InterfaceRef<INamed>() == QRT::InterfaceRef<ISquare>());
-    EXPECT_TRUE(QRT::InterfaceRef<INamed>() == nullptr);
-}
-
 TEST_F(ObjectModelTest, WeakReferenceLocksOnlyWhileAlive)
 {
     QRT::InterfaceRef<INamed> client = QRT::Allocated<Client>::Create<INamed>();
     const QRT::WeakReference<INamed> weak(client);
-    {
-        const QRT::InterfaceRef<INamed> locked = weak.Lock();
-        ASSERT_TRUE(locked);
-        EXPECT_STREQ(locked->Name(), "client");
-    }
+    EXPECT_STREQ(weak.Lock()->Name(), "client");
     client.Reset();
     EXPECT_TRUE(weak.IsExpired());
     EXPECT_FALSE(weak.Lock());
@@ -206,16 +190,14 @@ TEST_F(ObjectModelTest, WeakReferenceLocksOnlyWhileAlive)
 
 TEST_F(ObjectModelTest, WeakLockRacingLastReleaseNeverRevives)
 {
-    constexpr int kLockers = 3;
     for (int round = 0; round < 300; ++round)
     {
         QRT::InterfaceRef<INamed> client = QRT::Allocated<Client>::Create<INamed>();
         const QRT::WeakReference<INamed> weak(client);
-        std::barrier start(kLockers + 1);
-        std::atomic<int> lockedAfterDeath{0};
+        std::barrier start(3);
         std::atomic<bool> released{false};
         std::vector<std::thread> lockers;
-        for (int i = 0; i < kLockers; ++i)
+        for (int i = 0; i < 2; ++i)
         {
             lockers.emplace_back(
                 [&]
@@ -224,13 +206,10 @@ TEST_F(ObjectModelTest, WeakLockRacingLastReleaseNeverRevives)
                     for (int n = 0; n < 50; ++n)
                     {
                         const bool wasReleased = released.load();
-                        if (const QRT::InterfaceRef<INamed> strong = weak.Lock())
-                        {
-                            // A lock that succeeds must see a live object.
-                            EXPECT_STREQ(strong->Name(), "client");
-                            if (wasReleased && sLiveObjects.load() == 0)
-                                ++lockedAfterDeath;
-                        }
+                        // A lock that succeeds must see a live object.
+                        const QRT::InterfaceRef<INamed> strong = weak.Lock();
+                        EXPECT_TRUE(!strong || (!(wasReleased && sLiveObjects.load() == 0) &&
+                                                std::string(strong->Name()) == "client"));
                     }
                 });
         }
@@ -239,33 +218,8 @@ TEST_F(ObjectModelTest, WeakLockRacingLastReleaseNeverRevives)
         released = true;
         for (auto& t : lockers)
             t.join();
-        EXPECT_EQ(lockedAfterDeath.load(), 0);
-        EXPECT_TRUE(weak.IsExpired());
         EXPECT_FALSE(weak.Lock());
-        EXPECT_EQ(sLiveObjects.load(), 0);
     }
-}
-
-TEST_F(ObjectModelTest, CopiesAcrossThreadsBalanceTheCount)
-{
-    const QRT::InterfaceRef<Square> square = QRT::Allocated<Square>::CreateInstance(4);
-    std::vector<std::thread> threads;
-    for (int i = 0; i < 4; ++i)
-    {
-        threads.emplace_back(
-            [square]
-            {
-                for (int n = 0; n < 10000; ++n)
-                {
-                    const QRT::InterfaceRef<IShape> shape(square);
-                    const QRT::InterfaceRef<INamed> named(square);
-                    ASSERT_EQ(shape->Area(), 16);
-                }
-            });
-    }
-    for (auto& t : threads)
-        t.join();
-    EXPECT_EQ(static_cast<QRT::Allocated<Square>*>(square.Get())->GetRefCountForTesting(), 1u);
 }
 
 } // namespace
