@@ -174,6 +174,10 @@ TEST_F(CutlistRendererTest, FullFrameRenderingIsConformedToRequestedSize)
     EXPECT_TRUE(ML::CutlistRenderer::UseRequestedSize(full, mParams));
     EXPECT_EQ(Conform(full, kBGRA, mBGRA)->GetBounds(), QRT::ParamRect(0, 0, 8, 4));
     EXPECT_FALSE(ML::CutlistRenderer::UseRequestedSize(MakeFrame(16, 8, kVUYA), mParams));
+    // A full frame already at the requested size keeps its own.
+    const auto exact = MakeFrame(8, 4, kVUYA);
+    exact->SetFullFrameRect(QRT::ParamRect(0, 0, 8, 4));
+    EXPECT_FALSE(ML::CutlistRenderer::UseRequestedSize(exact, mParams));
 }
 
 TEST_F(CutlistRendererTest, FrameConformsByBoundsRatioFullFrameAndFieldUse)
