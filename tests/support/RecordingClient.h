@@ -29,27 +29,27 @@ struct Delivery
     std::intptr_t mContext = 0;
     QRT::InterfaceRef<MF::IVideoFrame> mFrame;
     int mStatus = 0;
-    std::int32_t mMilliseconds = 0;
     QRT::InterfaceRef<ML::IRenderableSource> mSource;
 };
 
 class DeliveryRecorder
 {
 public:
+    using FrameRef = QRT::InterfaceRef<MF::IVideoFrame>;
+
     // A completion function of request inRequestID.
     ML::RenderCompletionFunction For(std::uint32_t inRequestID)
     {
-        return [this, inRequestID](QRT::InterfaceRef<MF::IVideoFrame> inFrame, bool inCancelled,
-                                   int inStatus) {
-            Add({KindOf(inFrame, inCancelled), inRequestID, 0, inFrame, inStatus, 0, {}});
+        return [this, inRequestID](FrameRef inFrame, bool inCancelled, int inStatus) {
+            Add({KindOf(inFrame, inCancelled), inRequestID, 0, inFrame, inStatus, {}});
         };
     }
     ML::InitiateRenderCallback Callback()
     {
-        return [this](QRT::InterfaceRef<MF::IVideoFrame> inFrame, unsigned int inRequestID,
+        return [this](FrameRef inFrame, unsigned int inRequestID,
                       QRT::InterfaceRef<ML::IRenderableSource> inSource, bool inCancelled,
                       int inStatus) {
-            Add({KindOf(inFrame, inCancelled), inRequestID, 0, inFrame, inStatus, 0, inSource});
+            Add({KindOf(inFrame, inCancelled), inRequestID, 0, inFrame, inStatus, inSource});
         };
     }
 
@@ -72,11 +72,7 @@ public:
                 found.push_back(delivery);
         return found;
     }
-    std::size_t Count()
-    {
-        std::lock_guard lock(mMutex);
-        return mDeliveries.size();
-    }
+    std::size_t Count() { return Get().size(); }
     bool WaitForCount(std::size_t inCount,
                       std::chrono::milliseconds inLimit = std::chrono::seconds(20))
     {
@@ -84,8 +80,7 @@ public:
     }
 
 private:
-    static Delivery::Kind KindOf(const QRT::InterfaceRef<MF::IVideoFrame>& inFrame,
-                                 bool inCancelled)
+    static Delivery::Kind KindOf(const FrameRef& inFrame, bool inCancelled)
     {
         return inCancelled ? Delivery::kCancelled
                : inFrame   ? Delivery::kComplete
@@ -104,20 +99,19 @@ public:
 
     void OnRenderFrameComplete(std::intptr_t inContext, std::uint32_t inRequestID,
                                mvxmediatypes::TickTime, QRT::InterfaceRef<MF::IVideoFrame> inFrame,
-                               std::int32_t inMilliseconds) override
+                               std::int32_t) override
     {
-        mRecorder.Add(
-            {Delivery::kComplete, inRequestID, inContext, inFrame, 0, inMilliseconds, {}});
+        mRecorder.Add({Delivery::kComplete, inRequestID, inContext, inFrame, 0, {}});
     }
     void OnRenderFrameCancelled(std::intptr_t inContext, std::uint32_t inRequestID,
                                 mvxmediatypes::TickTime) override
     {
-        mRecorder.Add({Delivery::kCancelled, inRequestID, inContext, {}, 0, 0, {}});
+        mRecorder.Add({Delivery::kCancelled, inRequestID, inContext, {}, 0, {}});
     }
     void OnRenderFrameError(std::intptr_t inContext, std::uint32_t inRequestID,
                             mvxmediatypes::TickTime, QRT::Result inStatus) override
     {
-        mRecorder.Add({Delivery::kError, inRequestID, inContext, {}, inStatus, 0, {}});
+        mRecorder.Add({Delivery::kError, inRequestID, inContext, {}, inStatus, {}});
     }
 };
 

@@ -1,20 +1,14 @@
 #pragma once
 
-// A prefetch handle whose frame the test hands over (Complete), that
-// completes by itself after a number of polls, or whose frame arrives on an
-// executor's thread a delay after InitiatePrefetch. Until then it never
+// A prefetch handle whose frame the test hands over (Complete), or that
+// completes by itself after a number of polls. Until then it never
 // completes. Every call may come from any thread.
 
 #include "ML/IRenderableNodePrefetch.h"
 #include "QRT/Allocated.h"
-#include "VF/VideoFrame.h"
-#include "mvxcore/threads/AsyncThreadedExecutor.h"
 
 #include <atomic>
-#include <chrono>
 #include <mutex>
-
-#include <boost/shared_ptr.hpp>
 
 namespace vrtest
 {
@@ -23,15 +17,6 @@ class TestPrefetch : public QRT::Implements<ML::IRenderableNodePrefetch>
 {
 public:
     using FrameRef = QRT::InterfaceRef<MF::IVideoFrame>;
-
-    TestPrefetch() = default;
-    // The frame arrives on inExecutor's thread inDelay after InitiatePrefetch.
-    TestPrefetch(boost::shared_ptr<mvxcore::threads::AsyncThreadedExecutor> inExecutor,
-                 std::chrono::milliseconds inDelay)
-        : mExecutor(std::move(inExecutor))
-        , mDelay(inDelay)
-    {
-    }
 
     // When positive, the handle completes by itself after this many polls.
     std::atomic<int> mPollsUntilComplete{0};
@@ -50,27 +35,10 @@ public:
         mComplete = true;
     }
     bool IsComplete() const { return mComplete.load(); }
-    FrameRef Frame()
-    {
-        std::lock_guard lock(mMutex);
-        return mFrame;
-    }
 
     QRT::Result InitiatePrefetch() override
     {
         ++mInitiateCount;
-        if (mExecutor)
-        {
-            QRT::InterfaceRef<TestPrefetch> self(this);
-            mExecutor->Post(
-                [self]
-                {
-                    self->Complete(VF::CreateVideoFrame(mvxmediatypes::kPixelFormat_BGRA_4444_8u, 4,
-                                                        4, mvxmediatypes::kPixelAspectRatio_Square,
-                                                        true, false));
-                },
-                static_cast<int>(mDelay.count()));
-        }
         return QRT::kResult_Success;
     }
     QRT::Result GetPrefetchedFrame(FrameRef& outFrame) override
@@ -79,7 +47,8 @@ public:
             mComplete = true;
         if (!mComplete.load())
             return QRT::kResult_NotFound;
-        outFrame = Frame();
+        std::lock_guard lock(mMutex);
+        outFrame = mFrame;
         return QRT::kResult_Success;
     }
     QRT::Result CancelPrefetch() override
@@ -95,8 +64,6 @@ public:
     }
 
 private:
-    const boost::shared_ptr<mvxcore::threads::AsyncThreadedExecutor> mExecutor;
-    const std::chrono::milliseconds mDelay{0};
     std::atomic<bool> mComplete{false};
     // Guards mFrame.
     std::mutex mMutex;

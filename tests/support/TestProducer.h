@@ -53,7 +53,8 @@ public:
     std::chrono::microseconds mLatency{0};
     ProducerFailure mFailure = ProducerFailure::kNone;
     QRT::Result mFailureStatus = static_cast<QRT::Result>(0xA0990001u);
-    // Called at the start of ProduceFrame, and at its end with the opposite flag.
+    // Called at the start of ProduceFrame, and with the opposite flag at its
+    // end unless it throws.
     std::function<void(bool inStarting)> mObserver;
     std::atomic<int> mProduceCount{0};
     std::atomic<int> mHashCount{0};
@@ -71,19 +72,31 @@ public:
         }
         if (mObserver)
             mObserver(true);
-        struct End
-        {
-            TestProducer& mProducer;
-            ~End()
-            {
-                if (mProducer.mObserver)
-                    mProducer.mObserver(false);
-            }
-        } end{*this};
+        const QRT::Result result = Produce(inParams, outFrame);
+        if (mObserver)
+            mObserver(false);
+        return result;
+    }
+
+    void GetFrameHash(QRT::Guid& outHash, const MF::FrameTime&,
+                      const ML::CutlistRenderParams&) override
+    {
+        ++mHashCount;
+        outHash = mHash;
+    }
+
+    ML::CutlistRenderParams LastParams()
+    {
+        std::lock_guard lock(mMutex);
+        return mLastParams;
+    }
+
+private:
+    QRT::Result Produce(const ML::CutlistRenderParams& inParams, FrameRef& outFrame)
+    {
         if (mGate)
             mGate->Wait();
-        if (mLatency.count() > 0)
-            std::this_thread::sleep_for(mLatency);
+        std::this_thread::sleep_for(mLatency);
         switch (mFailure)
         {
         case ProducerFailure::kStatus:
@@ -107,20 +120,6 @@ public:
         return QRT::kResult_Success;
     }
 
-    void GetFrameHash(QRT::Guid& outHash, const MF::FrameTime&,
-                      const ML::CutlistRenderParams&) override
-    {
-        ++mHashCount;
-        outHash = mHash;
-    }
-
-    ML::CutlistRenderParams LastParams()
-    {
-        std::lock_guard lock(mMutex);
-        return mLastParams;
-    }
-
-private:
     // Guards mLastParams.
     std::mutex mMutex;
     ML::CutlistRenderParams mLastParams;

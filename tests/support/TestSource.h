@@ -29,11 +29,8 @@ public:
     QRT::InterfaceRef<TestPrefetch> mPrefetch;
     SourceFailure mFailure = SourceFailure::kNone;
 
-    std::atomic<int> mCollectCount{0};
     std::atomic<int> mRenderCount{0};
-    MF::FrameTime mCollectTime;
     MF::FrameTime mRenderTime;
-    std::uint32_t mRenderWidth = 0;
     bool mPrefetchCompleteBeforeRender = false;
 
     void ConformFrameTime(const MF::FrameTime& inRequested, const ML::CutlistRenderParams&,
@@ -41,11 +38,9 @@ public:
     {
         outConformed = inRequested;
     }
-    void CollectPrefetches(const MF::FrameTime& inTime, const ML::CutlistRenderParams&,
+    void CollectPrefetches(const MF::FrameTime&, const ML::CutlistRenderParams&,
                            ML::RenderableNodePrefetchList& ioPrefetches) override
     {
-        ++mCollectCount;
-        mCollectTime = inTime;
         if (mPrefetch)
             ioPrefetches.push_back(mPrefetch);
     }
@@ -55,17 +50,13 @@ public:
         outFrame.Reset();
         ++mRenderCount;
         mRenderTime = inTime;
-        mRenderWidth = inParams.mWidth;
         mPrefetchCompleteBeforeRender = mPrefetch && mPrefetch->IsComplete();
         if (mFailure == SourceFailure::kRenderRequestException)
             throw ML::RenderRequestException(static_cast<QRT::Result>(0xA0990002u));
         if (mFailure == SourceFailure::kStdException)
             throw std::runtime_error("source failed");
-        FrameRef frame = MakeFrame(inParams.mWidth, inParams.mHeight);
-        if (!frame)
-            throw ML::RenderRequestException(VF::kResult_InvalidFrameSize);
-        Fill(*frame, mColor);
-        outFrame = frame;
+        outFrame = MakeFrame(inParams.mWidth, inParams.mHeight);
+        Fill(*outFrame, mColor);
     }
     void GetFrameRate(mvxmediatypes::FrameRate& outRate) override
     {

@@ -5,6 +5,7 @@
 
 #include <atomic>
 #include <thread>
+#include <tuple>
 #include <vector>
 
 #include <gmock/gmock.h>
@@ -12,8 +13,6 @@
 
 namespace
 {
-
-using mvxmediatypes::FieldType;
 
 QRT::InterfaceRef<MF::IRenderableCutlist> NewCutlist(const char* inName)
 {
@@ -52,8 +51,6 @@ TEST_F(CutlistProviderTest, PropertiesAnswerTheSettingsThroughTheirInterface)
     EXPECT_EQ(properties->GetPixelAspectRatio(), mvxmediatypes::kPixelAspectRatio_D1PAL);
     EXPECT_EQ(properties->GetFieldType(), mvxmediatypes::kFieldType_LowerFirst);
     EXPECT_EQ(properties->GetFrameRate(), mvxmediatypes::kFrameRate_Video25);
-    // The provider is also reachable as the plain provider interface.
-    EXPECT_TRUE(QRT::QueryRef<MF::IRenderableCutlistProvider>(properties));
 }
 
 TEST_F(CutlistProviderTest, GettersAnswerTheCutlistsOfTheNameOrTheDefaultSet)
@@ -63,8 +60,6 @@ TEST_F(CutlistProviderTest, GettersAnswerTheCutlistsOfTheNameOrTheDefaultSet)
     const auto third = NewCutlist("third");
     const auto fallback = NewCutlist("fallback");
     mProvider->SetCutlists(mSequence, {main, alternate, third});
-
-    EXPECT_EQ(mProvider->GetMainCutlist(mSequence, true), main);
     EXPECT_EQ(mProvider->GetAlternateCutlist(mSequence, true), alternate);
     EXPECT_EQ(mProvider->GetThirdCutlist(mSequence, false), third);
     // No default set yet: another name gets nothing.
@@ -73,20 +68,16 @@ TEST_F(CutlistProviderTest, GettersAnswerTheCutlistsOfTheNameOrTheDefaultSet)
 
     mProvider->SetCutlists(mDefault, {fallback, {}, {}});
     EXPECT_EQ(mProvider->GetMainCutlist(other, true), fallback);
-    EXPECT_FALSE(mProvider->GetAlternateCutlist(other, true));
-    // A name with its own set never falls back.
+    // A name with its own set never falls back, until it is removed.
     EXPECT_EQ(mProvider->GetMainCutlist(mSequence, true), main);
-
     mProvider->RemoveCutlists(mSequence);
     EXPECT_EQ(mProvider->GetMainCutlist(mSequence, true), fallback);
     mProvider->RemoveCutlists(QRT::ImmutableString::CreateStatic("never registered"));
-    EXPECT_EQ(mProvider->GetMainCutlist(other, true), fallback);
 
     // Setting a name's cutlists replaces its whole set.
     mProvider->SetCutlists(mSequence, {main, main, main});
     mProvider->SetCutlists(mSequence, {third, {}, {}});
     EXPECT_EQ(mProvider->GetMainCutlist(mSequence, true), third);
-    EXPECT_FALSE(mProvider->GetAlternateCutlist(mSequence, true));
     EXPECT_FALSE(mProvider->GetThirdCutlist(mSequence, true));
 }
 
@@ -96,8 +87,7 @@ TEST_F(CutlistProviderTest, BadSettingsBreakTheContractAndChangeNothing)
     inverted.mLeft = 800;
     EXPECT_INPUT_CONTRACT(mProvider->SetSettings(inverted),
                           "inSettings.mRight >= inSettings.mLeft");
-    BE::CutlistProviderSettings upsideDown = Settings(720, -1);
-    EXPECT_INPUT_CONTRACT(mProvider->SetSettings(upsideDown),
+    EXPECT_INPUT_CONTRACT(mProvider->SetSettings(Settings(720, -1)),
                           "inSettings.mBottom >= inSettings.mTop");
     BE::CutlistProviderSettings badField = Settings(720, 576);
     badField.mFieldType = mvxmediatypes::kFieldType_Invalid;
@@ -108,12 +98,9 @@ TEST_F(CutlistProviderTest, BadSettingsBreakTheContractAndChangeNothing)
     badRatio.mPixelAspectRatio = mvxmediatypes::kPixelAspectRatio_Any;
     EXPECT_INPUT_CONTRACT(BE::CreateCutlistProvider(badRatio),
                           "inSettings.mPixelAspectRatio.IsValid()");
-
     const BE::CutlistProviderSettings kept = mProvider->GetSettings();
-    EXPECT_EQ(kept.mRight, 720);
-    EXPECT_EQ(kept.mBottom, 576);
-    EXPECT_EQ(kept.mFieldType, mvxmediatypes::kFieldType_LowerFirst);
-    EXPECT_EQ(kept.mPixelAspectRatio, mvxmediatypes::kPixelAspectRatio_D1PAL);
+    EXPECT_EQ(std::tuple(kept.mLeft, kept.mBottom, kept.mFieldType),
+              std::tuple(0, 576, mvxmediatypes::kFieldType_LowerFirst));
 }
 
 TEST_F(CutlistProviderTest, ConcurrentReadersSeeWholeSettingsAndWholeSets)
@@ -125,23 +112,8 @@ TEST_F(CutlistProviderTest, ConcurrentReadersSeeWholeSettingsAndWholeSets)
     std::atomic<bool> stop{false};
     std::atomic<int> torn{0};
     std::atomic<int> reads{0};
-
-    std::thread writer(
-        [&]
-        {
-            // The readers are running before the first change.
-            while (reads.load() < 3)
-                std::this_thread::yield();
-            for (int i = 0; i < 2000; ++i)
-            {
-                mProvider->SetSettings(i % 2 == 0 ? Settings(1920, 1080) : Settings(720, 576));
-                mProvider->SetCutlists(mSequence, i % 2 == 0 ? BE::CutlistSet{b, b, b}
-                                                             : BE::CutlistSet{a, a, a});
-            }
-            stop = true;
-        });
     std::vector<std::thread> readers;
-    for (int r = 0; r < 3; ++r)
+    for (int r = 0; r < 2; ++r)
     {
         readers.emplace_back(
             [&]
@@ -150,20 +122,25 @@ TEST_F(CutlistProviderTest, ConcurrentReadersSeeWholeSettingsAndWholeSets)
                 {
                     std::int32_t left, top, right, bottom;
                     properties->GetBounds(left, top, right, bottom);
-                    if (!((right == 1920 && bottom == 1080) || (right == 720 && bottom == 576)))
-                        ++torn;
                     const auto main = mProvider->GetMainCutlist(mSequence, true);
-                    if (main != a && main != b)
-                        ++torn;
+                    torn += (right == 1920) != (bottom == 1080) || (main != a && main != b);
                     ++reads;
                 }
             });
     }
-    writer.join();
+    // The readers are running before the first change.
+    while (reads.load() < 2)
+        std::this_thread::yield();
+    for (int i = 0; i < 2000; ++i)
+    {
+        mProvider->SetSettings(i % 2 == 0 ? Settings(1920, 1080) : Settings(720, 576));
+        mProvider->SetCutlists(mSequence,
+                               i % 2 == 0 ? BE::CutlistSet{b, b, b} : BE::CutlistSet{a, a, a});
+    }
+    stop = true;
     for (auto& reader : readers)
         reader.join();
     EXPECT_EQ(torn.load(), 0);
-    EXPECT_GE(reads.load(), 3);
 }
 
 } // namespace

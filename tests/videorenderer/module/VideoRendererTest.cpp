@@ -1,17 +1,14 @@
 #include "ML/VideoRenderer.h"
 
-#include "BE/VideoSources.h"
 #include "BrambleSupport/BrambleSupport.h"
 #include "ContractExpect.h"
 #include "ImporterHost/ImporterHost.h"
 #include "ML/RenderExecutors.h"
 #include "ML/RenderFrameQueue.h"
-#include "ML/RenderableVideoSources.h"
 #include "RecordingClient.h"
 #include "TestSource.h"
 #include "module/ModuleInternals.h"
 #include "mvxcore/debug/Contract.h"
-#include "mvxcore/threads/ExecutorFactories.h"
 
 #include <mutex>
 #include <string>
@@ -26,9 +23,9 @@ namespace
 using namespace vrtest;
 using mvxmediatypes::TickTime;
 
-// Prefetch delays of NewSource that are no delay.
-constexpr int kNoPrefetch = -2;
-constexpr int kNeverArrives = -1;
+// Prefetch polls of NewSource that are no prefetch, or one that never arrives.
+constexpr int kNoPrefetch = -1;
+constexpr int kNeverArrives = 0;
 
 class VideoRendererTest : public ::testing::Test
 {
@@ -39,7 +36,6 @@ protected:
         ASSERT_EQ(BrambleSupport::GetInitializeCount(), 0);
         mConstructions = ML::RenderFrameQueue::GetConstructionCount();
         mSessions = ImporterHost::GetSessionCount();
-        mPrefetchExecutor = mvxcore::threads::CreateThreadPoolExecutor(1);
         mPreviousAssertHook = mvxcore::debug::SetAssertHook(
             [this](const mvxcore::debug::AssertFailure& inFailure)
             {
@@ -53,27 +49,20 @@ protected:
     {
         while (ML::ModuleInternals::GetInitializationCount() > 0)
             ML::VideoRenderer::Shutdown();
-        // Pending arrivals hold their handles: drop them before the handles'
-        // owners go.
-        mPrefetchExecutor->BeginShutdown();
-        mPrefetchExecutor->DiscardPendingTasks();
-        mPrefetchExecutor->WaitForRunningTasks();
         mvxcore::debug::SetAssertHook(mPreviousAssertHook);
         EXPECT_EQ(BrambleSupport::GetInitializeCount(), 0);
     }
 
-    // A source whose prefetch frame arrives inDelayMs after it is started
-    // (or never, or that has no prefetch).
-    QRT::InterfaceRef<TestSource> NewSource(int inDelayMs)
+    // A source whose prefetch frame arrives after inPolls polls (or never,
+    // or that has no prefetch).
+    static QRT::InterfaceRef<TestSource> NewSource(int inPolls)
     {
         auto source = QRT::Allocated<TestSource>::CreateInstance();
-        if (inDelayMs == kNeverArrives)
-            source->mPrefetch = QRT::Allocated<TestPrefetch>::CreateInstance();
-        else if (inDelayMs >= 0)
-            source->mPrefetch = QRT::Allocated<TestPrefetch>::CreateInstance(
-                mPrefetchExecutor, std::chrono::milliseconds(inDelayMs));
-        if (source->mPrefetch)
-            source->mPrefetch->mWantMoreTime = true;
+        if (inPolls == kNoPrefetch)
+            return source;
+        source->mPrefetch = QRT::Allocated<TestPrefetch>::CreateInstance();
+        source->mPrefetch->mPollsUntilComplete = inPolls;
+        source->mPrefetch->mWantMoreTime = true;
         return source;
     }
 
@@ -103,17 +92,20 @@ protected:
         return answers[0];
     }
 
-    // Renders one 16x8 frame of a source with a prefetch arriving after
-    // inDelayMs and checks everything the callback receives.
-    void RenderOneFrameAndCheck(int inDelayMs)
+    // Renders one frame of a source whose prefetch arrives after inPolls
+    // polls and checks its pixels.
+    void RenderOneFrameAndCheck(int inPolls)
     {
-        auto source = NewSource(inDelayMs);
+        auto source = NewSource(inPolls);
         const unsigned int id = ML::GetNextRequestID();
-        Initiate(source, id, MF::FrameTime(TickTime::TicksToTime(5000)), 16, 8);
+        Initiate(source, id);
         const Delivery answer = Answer(id, source);
         EXPECT_EQ(answer.mKind, Delivery::kComplete);
         EXPECT_TRUE(IsFilledWith(answer.mFrame, source->mColor));
+        // Rendered once, after the prefetch, at the parameters' frame time.
         EXPECT_EQ(source->mRenderCount.load(), 1);
+        EXPECT_TRUE(source->mPrefetchCompleteBeforeRender);
+        EXPECT_EQ(source->mRenderTime, MF::FrameTime(TickTime::TicksToTime(1000)));
     }
 
     std::vector<std::string> Asserts()
@@ -124,7 +116,6 @@ protected:
 
     std::uint64_t mConstructions = 0;
     std::uint32_t mSessions = 0;
-    boost::shared_ptr<mvxcore::threads::AsyncThreadedExecutor> mPrefetchExecutor;
     DeliveryRecorder mRecorder;
     // Guards mAsserts.
     std::mutex mAssertMutex;
@@ -138,17 +129,14 @@ TEST_F(VideoRendererTest, TwoInitializeCallsNeedTwoShutdownCalls)
 {
     EXPECT_EQ(ML::VideoRenderer::Initialize(), 0);
     EXPECT_EQ(ML::VideoRenderer::Initialize(), 0);
-    EXPECT_EQ(ML::ModuleInternals::GetInitializationCount(), 2);
-    // The suite support library follows every call one for one.
+    // The suite support library follows every call one for one; only the
+    // first call brought the module up.
     EXPECT_EQ(BrambleSupport::GetInitializeCount(), 2);
-    // Only the first call brought the module up.
     EXPECT_EQ(ML::RenderFrameQueue::GetConstructionCount(), mConstructions + 1);
     EXPECT_EQ(ImporterHost::GetSessionCount(), mSessions + 1);
     EXPECT_EQ(ImporterHost::GetInitializeCount(), 1);
-    EXPECT_FALSE(ML::IsRenderModuleShuttingDown());
 
     EXPECT_EQ(ML::VideoRenderer::Shutdown(), 0);
-    EXPECT_EQ(ML::ModuleInternals::GetInitializationCount(), 1);
     EXPECT_EQ(BrambleSupport::GetInitializeCount(), 1);
     // Still up: the queue is running and the importer host open.
     EXPECT_FALSE(ML::IsRenderModuleShuttingDown());
@@ -156,7 +144,6 @@ TEST_F(VideoRendererTest, TwoInitializeCallsNeedTwoShutdownCalls)
     RenderOneFrameAndCheck(1);
 
     EXPECT_EQ(ML::VideoRenderer::Shutdown(), 0);
-    EXPECT_EQ(ML::ModuleInternals::GetInitializationCount(), 0);
     EXPECT_TRUE(ML::IsRenderModuleShuttingDown());
     EXPECT_FALSE(ImporterHost::IsSessionOpen());
     EXPECT_TRUE(Asserts().empty());
@@ -167,17 +154,12 @@ TEST_F(VideoRendererTest, UnbalancedShutdownLeavesEverythingAsItWasAndReports)
     // Another user of the suite support library, whose count must survive.
     BrambleSupport::Initialize();
     EXPECT_EQ(ML::VideoRenderer::Shutdown(), 0);
-    EXPECT_EQ(ML::ModuleInternals::GetInitializationCount(), 0);
     EXPECT_EQ(BrambleSupport::GetInitializeCount(), 1);
-    ASSERT_EQ(Asserts().size(), 1u);
-    EXPECT_EQ(Asserts()[0],
-              "sInitializationCount > 0 | VideoRenderer::Shutdown without a matching Initialize.");
-
+    EXPECT_EQ(Asserts(), std::vector<std::string>{"sInitializationCount > 0 | VideoRenderer::"
+                                                  "Shutdown without a matching Initialize."});
     // The count did not go negative: the next Initialize brings the module up.
     ML::VideoRenderer::Initialize();
     EXPECT_EQ(ML::RenderFrameQueue::GetConstructionCount(), mConstructions + 1);
-    EXPECT_EQ(ImporterHost::GetSessionCount(), mSessions + 1);
-    RenderOneFrameAndCheck(1);
     ML::VideoRenderer::Shutdown();
     EXPECT_EQ(BrambleSupport::GetInitializeCount(), 1);
     BrambleSupport::Shutdown();
@@ -185,41 +167,33 @@ TEST_F(VideoRendererTest, UnbalancedShutdownLeavesEverythingAsItWasAndReports)
 
 TEST_F(VideoRendererTest, SeveralCyclesInOneProcessRenderInEveryCycleOnNewExecutors)
 {
-    // The last shutdown stops the shared executors (the queue the render
-    // executors, the prefetch flush the prefetch executors); the next
-    // Initialize makes new ones.
-    const auto expectShutDown = [](bool inShutDown)
-    {
-        for (const ML::ExecutorRef* slot :
-             {&ML::sNormalPriorityRenderQueue, &ML::sLowPriorityRenderQueue,
-              &ML::sVideoSourcePrefetcherQueue, &ML::sImageSourcePrefetcherQueue})
-        {
-            const ML::ExecutorRef executor = boost::atomic_load(slot);
-            EXPECT_TRUE(inShutDown ? !executor || executor->IsShutDown()
-                                   : executor && !executor->IsShutDown());
-        }
-    };
-    ML::ExecutorRef previous[2];
+    // The last shutdown stops the shared executors; the next Initialize
+    // makes new ones.
+    const ML::ExecutorRef* slots[] = {&ML::sNormalPriorityRenderQueue, &ML::sLowPriorityRenderQueue,
+                                      &ML::sVideoSourcePrefetcherQueue,
+                                      &ML::sImageSourcePrefetcherQueue};
+    ML::ExecutorRef previous;
     for (int cycle = 1; cycle <= 3; ++cycle)
     {
         SCOPED_TRACE(cycle);
         ASSERT_EQ(ML::VideoRenderer::Initialize(), 0);
-        expectShutDown(false);
-        const ML::ExecutorRef current[2] = {boost::atomic_load(&ML::sNormalPriorityRenderQueue),
-                                            boost::atomic_load(&ML::sVideoSourcePrefetcherQueue)};
-        EXPECT_NE(current[0], previous[0]);
-        EXPECT_NE(current[1], previous[1]);
-        previous[0] = current[0];
-        previous[1] = current[1];
-        EXPECT_EQ(ML::RenderFrameQueue::GetConstructionCount(), mConstructions + cycle);
+        for (const ML::ExecutorRef* slot : slots)
+        {
+            const ML::ExecutorRef executor = boost::atomic_load(slot);
+            EXPECT_TRUE(executor && !executor->IsShutDown());
+        }
+        EXPECT_NE(boost::atomic_load(slots[2]), previous);
+        previous = boost::atomic_load(slots[2]);
         EXPECT_EQ(ImporterHost::GetSessionCount(), mSessions + cycle);
-        RenderOneFrameAndCheck(5 * cycle);
-        RenderOneFrameAndCheck(0);
+        RenderOneFrameAndCheck(cycle);
         ASSERT_EQ(ML::VideoRenderer::Shutdown(), 0);
-        expectShutDown(true);
-        EXPECT_TRUE(ML::IsRenderModuleShuttingDown());
-        EXPECT_EQ(BrambleSupport::GetInitializeCount(), 0);
+        for (const ML::ExecutorRef* slot : slots)
+        {
+            const ML::ExecutorRef executor = boost::atomic_load(slot);
+            EXPECT_TRUE(!executor || executor->IsShutDown());
+        }
     }
+    EXPECT_EQ(ML::RenderFrameQueue::GetConstructionCount(), mConstructions + 3);
     EXPECT_TRUE(Asserts().empty());
 }
 
@@ -233,25 +207,18 @@ TEST_F(VideoRendererTest, ConcurrentBalancedCallsKeepTheModuleUp)
             []
             {
                 for (int i = 0; i < 200; ++i)
-                {
-                    EXPECT_EQ(ML::VideoRenderer::Initialize(), 0);
-                    EXPECT_EQ(ML::VideoRenderer::Shutdown(), 0);
-                }
+                    EXPECT_EQ(ML::VideoRenderer::Initialize() + ML::VideoRenderer::Shutdown(), 0);
             });
     }
     for (std::thread& thread : threads)
         thread.join();
-    EXPECT_EQ(ML::ModuleInternals::GetInitializationCount(), 1);
-    EXPECT_EQ(BrambleSupport::GetInitializeCount(), 1);
     // The first caller held the module up throughout: one queue, one session.
+    EXPECT_EQ(BrambleSupport::GetInitializeCount(), 1);
     EXPECT_EQ(ML::RenderFrameQueue::GetConstructionCount(), mConstructions + 1);
     EXPECT_EQ(ImporterHost::GetSessionCount(), mSessions + 1);
     // Enabling accelerated rendering leaves the module as it was.
     ML::VideoRenderer::EnableAcceleratedRendering();
-    ML::VideoRenderer::EnableAcceleratedRendering();
     EXPECT_EQ(ML::ModuleInternals::GetInitializationCount(), 1);
-    RenderOneFrameAndCheck(1);
-    ML::VideoRenderer::Shutdown();
 }
 
 // --- Suite families -----------------------------------------------------------
@@ -273,10 +240,7 @@ TEST_F(VideoRendererTest, SuiteFamilyRegistersEveryVersionAndChecksTheLastResult
                                                          &kTestSuiteTable),
               0);
     for (const std::int32_t version : {2, 3, 4})
-    {
         EXPECT_EQ(BrambleSupport_AcquireSuite("Test Family Suite", version), &kTestSuiteTable);
-        EXPECT_EQ(BrambleSupport_ReleaseSuite("Test Family Suite", version), 0);
-    }
     // Only the last registration counts: a duplicate first version is not seen.
     EXPECT_EQ(
         ML::ModuleInternals::RegisterSuiteVersions("Test Family Suite", {2, 5}, &kTestSuiteTable),
@@ -287,11 +251,7 @@ TEST_F(VideoRendererTest, SuiteFamilyRegistersEveryVersionAndChecksTheLastResult
     EXPECT_OUTPUT_CONTRACT(
         ML::ModuleInternals::RegisterSuiteFamily("Test Family Suite", {4}, &kTestSuiteTable),
         "result == 0");
-    EXPECT_OUTPUT_CONTRACT(ML::ModuleInternals::RegisterSuiteFamily("", {1}, &kTestSuiteTable),
-                           "result == 0");
-    EXPECT_NO_THROW(
-        ML::ModuleInternals::RegisterSuiteFamily("Second Family Suite", {1}, &kTestSuiteTable));
-    EXPECT_EQ(BrambleSupport::GetSuiteCount(), 6u);
+    EXPECT_EQ(BrambleSupport::GetSuiteCount(), 5u);
 
     // The module's last shutdown is the suite support library's last: every
     // suite is withdrawn and the next session can register them again.
@@ -300,37 +260,9 @@ TEST_F(VideoRendererTest, SuiteFamilyRegistersEveryVersionAndChecksTheLastResult
     ML::VideoRenderer::Initialize();
     EXPECT_NO_THROW(
         ML::ModuleInternals::RegisterSuiteFamily("Test Family Suite", {2, 3}, &kTestSuiteTable));
-    ML::VideoRenderer::Shutdown();
 }
 
 // --- InitiateRender and CancelRender ------------------------------------------
-
-TEST_F(VideoRendererTest, RendersTheSourceOnceItsPrefetchHasArrived)
-{
-    ML::VideoRenderer::Initialize();
-    auto source = NewSource(30);
-    source->mColor = {0x11, 0x22, 0x33, 0x44};
-    // An interlaced frame time: the request goes by the earlier field.
-    const MF::FrameTime frameTime(TickTime::TicksToTime(8000), TickTime::TicksToTime(6000));
-    Initiate(source, 4242, frameTime, 16, 8);
-    EXPECT_EQ(source->mCollectCount.load(), 1);
-    EXPECT_EQ(source->mCollectTime, frameTime);
-    const Delivery answer = Answer(4242, source);
-    EXPECT_EQ(answer.mKind, Delivery::kComplete);
-    EXPECT_TRUE(IsFilledWith(answer.mFrame, source->mColor));
-    ASSERT_TRUE(answer.mFrame);
-    EXPECT_EQ(answer.mFrame->GetBounds(), QRT::ParamRect(0, 0, 16, 8));
-    // Rendered once, after the prefetch, with the parameters' own frame time.
-    EXPECT_EQ(source->mPrefetch->mInitiateCount.load(), 1);
-    EXPECT_EQ(source->mRenderCount.load(), 1);
-    EXPECT_TRUE(source->mPrefetchCompleteBeforeRender);
-    EXPECT_EQ(source->mRenderTime, frameTime);
-    EXPECT_EQ(source->mRenderWidth, 16u);
-    // Exactly once: nothing more arrives by the time the module is down.
-    ML::VideoRenderer::Shutdown();
-    EXPECT_EQ(mRecorder.Count(), 1u);
-    EXPECT_TRUE(Asserts().empty());
-}
 
 TEST_F(VideoRendererTest, SourceOutcomesReachTheCallbackOnce)
 {
@@ -340,38 +272,36 @@ TEST_F(VideoRendererTest, SourceOutcomesReachTheCallbackOnce)
     // delivered, and the queue keeps working.
     const struct
     {
-        int mDelayMs;
+        int mPolls;
         SourceFailure mFailure;
-        bool mFrame;
         const char* mReported;
     } cases[] = {
-        {kNoPrefetch, SourceFailure::kNone, true, nullptr},
-        {1, SourceFailure::kRenderRequestException, false, nullptr},
-        {1, SourceFailure::kStdException, false, "source failed"},
+        {kNoPrefetch, SourceFailure::kNone, nullptr},
+        {1, SourceFailure::kRenderRequestException, nullptr},
+        {1, SourceFailure::kStdException, "source failed"},
     };
     ML::VideoRenderer::Initialize();
     unsigned int id = 60;
     for (const auto& testCase : cases)
     {
         SCOPED_TRACE(id);
-        auto source = NewSource(testCase.mDelayMs);
+        auto source = NewSource(testCase.mPolls);
         source->mFailure = testCase.mFailure;
         Initiate(source, ++id);
         const Delivery answer = Answer(id, source);
-        EXPECT_EQ(answer.mKind, testCase.mFrame ? Delivery::kComplete : Delivery::kError);
-        EXPECT_TRUE(testCase.mFrame ? IsFilledWith(answer.mFrame, source->mColor) : !answer.mFrame);
+        const bool framed = testCase.mFailure == SourceFailure::kNone;
+        EXPECT_EQ(answer.mKind, framed ? Delivery::kComplete : Delivery::kError);
+        EXPECT_TRUE(framed ? IsFilledWith(answer.mFrame, source->mColor) : !answer.mFrame);
         EXPECT_EQ(source->mRenderCount.load(), 1);
         if (!testCase.mReported)
-        {
-            EXPECT_TRUE(Asserts().empty());
             continue;
-        }
         ASSERT_TRUE(WaitUntil([this] { return !Asserts().empty(); }));
         EXPECT_NE(Asserts()[0].find(testCase.mReported), std::string::npos) << Asserts()[0];
     }
     RenderOneFrameAndCheck(1);
     ML::VideoRenderer::Shutdown();
     EXPECT_EQ(mRecorder.Count(), 4u);
+    EXPECT_EQ(Asserts().size(), 1u);
 }
 
 TEST_F(VideoRendererTest, EmptySourceOrCallbackIsNeverCalledBack)
@@ -379,7 +309,6 @@ TEST_F(VideoRendererTest, EmptySourceOrCallbackIsNeverCalledBack)
     ML::VideoRenderer::Initialize();
     ML::InitiateRender(QRT::InterfaceRef<ML::IRenderableSource>(), MF::FrameTime(),
                        MakeParams(8, 8), 90, mRecorder.Callback());
-    EXPECT_EQ(ML::RenderFrameQueue::Create()->GetStatistics().mIncoming, 0u);
     auto source = NewSource(1);
     ML::InitiateRender(source, MF::FrameTime(), MakeParams(8, 8), 63, ML::InitiateRenderCallback());
     ASSERT_TRUE(WaitUntil([&] { return source->mRenderCount.load() == 1; }));
@@ -399,7 +328,6 @@ TEST_F(VideoRendererTest, CancelWhilePrefetchIsInFlightReachesTheCallbackAsCance
     Initiate(source, id);
     ASSERT_TRUE(WaitUntil(
         [] { return ML::RenderFrameQueue::Create()->GetStatistics().mPrefetchWaiting == 1; }));
-    EXPECT_EQ(source->mPrefetch->mInitiateCount.load(), 1);
     EXPECT_EQ(mRecorder.Count(), 0u);
     ML::CancelRender(id);
     const Delivery answer = Answer(id, source);
@@ -409,95 +337,14 @@ TEST_F(VideoRendererTest, CancelWhilePrefetchIsInFlightReachesTheCallbackAsCance
     EXPECT_GE(source->mPrefetch->mCancelCount.load(), 1);
     // A second cancel of the same identifier, or of unknown ones, finds nothing.
     ML::CancelRender(id);
-    auto other = NewSource(20);
+    auto other = NewSource(4);
     Initiate(other, 500);
     ML::CancelRender(501);
     ML::CancelRender(0);
-    const Delivery answer500 = Answer(500, other);
-    EXPECT_EQ(answer500.mKind, Delivery::kComplete);
-    EXPECT_TRUE(IsFilledWith(answer500.mFrame, other->mColor));
+    EXPECT_EQ(Answer(500, other).mKind, Delivery::kComplete);
     EXPECT_EQ(other->mPrefetch->mCancelCount.load(), 0);
     ML::VideoRenderer::Shutdown();
     EXPECT_EQ(mRecorder.Count(), 2u);
 }
 
-TEST_F(VideoRendererTest, ConcurrentRendersAndCancelsAreEachAnsweredExactlyOnce)
-{
-    ML::VideoRenderer::Initialize();
-    constexpr int kThreads = 4;
-    constexpr int kPerThread = 20;
-    std::mutex sourcesMutex;
-    std::vector<std::pair<unsigned int, QRT::InterfaceRef<TestSource>>> sources;
-    std::vector<std::thread> threads;
-    for (int t = 0; t < kThreads; ++t)
-    {
-        threads.emplace_back(
-            [&, t]
-            {
-                for (int i = 0; i < kPerThread; ++i)
-                {
-                    // Half never complete: those must end cancelled.
-                    const bool hung = i % 2 == 1;
-                    auto source = NewSource(hung ? kNeverArrives : i % 4);
-                    source->mColor[0] = static_cast<std::uint8_t>(t);
-                    const unsigned int id = ML::GetNextRequestID();
-                    Initiate(source, id, MF::FrameTime(TickTime::TicksToTime(1000 * i)));
-                    if (hung || i % 3 == 0)
-                        ML::CancelRender(id);
-                    std::lock_guard lock(sourcesMutex);
-                    sources.emplace_back(id, source);
-                }
-            });
-    }
-    for (std::thread& thread : threads)
-        thread.join();
-    ASSERT_TRUE(mRecorder.WaitForCount(kThreads * kPerThread));
-    for (const auto& [id, source] : sources)
-    {
-        const Delivery answer = Answer(id, source);
-        if (answer.mKind == Delivery::kCancelled)
-        {
-            EXPECT_FALSE(answer.mFrame);
-            EXPECT_EQ(source->mRenderCount.load(), 0);
-        }
-        else
-        {
-            // A completed one is one whose prefetch arrived: it was rendered.
-            EXPECT_TRUE(source->mPrefetch->IsComplete());
-            EXPECT_TRUE(IsFilledWith(answer.mFrame, source->mColor));
-        }
-    }
-    ML::VideoRenderer::Shutdown();
-    EXPECT_EQ(mRecorder.Count(), static_cast<std::size_t>(kThreads * kPerThread));
-}
-
 } // namespace
-
-TEST_F(VideoRendererTest, PatternSourceRendersEndToEndWithItsPixels)
-{
-    // A real back-end source (a solid pattern) wrapped by the media adaptor
-    // and rendered through InitiateRender at two sizes.
-    ML::VideoRenderer::Initialize();
-    BE::VideoSourceRef media;
-    ASSERT_TRUE(BE::OpenVideoSource("pattern:solid?size=64x36&color=3366CC", media).Succeeded());
-    const auto source = ML::CreateRenderableSource(
-        media, MF::BinaryData(), media->GetAlphaChannel(), media->GetMatteColor(), false, false,
-        media->GetFrameRate(), media->GetFieldType(), media->GetPixelAspectRatio(),
-        media->GetColorProfile());
-    ASSERT_TRUE(source);
-    const MF::FrameTime frameTime(TickTime::TicksToTime(0));
-    for (const auto& [id, width, height] : {std::tuple{501u, 16u, 8u}, std::tuple{502u, 64u, 36u}})
-        ML::InitiateRender(source, frameTime, MakeParams(width, height, frameTime), id,
-                           mRecorder.Callback());
-    ASSERT_TRUE(mRecorder.WaitForCount(2));
-    for (const Delivery& answer : mRecorder.Get())
-    {
-        SCOPED_TRACE(answer.mRequestID);
-        EXPECT_EQ(answer.mKind, Delivery::kComplete);
-        EXPECT_EQ(answer.mStatus, 0);
-        EXPECT_TRUE(IsFilledWith(answer.mFrame, {0xCC, 0x66, 0x33, 0xFF}));
-        ASSERT_TRUE(answer.mFrame);
-        EXPECT_EQ(answer.mFrame->GetBounds().Width(), answer.mRequestID == 501 ? 16 : 64);
-    }
-    ML::VideoRenderer::Shutdown();
-}
