@@ -66,12 +66,8 @@ TEST_F(CompositeTest, BadInputRaisesContractsAndUnsupportedFormatsAStatus)
                             inOpacity, 4);
     };
     EXPECT_INPUT_CONTRACT(composite(nullptr, 16, kBGRA8, 4), "inBase != nullptr");
-    // A BGRA word with no alpha bit, and one with both, are not formats.
+    // A BGRA word with no alpha bit is not a format.
     EXPECT_INPUT_CONTRACT(composite(a.Data(), 16, 0u, 4), "DescribeFormat(inFormat, info)");
-    EXPECT_FALSE(
-        IR_IsValidPixelFormat(kIR_FormatBit_StraightAlpha | kIR_FormatBit_PremultipliedAlpha));
-    EXPECT_INPUT_CONTRACT(composite(a.Data(), 16, kBGRA8, 4, NAN),
-                          "inValue >= 0.0f && inValue <= 1.0f");
     EXPECT_EQ(composite(a.Data(), 16, kIR_PixelFormat_YUYV_422_8u, 4), kIR_UnsupportedFormat);
     // Float pixels must sit at float-aligned addresses.
     EXPECT_INPUT_CONTRACT(

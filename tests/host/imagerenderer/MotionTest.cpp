@@ -31,24 +31,6 @@ TEST_F(MotionTest, IdentityAtBestQualityEqualsACopy)
     }
 }
 
-TEST_F(MotionTest, NinetyDegreeRotationLandsPixelsClockwise)
-{
-    Image src(kBGRP8, 3, 2);
-    for (std::int32_t y = 0; y < 2; ++y)
-        for (std::int32_t x = 0; x < 3; ++x)
-            src.Set(x, y, {static_cast<std::uint8_t>(10 * x + y), 0, 0, 255});
-    const IR_MotionGeometry geometry{.rotationDegrees = 90.0};
-    for (std::int32_t quality : {0, 4})
-    {
-        Image dst(kBGRP8, 2, 3);
-        ASSERT_EQ(Draw(src, dst, Matrix(geometry, src, dst), quality), kIR_NoError);
-        // Clockwise: source (x, y) lands at (1 - y, x); the top-left corner goes top-right.
-        for (std::int32_t y = 0; y < 2; ++y)
-            for (std::int32_t x = 0; x < 3; ++x)
-                EXPECT_EQ(dst.Get(1 - y, x), src.Get(x, y)) << x << "," << y << " q" << quality;
-    }
-}
-
 TEST_F(MotionTest, TwiceTheSizeIsNearestBelowQualityThreeAndBilinearAtThreeAndFour)
 {
     Image src(kBGRP8, 2, 2), dst(kBGRP8, 4, 4);
@@ -129,9 +111,6 @@ TEST_F(MotionTest, BottomLeftBuffersUsePictureCoordinates)
     ASSERT_EQ(Draw(src, dst, IR_AffineMatrix{}, 0), kIR_NoError);
     EXPECT_EQ(dst.Get(0, 0), (Pixel{200, 0, 0, 255}));
     EXPECT_EQ(dst.Get(0, 1), (Pixel{0, 200, 0, 255}));
-    EXPECT_TRUE(IR_IsOriginBottomLeft(bottomLeft));
-    EXPECT_FALSE(IR_IsOriginTopLeft(bottomLeft));
-    EXPECT_TRUE(IR_IsOriginTopLeft(kIR_PixelFormat_YUYV_422_8u));
 }
 
 TEST_F(MotionTest, BadInputIsRefused)
