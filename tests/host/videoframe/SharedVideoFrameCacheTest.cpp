@@ -142,17 +142,6 @@ TEST_F(SharedVideoFrameCacheTest, DependencyPinsAFrameUntilUnregisteredAndSurviv
     }
 }
 
-TEST_F(SharedVideoFrameCacheTest, FrameLargerThanTheBudgetIsNotStoredButNotified)
-{
-    VF::VideoFrameCache cache(kFrameBytes, true);
-    std::vector<Guid> notified;
-    cache.SetNotificationFunction([&](const Guid& inKey) { notified.push_back(inKey); });
-    cache.InsertIntoCache(MakeFrame(mt::kPixelFormat_BGRA_4444_8u, 64, 17), KeyFor(9), 10);
-    EXPECT_EQ(notified, std::vector<Guid>{KeyFor(9)});
-    EXPECT_FALSE(cache.RetrieveFromCache(KeyFor(9)));
-    EXPECT_EQ(Counts(cache), (Expected{0, 1, 0, 1, 0, 0, 0}));
-}
-
 TEST_F(SharedVideoFrameCacheTest, BadInputIsAContractError)
 {
     EXPECT_INPUT_CONTRACT(mCache.InsertIntoCache(Frame(), KeyFor(0), 0), "inFrame != nullptr");
@@ -237,20 +226,25 @@ TEST_F(SharedVideoFrameCacheTest, ConcurrentInsertAndRetrieveStayConsistent)
     EXPECT_EQ(held, frames);
 }
 
-TEST_F(SharedVideoFrameCacheTest, EnvironmentSwitchTurnsTheCacheOffAndTheSharedOneServes)
+TEST_F(SharedVideoFrameCacheTest, DisabledCacheOrTooLargeFrameIsMarkedAndNotifiedButNotStored)
 {
     ASSERT_EQ(setenv("VF_DISABLE_FRAME_CACHE", "1", 1), 0);
-    VF::VideoFrameCache disabled;
+    VF::VideoFrameCache disabled, small(kFrameBytes, true);
     ASSERT_EQ(unsetenv("VF_DISABLE_FRAME_CACHE"), 0);
-    EXPECT_FALSE(disabled.IsEnabled());
-    // A disabled cache still marks and notifies, and stores nothing.
-    int notified = 0;
-    disabled.SetNotificationFunction([&](const Guid&) { ++notified; });
+    EXPECT_EQ(std::pair(disabled.IsEnabled(), small.IsEnabled()), std::pair(false, true));
     const Frame frame = MakeTagged(5);
-    disabled.InsertIntoCache(frame, KeyFor(5), 10);
-    EXPECT_EQ(std::tuple(frame->IsShared(), notified, bool(disabled.RetrieveFromCache(KeyFor(5)))),
-              std::tuple(true, 1, false));
-    EXPECT_EQ(Counts(disabled), (Expected{0, 1, 0, 1, 0, 0, 0}));
+    for (const auto& [cache, inserted] :
+         {std::pair{&disabled, frame}, std::pair{&small, MakeTagged(5, 2)}})
+    {
+        std::vector<Guid> notified;
+        cache->SetNotificationFunction([&](const Guid& inKey) { notified.push_back(inKey); });
+        cache->InsertIntoCache(inserted, KeyFor(5), 10);
+        EXPECT_EQ(
+            std::tuple(inserted->IsShared(), notified, bool(cache->RetrieveFromCache(KeyFor(5)))),
+            std::tuple(true, std::vector<Guid>{KeyFor(5)}, false));
+        EXPECT_EQ(Counts(*cache), (Expected{0, 1, 0, 1, 0, 0, 0}));
+        cache->SetNotificationFunction(nullptr);
+    }
     // The process-wide cache serves the static functions.
     VF::SharedVideoFrameCache::InsertIntoCache(frame, KeyFor(5), 10);
     EXPECT_EQ(VF::SharedVideoFrameCache::RetrieveFromCache(KeyFor(5)).Get(), frame.Get());
