@@ -139,9 +139,6 @@ TEST_F(VideoFrameTest, TrackedVisibleContentGrowsWithinTheBoundsAndFullFrameAnsw
     EXPECT_INPUT_CONTRACT(untracked->HasFullFrame(2), "inWhole == 0 || inWhole == 1");
     EXPECT_INPUT_CONTRACT(untracked->SetFullFrameRect(ParamRect(5, 5, 5, 9)),
                           "IsAllZero(inRect) || !inRect.IsEmpty()");
-    EXPECT_EQ(std::pair(untracked->CanProvideRect(ParamRect(10, 10, 40, 30)),
-                        untracked->CanProvideRect(ParamRect(-1, 0, 10, 10))),
-              std::pair(true, false));
 }
 
 TEST_F(VideoFrameTest, SharedFrameRefusesEveryWriteButRenderTime)
