@@ -39,7 +39,7 @@ TEST(HashTest, RunningLengthCountsEveryMixedByteModulo2To32)
     EXPECT_TRUE(hash.IsZero());
     EXPECT_EQ(QRT::HashValueToGuid(hash), QRT::Guid());
     // An empty run still changes the value.
-    QRT::MixHash::MixInString(hash, "");
+    QRT::MixHash::MixInData(hash, nullptr, 0);
     EXPECT_FALSE(hash.IsZero());
     EXPECT_EQ(hash.GetRunningLength(), 0u);
     QRT::MixHash::MixInValue(hash, uint64_t{7});
@@ -48,6 +48,9 @@ TEST(HashTest, RunningLengthCountsEveryMixedByteModulo2To32)
     hash.mBytes[13] = hash.mBytes[14] = hash.mBytes[15] = 0xFF;
     QRT::MixHash::MixInString(hash, "abc");
     EXPECT_EQ(hash.GetRunningLength(), 1u);
+    const QRT::HashValue before = hash;
+    EXPECT_THROW(QRT::MixHash::MixInData(hash, nullptr, 4), mvxcore::config::Error);
+    EXPECT_EQ(hash, before);
 }
 
 TEST(HashTest, EveryRunFollowsTheChainingRule)
@@ -64,7 +67,7 @@ TEST(HashTest, EveryRunFollowsTheChainingRule)
     EXPECT_EQ(hash.GetRunningLength(), 32u);
 
     // Above the one-shot buffer the streaming path must give the same digest.
-    for (size_t size : {size_t{240}, size_t{2048}, size_t{2049}, size_t{10000}})
+    for (size_t size : {size_t{2048}, size_t{2049}})
     {
         std::vector<uint8_t> data(size);
         for (size_t i = 0; i < size; ++i)
@@ -101,15 +104,6 @@ TEST(HashTest, GuidsMixAsTheirMemoryBytesAndKeysConvertWordByWord)
     for (uint8_t i = 0; i < 16; ++i)
         hash.mBytes[i] = static_cast<uint8_t>(0x10 + i);
     EXPECT_EQ(QRT::HashValueToGuid(hash).ToString(), "{13121110-1716-1514-1b1a-19181f1e1d1c}");
-}
-
-TEST(HashTest, NullDataWithASizeIsAContractViolation)
-{
-    QRT::HashValue hash;
-    EXPECT_THROW(QRT::MixHash::MixInData(hash, nullptr, 4), mvxcore::config::Error);
-    EXPECT_TRUE(hash.IsZero());
-    QRT::MixHash::MixInData(hash, nullptr, 0);
-    EXPECT_FALSE(hash.IsZero());
 }
 
 } // namespace
