@@ -65,8 +65,6 @@ protected:
 
 TEST_F(RenderExecutorsTest, StartUpCreatesFourDistinctWorkingExecutorsOnce)
 {
-    for (const ML::ExecutorRef& executor : CurrentExecutors())
-        EXPECT_FALSE(executor);
     ML::Foundation::StartUp();
     const Executors executors = CurrentExecutors();
     for (size_t i = 0; i < executors.size(); ++i)
@@ -111,10 +109,8 @@ TEST_F(RenderExecutorsTest, StartUpReplacesOnlyTheExecutorsThatWereShutDown)
     }
     ML::Foundation::StartUp();
     const Executors partly = CurrentExecutors();
-    EXPECT_NE(partly[0], before[0]);
-    EXPECT_NE(partly[1], before[1]);
-    EXPECT_EQ(partly[2], before[2]);
-    EXPECT_EQ(partly[3], before[3]);
+    for (size_t i = 0; i < partly.size(); ++i)
+        EXPECT_EQ(partly[i] == before[i], i >= 2) << i;
     ExpectWorking(partly);
 }
 

@@ -76,18 +76,17 @@ TEST(StaticImageFactoryTest, SlatesShowTheirBackgroundAndText)
 
 TEST(StaticImageFactoryTest, OtherFormatsAreConverted)
 {
-    const Frame grey = Load(ML::kStaticImage_MidGrey, 3, 3, mt::kPixelFormat_BGRA_4444_32f);
+    const Frame grey = StaticImageFactory::LoadImageW(
+        ML::kStaticImage_MidGrey, 3, 3, mt::kPixelFormat_BGRA_4444_32f, mt::kPixelAspectRatio_D1PAL,
+        mt::kRenderQuality_High);
     ASSERT_TRUE(grey);
     EXPECT_EQ(grey->GetPixelFormat(), mt::kPixelFormat_BGRA_4444_32f);
+    EXPECT_EQ(grey->GetPixelAspectRatio(), mt::kPixelAspectRatio_D1PAL);
     float pixel[4];
     std::memcpy(pixel,
                 static_cast<const uint8_t*>(grey->GetBaseAddress()) + grey->GetRowBytes() + 16, 16);
     EXPECT_NEAR(pixel[0], 128.0f / 255.0f, 1e-6f);
     EXPECT_NEAR(pixel[3], 1.0f, 1e-6f);
-    const Frame withRatio =
-        StaticImageFactory::LoadImageW(ML::kStaticImage_Black, 4, 4, mt::kPixelFormat_BGRA_4444_8u,
-                                       mt::kPixelAspectRatio_D1PAL, mt::kRenderQuality_High);
-    EXPECT_EQ(withRatio->GetPixelAspectRatio(), mt::kPixelAspectRatio_D1PAL);
 }
 
 TEST(StaticImageFactoryTest, BadRequestsAnswerNothing)

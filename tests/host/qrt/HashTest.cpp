@@ -53,7 +53,7 @@ TEST(HashTest, RunningLengthCountsEveryMixedByteModulo2To32)
     EXPECT_EQ(hash, before);
 }
 
-TEST(HashTest, EveryRunFollowsTheChainingRule)
+TEST(HashTest, EveryRunFollowsTheChainingRuleAndGuidsMixAsTheirBytes)
 {
     QRT::HashValue expected;
     expected = ReferenceMix(expected, "ML::RenderableNodeCommonImpl", 28);
@@ -91,16 +91,13 @@ TEST(HashTest, EveryRunFollowsTheChainingRule)
     // of chaining, byte order or length handling must show up here.
     EXPECT_EQ(whole, ReferenceMix(QRT::HashValue(), "abc", 3));
     EXPECT_EQ(QRT::HashValueToGuid(whole).ToString(), "{80b88241-fce6-a9d5-7a48-03b700000003}");
-}
 
-TEST(HashTest, GuidsMixAsTheirMemoryBytesAndKeysConvertWordByWord)
-{
+    // Guids mix as their memory bytes; keys convert word by word.
     QRT::HashValue viaGuid;
     QRT::MixHash::MixInGuid(viaGuid, QRT::Guid("{01020304-0506-0708-090a-0b0c0d0e0f10}"));
     const uint8_t bytes[16] = {4, 3, 2, 1, 6, 5, 8, 7, 9, 10, 11, 12, 13, 14, 15, 16};
     EXPECT_EQ(viaGuid, ReferenceMix(QRT::HashValue(), bytes, sizeof(bytes)));
 
-    QRT::HashValue hash;
     for (uint8_t i = 0; i < 16; ++i)
         hash.mBytes[i] = static_cast<uint8_t>(0x10 + i);
     EXPECT_EQ(QRT::HashValueToGuid(hash).ToString(), "{13121110-1716-1514-1b1a-19181f1e1d1c}");

@@ -22,7 +22,7 @@ protected:
     int64_t mBlocksBefore = 0;
 };
 
-TEST_F(WaitableObjectTest, StaysSignalledUntilResetAndTimedWaitsTimeOutOtherwise)
+TEST_F(WaitableObjectTest, StaysSignalledUntilResetAndReleasesEveryWaiterAtOnce)
 {
     const QRT::InterfaceRef<QRT::WaitableObject> waitable = QRT::WaitableObject::Create();
     ASSERT_TRUE(waitable);
@@ -35,11 +35,8 @@ TEST_F(WaitableObjectTest, StaysSignalledUntilResetAndTimedWaitsTimeOutOtherwise
 
     waitable->Reset();
     EXPECT_FALSE(waitable->IsSignalled());
-}
 
-TEST_F(WaitableObjectTest, OneSignalReleasesEveryWaiterAndNoneBefore)
-{
-    const auto waitable = QRT::WaitableObject::Create();
+    // One signal releases every waiter, and none is released before it.
     std::atomic<bool> signalled{false};
     std::atomic<int> released{0};
     std::vector<std::thread> waiters;
