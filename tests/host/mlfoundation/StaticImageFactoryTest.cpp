@@ -94,6 +94,7 @@ TEST(StaticImageFactoryTest, BadRequestsAnswerNothing)
     EXPECT_FALSE(Load(7, 8, 8));
     EXPECT_FALSE(Load(-1, 8, 8));
     EXPECT_FALSE(Load(ML::kStaticImage_Black, 0, 8));
+    EXPECT_FALSE(Load(ML::kStaticImage_Black, 8, -3));
     EXPECT_FALSE(Load(ML::kStaticImage_Black, 40000, 8));
     EXPECT_FALSE(Load(ML::kStaticImage_Black, 8, 8, mt::kPixelFormat_MJPG_422_Compressed));
     EXPECT_FALSE(Load(ML::kStaticImage_Black, 8, 8, mt::kPixelFormat_Invalid));

@@ -60,7 +60,6 @@ struct Recorder
 {
     std::mutex mMutex; // guards the members below
     Values mValues;
-    std::thread::id mThread;
     bool mAlwaysOnUIThread = true;
 
     QRT::StationHandler Handler()
@@ -69,7 +68,6 @@ struct Recorder
         {
             std::lock_guard lock(mMutex);
             mValues.push_back(ValueOf(inMessage));
-            mThread = std::this_thread::get_id();
             mAlwaysOnUIThread = mAlwaysOnUIThread && UIThread::IsUIThread();
         };
     }
@@ -141,6 +139,7 @@ TEST_F(MessagingTest, MessageIDIsTheFirstWordOfTheNameHashAndCloneCopiesThePaylo
     EXPECT_NE(QRT::MessageImpl<OtherMessage>::GetStaticMessageID(), expected);
     EXPECT_EQ(ValueOf(*clone), 12);
     EXPECT_EQ(clone->GetTypeName(), name);
+    EXPECT_EQ(clone->GetPayloadIf<OtherMessage>(), nullptr);
 }
 
 TEST_F(MessagingTest, RegistrationRefusesTakenAndEmptyNamesAndUnknownStationsDropMessages)
@@ -156,9 +155,10 @@ TEST_F(MessagingTest, RegistrationRefusesTakenAndEmptyNamesAndUnknownStationsDro
     // Unique identifiers are distinct GUID texts, not registered by themselves.
     const StationRegistry::UniqueStationID first;
     EXPECT_NE(first, StationRegistry::UniqueStationID());
+    EXPECT_FALSE(StationRegistry::IsStationRegistered(first));
     EXPECT_TRUE(QRT::Guid::Parse(first.ToStringView()).has_value());
     EXPECT_EQ(Post(first, 1), QRT::kResult_NotFound);
-    EXPECT_EQ(UIThread::GetPendingMessageCount(), 0u);
+    EXPECT_EQ(UIThread::PumpMessagesFor(1ms), 0u);
 }
 
 TEST_F(MessagingTest, DispatcherDeliversOnItsOwnThreadInPostOrderAndStopKeepsQueuedMessages)
@@ -185,7 +185,6 @@ TEST_F(MessagingTest, DispatcherDeliversOnItsOwnThreadInPostOrderAndStopKeepsQue
     Values expected(200);
     std::iota(expected.begin(), expected.end(), 0);
     EXPECT_EQ(recorder.Get(), expected);
-    EXPECT_NE(recorder.mThread, std::this_thread::get_id());
     EXPECT_TRUE(recorder.mAlwaysOnUIThread);
     EXPECT_FALSE(UIThread::IsUIThread());
     EXPECT_TRUE(UIThread::Stop());

@@ -123,13 +123,15 @@ TEST_F(ObjectModelTest, ComparisonGoesThroughRootInterfacesAndFailuresThrow)
     EXPECT_FALSE(square == other);
     EXPECT_NE((square <=> other), std::strong_ordering::equal);
     EXPECT_THROW(QRT::InterfaceRef<IUnimplemented>{square}, QRT::InterfaceNotFoundException);
-    EXPECT_STREQ(QRT::InterfaceNotFoundException().what(),
-                 "The requested interface has not been registered.");
+    EXPECT_STREQ(QRT::IllegalComparisonException().what(),
+                 "A comparison of two refs has failed because we are unable to convert one of "
+                 "them to QRTUnknown.");
     EXPECT_THROW((void)empty->Side(), QRT::NullInterfaceException);
     EXPECT_THROW((void)*empty, QRT::NullInterfaceException);
     // An empty reference converts to an empty one instead of throwing.
     EXPECT_FALSE(QRT::InterfaceRef<IUnimplemented>(empty));
     EXPECT_FALSE(QRT::QueryRef<IUnimplemented>(square));
+    EXPECT_TRUE(QRT::QueryRef<INamed>(square));
 }
 
 TEST_F(ObjectModelTest, WeakReferenceLocksOnlyWhileAlive)
@@ -138,6 +140,7 @@ TEST_F(ObjectModelTest, WeakReferenceLocksOnlyWhileAlive)
     const QRT::WeakReference<INamed> weak(client);
     EXPECT_STREQ(weak.Lock()->Name(), "client");
     client.Reset();
+    EXPECT_TRUE(weak.IsExpired());
     EXPECT_FALSE(weak.Lock());
     const QRT::InterfaceRef<INamed> notWeakCapable = QRT::Allocated<Square>::Create<INamed>(1);
     EXPECT_THROW(QRT::WeakReference<INamed>{notWeakCapable}, QRT::InterfaceNotFoundException);

@@ -14,6 +14,10 @@ TEST(ParamTest, RectSizesAreEdgeDifferencesThatWrapInsteadOfOverflowing)
     EXPECT_TRUE(QRT::ParamRect(5, 5, 2, 9).IsEmpty());
     EXPECT_TRUE(QRT::ParamRect(0, 5, 2, 5).IsEmpty());
     EXPECT_EQ(QRT::ParamRect(INT32_MIN, 0, INT32_MAX, 1).Width(), -1);
+    EXPECT_TRUE(QRT::ParamRect().IsEmpty());
+    EXPECT_EQ(QRT::ParamRect(0, 0, 4, 3), QRT::ParamRect(0, 0, 4, 3));
+    EXPECT_NE(QRT::ParamRect(0, 0, 4, 3), QRT::ParamRect(0, 1, 4, 3));
+    EXPECT_NE(QRT::ParamRect(0, 0, 4, 3), QRT::ParamRect(0, 0, 4, 4));
 }
 
 TEST(ParamTest, ColorPacksRedInTheLowestByteSoMemoryReadsAsRGB)
