@@ -75,7 +75,6 @@ TEST_F(OptionsTest, ArgumentsBecomeTheseOptions)
         {"--rate 30000/1001", [](O& o) { o.mFrameRate = mt::kFrameRate_Video2997; }},
         // --frames is an inclusive range.
         {"--frames 10:19", [](O& o) { std::tie(o.mStart, o.mCount) = std::pair(10, 10); }},
-        {"--frames 4:4", [](O& o) { std::tie(o.mStart, o.mCount) = std::pair(4, 1); }},
         {"--y4m",
          [](O& o) { std::tie(o.mOutputKind, o.mOutputPath) = std::pair(K::kY4MStream, ""); }},
         {"-o - --chroma 444",

@@ -46,7 +46,6 @@ TEST_F(PlanRenderTest, DefaultsComeFromTheSource)
     const vrender::RenderPlan plan = Plan({}, Clip(), 4);
     EXPECT_EQ(Summary(plan), std::tuple(0, 100, 640u, 360u, mt::PixelAspectRatio(4, 3),
                                         mt::kFieldType_Progressive, 8u));
-    EXPECT_EQ(plan.mStream.mFrameRate, mt::kFrameRate_Video25);
     EXPECT_EQ(plan.mPixelFormat, mt::kPixelFormat_BGRA_4444_8u);
     vrender::SourceFacts interlaced = Clip();
     interlaced.mFieldType = mt::kFieldType_LowerFirst;
