@@ -64,8 +64,7 @@ protected:
     }
     void TearDown() override { mvxcore::debug::SetAssertHook({}); }
 
-    // Holds one of inExecutor's threads until mGate opens; mOccupantDone is
-    // set when that task ends.
+    // Holds one of inExecutor's threads until mGate opens.
     void Occupy(const ExecutorRef& inExecutor)
     {
         CountingSignal started;
@@ -74,7 +73,6 @@ protected:
             {
                 started.Notify();
                 mGate.WaitFor();
-                mOccupantDone = true;
             }));
         ASSERT_TRUE(started.WaitFor());
     }
@@ -100,7 +98,6 @@ protected:
     }
 
     CountingSignal mGate;
-    std::atomic<bool> mOccupantDone{false};
     WeakExecutor mParent;
 
 private:
@@ -123,42 +120,27 @@ protected:
     }
 };
 
-TEST_P(ExecutorTest, AtOneRunsReadyTasksOneByOneInPostOrderUnderLoadFromSeveralThreads)
+TEST_P(ExecutorTest, AtOneRunsReadyTasksOneByOneInPostOrder)
 {
     const ExecutorRef executor = Make(1);
-    constexpr int kThreads = 4;
-    constexpr int kTotal = kThreads * 500;
-    // Posting under one mutex makes the ticket order the post order.
-    std::mutex postMutex;
-    int nextTicket = 0;
+    constexpr int kTotal = 2000;
     std::vector<int> order;
     std::atomic<int> running{0};
     std::atomic<int> overlaps{0};
     CountingSignal done;
-    const auto post = [&]
+    for (int i = 0; i < kTotal; ++i)
     {
-        std::lock_guard lock(postMutex);
         executor->Post(
-            [&, ticket = nextTicket++]
+            [&, i]
             {
                 overlaps += ++running != 1;
-                order.push_back(ticket);
+                order.push_back(i);
                 // Widens the window in which a second task would overlap.
                 std::this_thread::yield();
                 --running;
                 done.Notify();
             });
-    };
-    std::vector<std::thread> posters;
-    for (int t = 0; t < kThreads; ++t)
-        posters.emplace_back(
-            [&]
-            {
-                for (int i = 0; i < kTotal / kThreads; ++i)
-                    post();
-            });
-    for (std::thread& poster : posters)
-        poster.join();
+    }
     ASSERT_TRUE(done.WaitFor(kTotal));
     EXPECT_EQ(overlaps.load(), 0);
     std::vector<int> expected(kTotal);
@@ -174,16 +156,13 @@ TEST_P(ExecutorTest, RunsUpToItsLimitAtOnceAndNeverMore)
     CountingSignal done;
     std::atomic<int> met{0};
     std::atomic<int> running{0};
-    std::atomic<int> most{0};
+    std::atomic<int> over{0};
     for (int i = 0; i < 300; ++i)
     {
         executor->Post(
             [&, meets = i < kLimit]
             {
-                const int now = ++running;
-                for (int seen = most.load(); now > seen && !most.compare_exchange_weak(seen, now);)
-                {
-                }
+                over += ++running > kLimit;
                 // The first kLimit tasks can only all pass together.
                 if (meets && meeting.Meet(kLimit))
                     ++met;
@@ -194,23 +173,7 @@ TEST_P(ExecutorTest, RunsUpToItsLimitAtOnceAndNeverMore)
     }
     ASSERT_TRUE(done.WaitFor(300));
     EXPECT_EQ(met.load(), kLimit);
-    EXPECT_LE(most.load(), kLimit);
-}
-
-TEST_P(ExecutorTest, DelayedTaskOnAnIdleExecutorDoesNotRunBeforeItsDelay)
-{
-    const ExecutorRef executor = Make(1);
-    CountingSignal done;
-    Clock::duration elapsed{};
-    const Clock::time_point posted = Clock::now();
-    const auto task = [&]
-    {
-        elapsed = Clock::now() - posted;
-        done.Notify();
-    };
-    ASSERT_TRUE(executor->Post(task, kPollingDelayMilliseconds));
-    ASSERT_TRUE(done.WaitFor());
-    EXPECT_GE(elapsed, std::chrono::milliseconds(kPollingDelayMilliseconds));
+    EXPECT_EQ(over.load(), 0);
 }
 
 TEST_P(ExecutorTest, ReadyTasksOvertakeDelayedOnesAndDueTasksRunInDueOrder)
@@ -249,24 +212,17 @@ TEST_P(ExecutorTest, ReadyTasksOvertakeDelayedOnesAndDueTasksRunInDueOrder)
 TEST_P(ExecutorTest, StateQueryIsTrueInItsOwnTasksOnlyOrOnceShutDown)
 {
     const ExecutorRef executor = Make(1);
-    const ExecutorRef other = CreateThreadPoolExecutor(1);
-    std::atomic<int> trueIn[2] = {0, 0};
+    std::atomic<int> trueIn{0};
     CountingSignal done;
-    for (int i = 0; i < 2; ++i)
-    {
-        (i == 0 ? executor : other)
-            ->Post(
-                [&, i]
-                {
-                    trueIn[i] = executor->IsCurrentThread() + executor->IsCurrentThreadOrShutDown();
-                    done.Notify();
-                });
-    }
-    ASSERT_TRUE(done.WaitFor(2));
-    EXPECT_EQ(trueIn[0].load(), 2);
-    EXPECT_EQ(trueIn[1].load(), 0);
+    executor->Post(
+        [&]
+        {
+            trueIn = executor->IsCurrentThread() + executor->IsCurrentThreadOrShutDown();
+            done.Notify();
+        });
+    ASSERT_TRUE(done.WaitFor());
+    EXPECT_EQ(trueIn.load(), 2);
     EXPECT_FALSE(executor->IsCurrentThreadOrShutDown() || executor->IsShutDown());
-
     executor->BeginShutdown();
     EXPECT_TRUE(executor->IsShutDown() && executor->IsCurrentThreadOrShutDown());
     EXPECT_FALSE(executor->IsCurrentThread());
@@ -303,42 +259,14 @@ TEST_P(ExecutorTest, ShutdownRefusesNewTasksStartsNoQueuedOneAndDiscardReleasesT
     ExpectParentStillRuns();
 }
 
-TEST_P(ExecutorTest, WaitForRunningTasksFromItsOwnTaskWaitsForTheOthersOnly)
-{
-    const ExecutorRef executor = Make(2);
-    CountingSignal done;
-    std::atomic<bool> otherFinishedAtReturn{false};
-    Occupy(executor);
-    executor->Post(
-        [&]
-        {
-            executor->BeginShutdown();
-            executor->DiscardPendingTasks();
-            mGate.Notify();
-            executor->WaitForRunningTasks();
-            otherFinishedAtReturn = mOccupantDone.load();
-            done.Notify();
-        });
-    ASSERT_TRUE(done.WaitFor());
-    EXPECT_TRUE(otherFinishedAtReturn.load());
-}
-
-TEST_P(ExecutorTest, ThrowingTaskIsReportedAndTheNextTasksStillRunInOrder)
+TEST_P(ExecutorTest, ThrowingTaskIsReportedAndTheNextTasksStillRun)
 {
     const ExecutorRef executor = Make(1);
-    std::vector<int> order;
     CountingSignal done;
-    executor->Post([&] { order.push_back(0); });
     executor->Post([] { throw std::runtime_error("boom"); });
     executor->Post([] { throw 42; });
-    executor->Post(
-        [&]
-        {
-            order.push_back(1);
-            done.Notify();
-        });
+    executor->Post([&] { done.Notify(); });
     ASSERT_TRUE(done.WaitFor());
-    EXPECT_EQ(order, (std::vector<int>{0, 1}));
     EXPECT_EQ(AssertMessages(),
               (std::vector<std::string>{"An executor task threw: boom",
                                         "An executor task threw a non-standard exception."}));
@@ -348,26 +276,11 @@ TEST_P(ExecutorTest, DroppingTheLastReferenceInsideItsOwnTaskEndsItAndItsParent)
 {
     // The task holds the only reference; releasing it on the executor's own
     // thread must neither join that thread nor crash.
-    struct Holder
-    {
-        ExecutorRef executor;
-        CountingSignal* released = nullptr;
-        ~Holder()
-        {
-            executor.reset();
-            released->Notify();
-        }
-    };
     ExecutorRef executor = Make(1);
     const WeakExecutor watch = executor;
     AsyncThreadedExecutor* raw = executor.get();
-    CountingSignal released;
-    auto holder = std::make_shared<Holder>();
-    holder->executor = std::move(executor);
-    holder->released = &released;
-    ASSERT_TRUE(raw->Post([holder = std::move(holder)]() mutable { holder.reset(); }));
-    ASSERT_TRUE(released.WaitFor());
-    EXPECT_TRUE(watch.expired());
+    ASSERT_TRUE(raw->Post([held = std::move(executor)]() mutable { held.reset(); }));
+    EXPECT_TRUE(Expires(watch));
     EXPECT_TRUE(Expires(mParent));
 }
 
@@ -390,11 +303,12 @@ INSTANTIATE_TEST_SUITE_P(Kinds, ExecutorTest,
 
 using SubExecutorTest = ExecutorFixture;
 
-TEST_F(SubExecutorTest, StateQueryFollowsTheNesting)
+TEST_F(SubExecutorTest, StateQueryFollowsTheNestingAndASubKeepsItsParentAlive)
 {
-    const ExecutorRef parent = CreateCPUBoundExecutor();
-    const ExecutorRef sub = CreateSubExecutor(parent, 2);
-    const ExecutorRef levels[3] = {parent, sub, CreateSubExecutor(sub, 1)};
+    ExecutorRef parent = CreateCPUBoundExecutor();
+    const WeakExecutor watch = parent;
+    ExecutorRef sub = CreateSubExecutor(parent, 2);
+    ExecutorRef levels[3] = {parent, sub, CreateSubExecutor(sub, 1)};
     // Bit i: levels[i] answers IsCurrentThread inside a task of that level.
     std::atomic<int> seen[3] = {-1, -1, -1};
     CountingSignal done;
@@ -414,6 +328,15 @@ TEST_F(SubExecutorTest, StateQueryFollowsTheNesting)
     EXPECT_EQ(seen[0].load(), 0b001);
     EXPECT_EQ(seen[1].load(), 0b011);
     EXPECT_EQ(seen[2].load(), 0b111);
+    parent.reset();
+    levels[0].reset();
+    levels[1].reset();
+    EXPECT_FALSE(watch.expired());
+    ASSERT_TRUE(RunsAndAnswers(sub));
+    sub.reset();
+    EXPECT_FALSE(watch.expired()); // the innermost level still holds both
+    levels[2].reset();
+    EXPECT_TRUE(Expires(watch));
 }
 
 TEST_F(SubExecutorTest, ParentShutdownShutsItDownAndReleasesItsTasks)
@@ -436,18 +359,6 @@ TEST_F(SubExecutorTest, ParentShutdownShutsItDownAndReleasesItsTasks)
     mGate.Notify();
     parent->WaitForRunningTasks();
     EXPECT_EQ(ran.load(), 0);
-}
-
-TEST_F(SubExecutorTest, KeepsItsParentAliveUntilItGoes)
-{
-    ExecutorRef parent = CreateCPUBoundExecutor();
-    const WeakExecutor watch = parent;
-    ExecutorRef sub = CreateSubExecutor(parent, 1);
-    parent.reset();
-    EXPECT_FALSE(watch.expired());
-    ASSERT_TRUE(RunsAndAnswers(sub));
-    sub.reset();
-    EXPECT_TRUE(Expires(watch));
 }
 
 } // namespace

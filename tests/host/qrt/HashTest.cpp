@@ -39,7 +39,7 @@ TEST(HashTest, RunningLengthCountsEveryMixedByteModulo2To32)
     EXPECT_TRUE(hash.IsZero());
     EXPECT_EQ(QRT::HashValueToGuid(hash), QRT::Guid());
     // An empty run still changes the value.
-    QRT::MixHash::MixInString(hash, "");
+    QRT::MixHash::MixInData(hash, nullptr, 0);
     EXPECT_FALSE(hash.IsZero());
     EXPECT_EQ(hash.GetRunningLength(), 0u);
     QRT::MixHash::MixInValue(hash, uint64_t{7});
@@ -48,9 +48,12 @@ TEST(HashTest, RunningLengthCountsEveryMixedByteModulo2To32)
     hash.mBytes[13] = hash.mBytes[14] = hash.mBytes[15] = 0xFF;
     QRT::MixHash::MixInString(hash, "abc");
     EXPECT_EQ(hash.GetRunningLength(), 1u);
+    const QRT::HashValue before = hash;
+    EXPECT_THROW(QRT::MixHash::MixInData(hash, nullptr, 4), mvxcore::config::Error);
+    EXPECT_EQ(hash, before);
 }
 
-TEST(HashTest, EveryRunFollowsTheChainingRule)
+TEST(HashTest, EveryRunFollowsTheChainingRuleAndGuidsMixAsTheirBytes)
 {
     QRT::HashValue expected;
     expected = ReferenceMix(expected, "ML::RenderableNodeCommonImpl", 28);
@@ -64,7 +67,7 @@ TEST(HashTest, EveryRunFollowsTheChainingRule)
     EXPECT_EQ(hash.GetRunningLength(), 32u);
 
     // Above the one-shot buffer the streaming path must give the same digest.
-    for (size_t size : {size_t{240}, size_t{2048}, size_t{2049}, size_t{10000}})
+    for (size_t size : {size_t{2048}, size_t{2049}})
     {
         std::vector<uint8_t> data(size);
         for (size_t i = 0; i < size; ++i)
@@ -88,28 +91,16 @@ TEST(HashTest, EveryRunFollowsTheChainingRule)
     // of chaining, byte order or length handling must show up here.
     EXPECT_EQ(whole, ReferenceMix(QRT::HashValue(), "abc", 3));
     EXPECT_EQ(QRT::HashValueToGuid(whole).ToString(), "{80b88241-fce6-a9d5-7a48-03b700000003}");
-}
 
-TEST(HashTest, GuidsMixAsTheirMemoryBytesAndKeysConvertWordByWord)
-{
+    // Guids mix as their memory bytes; keys convert word by word.
     QRT::HashValue viaGuid;
     QRT::MixHash::MixInGuid(viaGuid, QRT::Guid("{01020304-0506-0708-090a-0b0c0d0e0f10}"));
     const uint8_t bytes[16] = {4, 3, 2, 1, 6, 5, 8, 7, 9, 10, 11, 12, 13, 14, 15, 16};
     EXPECT_EQ(viaGuid, ReferenceMix(QRT::HashValue(), bytes, sizeof(bytes)));
 
-    QRT::HashValue hash;
     for (uint8_t i = 0; i < 16; ++i)
         hash.mBytes[i] = static_cast<uint8_t>(0x10 + i);
     EXPECT_EQ(QRT::HashValueToGuid(hash).ToString(), "{13121110-1716-1514-1b1a-19181f1e1d1c}");
-}
-
-TEST(HashTest, NullDataWithASizeIsAContractViolation)
-{
-    QRT::HashValue hash;
-    EXPECT_THROW(QRT::MixHash::MixInData(hash, nullptr, 4), mvxcore::config::Error);
-    EXPECT_TRUE(hash.IsZero());
-    QRT::MixHash::MixInData(hash, nullptr, 0);
-    EXPECT_FALSE(hash.IsZero());
 }
 
 } // namespace

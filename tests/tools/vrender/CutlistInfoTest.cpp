@@ -71,11 +71,10 @@ TEST_F(CutlistInfoTest, ATreeUsedByTwoSegmentsIsPrintedOnceAndAnEmptyCutlistHasN
 {
     const auto red = ML::CreateSolidColorNode(0xFFFF0000u);
     auto cutlist = ML::CreateMutableCutlist(QRT::ImmutableString::CreateStatic("Twice"));
-    cutlist->AddSegment(mt::kTime_Zero, mt::TickTime::TicksToTime(mt::kTicksPerSecond),
-                        mt::kTime_Zero, red);
-    cutlist->AddSegment(mt::TickTime::TicksToTime(5 * mt::kTicksPerSecond),
-                        mt::TickTime::TicksToTime(6 * mt::kTicksPerSecond),
-                        mt::TickTime::TicksToTime(3 * mt::kTicksPerSecond), red);
+    const auto seconds = [](int inSeconds)
+    { return mt::TickTime::TicksToTime(inSeconds * mt::kTicksPerSecond); };
+    cutlist->AddSegment(seconds(0), seconds(1), seconds(0), red);
+    cutlist->AddSegment(seconds(5), seconds(6), seconds(3), red);
     cutlist->MakeImmutable();
     const std::string text = vrender::DescribeCutlist(*cutlist);
     EXPECT_NE(text.find("2 segments:\n"), std::string::npos) << text;

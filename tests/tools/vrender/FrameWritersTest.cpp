@@ -11,6 +11,7 @@
 
 #include <algorithm>
 #include <array>
+#include <cstring>
 #include <functional>
 #include <string>
 #include <tuple>
@@ -48,20 +49,6 @@ FrameRef MakeBGRA(std::uint32_t inWidth, std::uint32_t inHeight, int inAlpha)
                      });
 }
 
-const std::uint8_t* Pixel(const FrameRef& inFrame, int inX, int inY)
-{
-    return static_cast<const std::uint8_t*>(inFrame->GetBaseAddress()) +
-           inY * inFrame->GetRowBytes() + 4 * inX;
-}
-
-vrender::StreamInfo Stream(std::uint32_t inWidth, std::uint32_t inHeight)
-{
-    vrender::StreamInfo info;
-    info.mWidth = inWidth;
-    info.mHeight = inHeight;
-    return info;
-}
-
 using FrameWritersTest = vrendertest::ScratchDirectoryTest;
 
 TEST_F(FrameWritersTest, Y4MHeaderSpellsEveryField)
@@ -74,14 +61,8 @@ TEST_F(FrameWritersTest, Y4MHeaderSpellsEveryField)
                    {mt::kFrameRate_Zero, mt::kFieldType_Progressive, mt::kPixelAspectRatio_Square,
                     Y4MChroma::k444, "F0:1 Ip A1:1 C444"}};
     for (const auto& [rate, field, aspect, chroma, fields] : cases)
-    {
-        vrender::StreamInfo info = Stream(1920, 1080);
-        info.mFrameRate = rate;
-        info.mFieldType = field;
-        info.mPixelAspectRatio = aspect;
-        EXPECT_EQ(vrender::MakeY4MHeader(info, chroma),
+        EXPECT_EQ(vrender::MakeY4MHeader({1920, 1080, rate, field, aspect}, chroma),
                   std::string("YUV4MPEG2 W1920 H1080 ") + fields + " XCOLORRANGE=LIMITED\n");
-    }
 }
 
 TEST_F(FrameWritersTest, Y4M420PlanesAreExactOnAnOddSizedFrameAndSizesMustMatch)
@@ -97,7 +78,7 @@ TEST_F(FrameWritersTest, Y4M420PlanesAreExactOnAnOddSizedFrameAndSizesMustMatch)
     const fs::path path = mDirectory / "tiny.y4m";
     auto writer = vrender::CreateY4MWriter(nullptr, path.string(), Y4MChroma::k420);
     std::string error;
-    ASSERT_TRUE(writer->Begin(Stream(3, 3), error)) << error;
+    ASSERT_TRUE(writer->Begin({3, 3}, error)) << error;
     vrender::EncodedFrame encoded = writer->Encode(0, frame);
     ASSERT_EQ(encoded.mError, "");
     ASSERT_TRUE(writer->Commit(encoded, error)) << error;
@@ -120,14 +101,11 @@ TEST_F(FrameWritersTest, Y4MIntegerKernelMatchesTheGeneralConversion)
     for (const std::uint32_t height : {8u, 720u})
     {
         std::uint32_t seed = 12345;
+        const auto next = [&]
+        { return static_cast<int>((seed = seed * 1664525u + 1013904223u) >> 24); };
         const FrameRef bgra = MakeFrame(mt::kPixelFormat_BGRA_4444_8u, 37, height,
-                                        [&](int, int)
-                                        {
-                                            std::array<int, 4> pixel{0, 0, 0, 255};
-                                            for (int c = 0; c < 3; ++c)
-                                                pixel[c] =
-                                                    (seed = seed * 1664525u + 1013904223u) >> 24;
-                                            return pixel;
+                                        [&](int, int) {
+                                            return std::array<int, 4>{next(), next(), next(), 255};
                                         });
         FrameRef vuya = VF::CreateVideoFrame(mt::kPixelFormat_VUYA_4444_8u, 37, height,
                                              mt::kPixelAspectRatio_Square, false, false);
@@ -137,7 +115,7 @@ TEST_F(FrameWritersTest, Y4MIntegerKernelMatchesTheGeneralConversion)
             auto writer =
                 vrender::CreateY4MWriter(nullptr, (mDirectory / "k.y4m").string(), chroma);
             std::string error;
-            ASSERT_TRUE(writer->Begin(Stream(37, height), error)) << error;
+            ASSERT_TRUE(writer->Begin({37, height}, error)) << error;
             const std::vector<std::uint8_t> fast = writer->Encode(0, bgra).mBytes;
             const std::vector<std::uint8_t> general = writer->Encode(0, vuya).mBytes;
             ASSERT_EQ(fast.size(), general.size());
@@ -169,13 +147,11 @@ TEST_F(FrameWritersTest, PngFramesAppearOnlyOnCommitAndReadBackWithAlpha)
 {
     const std::string pattern = (mDirectory / "seq" / "f_%03d.png").string();
     auto writer = vrender::CreatePngSequenceWriter(pattern);
-    EXPECT_EQ(writer->Describe(), pattern);
     std::string error;
     ASSERT_TRUE(writer->Begin(vrender::StreamInfo{}, error)) << error;
     vrender::EncodedFrame encoded = writer->Encode(7, MakeBGRA(5, 4, 128));
     ASSERT_EQ(encoded.mError, "");
     const fs::path final = mDirectory / "seq" / "f_007.png";
-    EXPECT_EQ(encoded.mFinalPath, final.string());
     EXPECT_FALSE(fs::exists(final));
     EXPECT_TRUE(fs::exists(encoded.mTemporaryPath));
     ASSERT_TRUE(writer->Commit(encoded, error)) << error;
@@ -188,13 +164,15 @@ TEST_F(FrameWritersTest, PngFramesAppearOnlyOnCommitAndReadBackWithAlpha)
     FrameRef read;
     const VF::PngStatus status = VF::ReadPngFile(final.string(), read);
     ASSERT_TRUE(status.Succeeded()) << status.mMessage;
-    ASSERT_EQ(read->GetBounds().Width(), 5);
-    ASSERT_EQ(read->GetBounds().Height(), 4);
+    const FrameRef wanted = MakeBGRA(5, 4, 128);
+    ASSERT_EQ(read->GetBounds(), wanted->GetBounds());
     for (int y = 0; y < 4; ++y)
-        for (int x = 0; x < 5; ++x)
-            EXPECT_EQ(std::vector<int>(Pixel(read, x, y), Pixel(read, x, y) + 4),
-                      (std::vector<int>{x * 20, y * 30, 200 - x, 128}))
-                << x << "," << y;
+        EXPECT_EQ(
+            std::memcmp(
+                static_cast<const char*>(read->GetBaseAddress()) + y * read->GetRowBytes(),
+                static_cast<const char*>(wanted->GetBaseAddress()) + y * wanted->GetRowBytes(), 20),
+            0)
+            << "row " << y;
 
     // A discarded frame leaves nothing behind.
     encoded = writer->Encode(3, MakeBGRA(3, 2, 255));

@@ -46,7 +46,6 @@ TEST_F(PlanRenderTest, DefaultsComeFromTheSource)
     const vrender::RenderPlan plan = Plan({}, Clip(), 4);
     EXPECT_EQ(Summary(plan), std::tuple(0, 100, 640u, 360u, mt::PixelAspectRatio(4, 3),
                                         mt::kFieldType_Progressive, 8u));
-    EXPECT_EQ(plan.mStream.mFrameRate, mt::kFrameRate_Video25);
     EXPECT_EQ(plan.mPixelFormat, mt::kPixelFormat_BGRA_4444_8u);
     vrender::SourceFacts interlaced = Clip();
     interlaced.mFieldType = mt::kFieldType_LowerFirst;
@@ -76,19 +75,15 @@ TEST_F(PlanRenderTest, OptionsOverrideTheSource)
 
 TEST_F(PlanRenderTest, RangesBeyondTheMediaAreRefused)
 {
-    for (const auto& [start, count, message] :
-         {std::tuple<std::int64_t, std::optional<std::int64_t>, const char*>{
-              90, 31, "frames 90 to 120: the media has 100 frames (0 to 99)"},
-          {100, std::nullopt, "--start 100: the media has 100 frames (0 to 99)"}})
-    {
-        vrender::RenderOptions options;
-        options.mStart = start;
-        options.mCount = count;
-        vrender::RenderPlan plan;
-        std::string error;
-        EXPECT_FALSE(vrender::PlanRender(options, Clip(), 2, plan, error));
-        EXPECT_EQ(error, message);
-    }
+    vrender::RenderOptions options;
+    vrender::RenderPlan plan;
+    std::string error;
+    std::tie(options.mStart, options.mCount) = std::pair(90, 31);
+    EXPECT_FALSE(vrender::PlanRender(options, Clip(), 2, plan, error));
+    EXPECT_EQ(error, "frames 90 to 120: the media has 100 frames (0 to 99)");
+    std::tie(options.mStart, options.mCount) = std::pair(100, std::nullopt);
+    EXPECT_FALSE(vrender::PlanRender(options, Clip(), 2, plan, error));
+    EXPECT_EQ(error, "--start 100: the media has 100 frames (0 to 99)");
 }
 
 TEST_F(PlanRenderTest, EndlessAndStillMedia)

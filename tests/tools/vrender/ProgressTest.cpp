@@ -32,7 +32,6 @@ TEST_F(ProgressTest, Summary)
               "Rendered 50 frames in 1.25 s (40.0 fps) to out/demo/frame_%05d.png");
     EXPECT_EQ(vrender::FormatSummary(1, 0.5, "standard output"),
               "Rendered 1 frame in 0.50 s (2.0 fps) to standard output");
-    EXPECT_EQ(vrender::FormatSummary(0, 0.0, "x"), "Rendered 0 frames in 0.00 s (0.0 fps) to x");
 }
 
 TEST_F(ProgressTest, DisabledDisplayWritesNothingEnabledOneErasesItsLine)

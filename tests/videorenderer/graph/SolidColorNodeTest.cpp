@@ -7,9 +7,9 @@
 #include "graph/RenderableNodeDisabledImpl.h"
 #include "graph/RenderableNodeSolidColorImpl.h"
 
-#include <algorithm>
+#include <array>
+#include <cstring>
 #include <tuple>
-#include <vector>
 
 #include <gtest/gtest.h>
 
@@ -41,12 +41,6 @@ QRT::InterfaceRef<ML::IRenderableNodeProducer> ProducerOf(const NodeRef& inNode,
     return producer;
 }
 
-QRT::Result Produce(const NodeRef& inNode, const ML::CutlistRenderParams& inParams,
-                    FrameRef& outFrame)
-{
-    return ProducerOf(inNode, inParams)->ProduceFrame(inParams.GetFrameTime(), inParams, outFrame);
-}
-
 QRT::Guid FrameHashOf(const NodeRef& inNode, const ML::CutlistRenderParams& inParams)
 {
     QRT::Guid hash;
@@ -69,7 +63,6 @@ using SolidColorNodeTest = ::testing::Test;
 TEST_F(SolidColorNodeTest, NodeStoresTheColourAsHashedDecimal)
 {
     const NodeRef node = ML::CreateSolidColorNode(0x80FF4010u);
-    EXPECT_EQ(node->GetRenderFlags(), 0u);
     EXPECT_EQ(node->GetNodeHash(),
               HashOfRuns(
                   {"ML::RenderableNodeCommonImpl", "PropertyName::", ML::kSolidColorNodeColorKey,
@@ -83,7 +76,7 @@ TEST_F(SolidColorNodeTest, ProducerFillsEveryPixelWithTheColourTheDefaultOrZero)
     ASSERT_EQ(IR_FillWithColor(yuv, 4, kIR_PixelFormat_VUYA_4444_8u, 1, 1, 0xFF336699u, 0),
               kIR_NoError);
     const mt::PixelFormat bgra = mt::kPixelFormat_BGRA_4444_8u;
-    const std::tuple<const char*, mt::PixelFormat, std::vector<int>> cases[] = {
+    const std::tuple<const char*, mt::PixelFormat, std::array<std::uint8_t, 4>> cases[] = {
         {"4280303712", bgra, {0x60, 0x40, 0x20, 0xFF}}, // 0xFF204060, B G R A in memory
         {nullptr, bgra, {0xFF, 0xFF, 0xFF, 0xFF}},      // absent: opaque white
         {"red", bgra, {0, 0, 0, 0}},                    // unreadable: all zero
@@ -91,19 +84,18 @@ TEST_F(SolidColorNodeTest, ProducerFillsEveryPixelWithTheColourTheDefaultOrZero)
     for (const auto& [text, format, pixel] : cases)
     {
         SCOPED_TRACE(text ? text : "absent");
+        const ML::CutlistRenderParams params = Params(37, 5, format);
         FrameRef frame;
-        ASSERT_EQ(Produce(NodeWithColorText(text), Params(37, 5, format), frame),
+        ASSERT_EQ(ProducerOf(NodeWithColorText(text), params)->ProduceFrame({}, params, frame),
                   QRT::kResult_Success);
         ASSERT_TRUE(frame && frame->GetBounds().Width() == 37 && frame->GetBounds().Height() == 5);
         EXPECT_EQ(frame->GetPixelFormat(), format);
+        const auto* base = static_cast<const std::uint8_t*>(frame->GetBaseAddress());
         int mismatches = 0;
         for (int y = 0; y < 5; ++y)
             for (int x = 0; x < 37; ++x)
-            {
-                const auto* got = static_cast<const std::uint8_t*>(frame->GetBaseAddress()) +
-                                  y * frame->GetRowBytes() + 4 * x;
-                mismatches += !std::equal(pixel.begin(), pixel.end(), got);
-            }
+                mismatches +=
+                    std::memcmp(pixel.data(), base + y * frame->GetRowBytes() + 4 * x, 4) != 0;
         EXPECT_EQ(mismatches, 0);
     }
 }
@@ -116,8 +108,10 @@ TEST_F(SolidColorNodeTest, FramesThatCannotBeMadeOrFilledAnswerAStatusAndNoFrame
         {4, mt::kPixelFormat_BGRA_4444_16u, kIR_UnsupportedFormat}};
     for (const auto& [width, format, status] : cases)
     {
+        const ML::CutlistRenderParams params = Params(width, 4, format);
         FrameRef frame;
-        EXPECT_EQ(Produce(ML::CreateSolidColorNode(0xFF000000u), Params(width, 4, format), frame),
+        EXPECT_EQ(ProducerOf(ML::CreateSolidColorNode(0xFF000000u), params)
+                      ->ProduceFrame({}, params, frame),
                   status);
         EXPECT_FALSE(frame);
     }
