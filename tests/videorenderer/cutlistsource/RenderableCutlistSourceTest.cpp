@@ -32,8 +32,8 @@ TickTime Ticks(std::int64_t inTicks)
 // prefetch handle.
 QRT::InterfaceRef<TestNode> SizedNode(std::uint32_t inSeed)
 {
-    auto producer = QRT::Allocated<TestProducer>::CreateInstance(
-        QRT::Guid(0x0a000000u + inSeed, 0, 0, {0, 0, 0, 0, 0, 0, 0, 1}));
+    auto producer = QRT::Allocated<TestProducer>::CreateInstance();
+    producer->mHash = QRT::Guid(0x0a000000u + inSeed, 0, 0, {0, 0, 0, 0, 0, 0, 0, 1});
     producer->mFormat = mvxmediatypes::kPixelFormat_Invalid;
     producer->mWidth = 0;
     auto node = NewNode(producer);

@@ -83,8 +83,8 @@ protected:
     static QRT::InterfaceRef<TestProducer> NewProducer(std::uint32_t inHashSeed,
                                                        std::shared_ptr<Gate> inGate = {})
     {
-        auto producer = QRT::Allocated<TestProducer>::CreateInstance(
-            QRT::Guid(inHashSeed, 1, 2, {3, 4, 5, 6, 7, 8, 9, 10}));
+        auto producer = QRT::Allocated<TestProducer>::CreateInstance();
+        producer->mHash = QRT::Guid(inHashSeed, 1, 2, {3, 4, 5, 6, 7, 8, 9, 10});
         producer->mGate = std::move(inGate);
         return producer;
     }
