@@ -1,11 +1,11 @@
 #pragma once
 
-// A cutlist of one segment onto a test node, whose node lookup can be made to
-// fail, and a cutlist provider that records its getter calls (from any
-// thread).
+// Cutlists of one segment onto a node, cutlists whose lookups fail, and a
+// cutlist provider that records its getter calls (from any thread).
 
 #include "MF/RenderableCutlist.h"
 #include "MF/RenderableCutlistProvider.h"
+#include "ML/IMutableCutlist.h"
 #include "QRT/Allocated.h"
 
 #include <mutex>
@@ -17,51 +17,48 @@ namespace vrtest
 
 using CutlistRef = QRT::InterfaceRef<MF::IRenderableCutlist>;
 
-// One segment [mStart, mEnd) onto mNode; node time = t + mOffset - mStart.
-class TestCutlist : public QRT::Implements<MF::IRenderableCutlist>
+// A sealed cutlist of one segment [inStart, inEnd) onto inNode, whose time
+// at inStart is inOffset (ticks).
+inline CutlistRef OneSegment(const QRT::InterfaceRef<MF::IRenderableNode>& inNode,
+                             std::int64_t inStart = 0, std::int64_t inEnd = 1'000'000'000'000,
+                             std::int64_t inOffset = 0)
+{
+    using mvxmediatypes::TickTime;
+    auto cutlist = ML::CreateMutableCutlist(QRT::ImmutableString::CreateStatic("test"));
+    cutlist->AddSegment(TickTime::TicksToTime(inStart), TickTime::TicksToTime(inEnd),
+                        TickTime::TicksToTime(inOffset), inNode);
+    cutlist->MakeImmutable();
+    return CutlistRef(cutlist);
+}
+
+// The status of every lookup of a FailingCutlist.
+inline const auto kLookupFailure = static_cast<QRT::Result>(0xA0990002u);
+
+class FailingCutlist : public QRT::Implements<MF::IRenderableCutlist>
 {
 public:
-    mvxmediatypes::TickTime mStart = mvxmediatypes::kTime_Zero;
-    mvxmediatypes::TickTime mEnd = mvxmediatypes::TickTime::TicksToTime(1'000'000'000'000);
-    mvxmediatypes::TickTime mOffset = mvxmediatypes::kTime_Zero;
-    QRT::InterfaceRef<MF::IRenderableNode> mNode;
-    QRT::Result mLookupStatus = QRT::kResult_Success;
-
-    std::size_t GetSegmentCount() const override { return 1; }
+    std::size_t GetSegmentCount() const override { return 0; }
     QRT::Guid GetCutlistHash() const override { return QRT::Guid(); }
     QRT::Result GetSegment(std::size_t, mvxmediatypes::TickTime&, mvxmediatypes::TickTime&,
                            mvxmediatypes::TickTime&, QRT::Guid&) const override
     {
-        return QRT::kResult_NotFound;
+        return kLookupFailure;
     }
     QRT::Result GetNodeByHash(const QRT::Guid&,
                               QRT::InterfaceRef<MF::IRenderableNode>&) const override
     {
-        return QRT::kResult_NotFound;
+        return kLookupFailure;
     }
-    QRT::Result GetNodeAtTime(const MF::FrameTime& inTime,
-                              QRT::InterfaceRef<MF::IRenderableNode>& outNode,
-                              MF::FrameTime& outLocalTime) const override
+    QRT::Result GetNodeAtTime(const MF::FrameTime&, QRT::InterfaceRef<MF::IRenderableNode>&,
+                              MF::FrameTime&) const override
     {
-        if (QRT::Failed(mLookupStatus))
-            return mLookupStatus;
-        const mvxmediatypes::TickTime time = inTime.GetTime();
-        if (time < mStart || time >= mEnd)
-        {
-            outNode.Reset();
-            return QRT::kResult_Success;
-        }
-        outNode = mNode;
-        const mvxmediatypes::TickTime shift = mOffset - mStart;
-        outLocalTime =
-            MF::FrameTime(inTime.GetFirstFieldTime() + shift, inTime.GetSecondFieldTime() + shift);
-        return QRT::kResult_Success;
+        return kLookupFailure;
     }
     QRT::Result GetSegmentAtTime(mvxmediatypes::TickTime, std::size_t&, mvxmediatypes::TickTime&,
                                  mvxmediatypes::TickTime&, mvxmediatypes::TickTime&,
                                  QRT::Guid&) const override
     {
-        return QRT::kResult_NotFound;
+        return kLookupFailure;
     }
     QRT::ImmutableString GetName() const override { return QRT::ImmutableString(); }
 };

@@ -1,11 +1,11 @@
 #pragma once
 
-// A leaf node with one producer and one prefetch handle, both set by the
-// test, that records the ranges it is asked to prefetch. The node is shared
-// between threads; the ranges are kept under a lock.
+// A leaf node of the module's own node kind with one producer and one
+// prefetch handle, both set by the test, that records the ranges it is asked
+// to prefetch. NewNode seals it; the ranges are kept under a lock.
 
-#include "ML/IRenderableNodePrefetchProvider.h"
 #include "ML/IRenderableNodeProducerProvider.h"
+#include "ML/RenderableNodeCommonImpl.h"
 #include "QRT/Allocated.h"
 
 #include <mutex>
@@ -15,11 +15,9 @@
 namespace vrtest
 {
 
-class TestNode : public QRT::Implements<MF::IRenderableNode, ML::IRenderableNodeProducerProvider,
-                                        ML::IRenderableNodePrefetchProvider>
+class TestNodeKind : public ML::RenderableNodeCommonImpl
 {
 public:
-    QRT::Guid mHash;
     QRT::InterfaceRef<ML::IRenderableNodeProducer> mProducer;
     QRT::InterfaceRef<ML::IRenderableNodePrefetch> mPrefetch;
 
@@ -28,46 +26,12 @@ public:
         std::lock_guard lock(mMutex);
         return mPrefetchRanges;
     }
-
-    QRT::Guid GetNodeHash() const override { return mHash; }
     QRT::ImmutableString GetNodeType() const override
     {
         return QRT::ImmutableString::CreateStatic("TestNode");
     }
-    std::uint32_t GetRenderFlags() const override { return 0; }
-    void GetProperties(MF::RenderablePropertyMap&) const override {}
-    QRT::Result GetProperty(const QRT::ImmutableString&,
-                            MF::RenderablePropertyValue&) const override
-    {
-        return QRT::kResult_NotFound;
-    }
-    std::uint32_t GetInputCount() const override { return 0; }
-    QRT::Result GetInput(std::uint32_t, mvxmediatypes::TickTime&,
-                         QRT::InterfaceRef<MF::IRenderableNode>&) const override
-    {
-        return QRT::kResult_NotFound;
-    }
-    std::uint32_t GetOperatorCount() const override { return 0; }
-    QRT::Result GetOperator(std::uint32_t, QRT::InterfaceRef<MF::IRenderableNode>&) const override
-    {
-        return QRT::kResult_NotFound;
-    }
-    void GetProducer(QRT::InterfaceRef<ML::IRenderableNodeProducer>& outProducer,
-                     const MF::FrameTime&, const ML::CutlistRenderParams&) const override
-    {
-        outProducer = mProducer;
-    }
-    void GetStillRanges(mvxmediatypes::TickTime, mvxmediatypes::TickTime,
-                        MF::TickTimeRangeList&) const override
-    {
-    }
-    void GetSmartRenderTimes(mvxmediatypes::TickTime, mvxmediatypes::TickTime,
-                             const mvxmediatypes::FrameRate&, bool,
-                             std::set<mvxmediatypes::TickTime>&) const override
-    {
-    }
-    void Prefetch(const MF::TickTimeRange& inRange, const ML::CutlistRenderParams&,
-                  ML::RenderableNodePrefetchList& ioPrefetches) const override
+    void PrefetchSelf(const MF::TickTimeRange& inRange, const ML::CutlistRenderParams&,
+                      ML::RenderableNodePrefetchList& ioPrefetches) const override
     {
         {
             std::lock_guard lock(mMutex);
@@ -82,5 +46,35 @@ private:
     mutable std::mutex mMutex;
     mutable std::vector<MF::TickTimeRange> mPrefetchRanges;
 };
+
+class TestNode
+    : public ML::RenderableNodeWithInterfaces<TestNodeKind, ML::IRenderableNodeProducerProvider>
+{
+public:
+    void GetProducer(QRT::InterfaceRef<ML::IRenderableNodeProducer>& outProducer,
+                     const MF::FrameTime&, const ML::CutlistRenderParams&) const override
+    {
+        outProducer = mProducer;
+    }
+    void GetStillRanges(mvxmediatypes::TickTime, mvxmediatypes::TickTime,
+                        MF::TickTimeRangeList&) const override
+    {
+    }
+    void GetSmartRenderTimes(mvxmediatypes::TickTime, mvxmediatypes::TickTime,
+                             const mvxmediatypes::FrameRate&, bool,
+                             std::set<mvxmediatypes::TickTime>&) const override
+    {
+    }
+};
+
+// A sealed test node answering inProducer.
+inline QRT::InterfaceRef<TestNode>
+NewNode(QRT::InterfaceRef<ML::IRenderableNodeProducer> inProducer = {})
+{
+    auto node = QRT::Allocated<TestNode>::CreateInstance();
+    node->mProducer = std::move(inProducer);
+    node->MakeImmutable();
+    return node;
+}
 
 } // namespace vrtest

@@ -35,12 +35,6 @@ class TestProducer : public QRT::Implements<ML::IRenderableNodeProducer>
 public:
     using FrameRef = QRT::InterfaceRef<MF::IVideoFrame>;
 
-    TestProducer() = default;
-    explicit TestProducer(const QRT::Guid& inHash)
-        : mHash(inHash)
-    {
-    }
-
     QRT::Guid mHash{"{11111111-2222-3333-4444-555555555555}"};
     // The frame made: kPixelFormat_Invalid takes the parameters' format, a
     // width of 0 the parameters' size.

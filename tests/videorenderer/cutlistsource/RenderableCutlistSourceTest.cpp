@@ -1,7 +1,6 @@
 #include "ML/RenderableCutlistSource.h"
 
 #include "BE/CutlistProvider.h"
-#include "ML/IMutableCutlist.h"
 #include "ML/RenderStatus.h"
 #include "TestCutlists.h"
 #include "TestFrames.h"
@@ -31,14 +30,13 @@ TickTime Ticks(std::int64_t inTicks)
 
 // A node whose producer makes frames as the parameters ask, with its own
 // prefetch handle.
-QRT::InterfaceRef<TestNode> NewNode(std::uint32_t inSeed)
+QRT::InterfaceRef<TestNode> SizedNode(std::uint32_t inSeed)
 {
-    auto node = QRT::Allocated<TestNode>::CreateInstance();
-    auto producer = QRT::Allocated<TestProducer>::CreateInstance(
-        QRT::Guid(0x0a000000u + inSeed, 0, 0, {0, 0, 0, 0, 0, 0, 0, 1}));
+    auto producer = QRT::Allocated<TestProducer>::CreateInstance();
+    producer->mHash = QRT::Guid(0x0a000000u + inSeed, 0, 0, {0, 0, 0, 0, 0, 0, 0, 1});
     producer->mFormat = mvxmediatypes::kPixelFormat_Invalid;
     producer->mWidth = 0;
-    node->mProducer = producer;
+    auto node = NewNode(producer);
     node->mPrefetch = QRT::Allocated<TestPrefetch>::CreateInstance();
     return node;
 }
@@ -98,13 +96,7 @@ protected:
         auto provider = BE::CreateCutlistProvider(settings);
         CutlistRef cutlists[3];
         for (int i = 0; i < 3; ++i)
-        {
-            auto cutlist = ML::CreateMutableCutlist(QRT::ImmutableString::CreateStatic("c"));
-            cutlist->AddSegment(mvxmediatypes::kTime_Zero, Ticks(100 * kFrameTicks),
-                                mvxmediatypes::kTime_Zero, mNodes[i]);
-            cutlist->MakeImmutable();
-            cutlists[i] = cutlist;
-        }
+            cutlists[i] = OneSegment(mNodes[i], 0, 100 * kFrameTicks);
         provider->SetCutlists(mName, {cutlists[0], cutlists[1], cutlists[2]});
         return ML::CreateRenderableCutlistSource(provider, inRate, mName);
     }
@@ -116,7 +108,7 @@ protected:
 
     const QRT::ImmutableString mName = QRT::ImmutableString::CreateStatic("Timeline A");
     // Main, alternate and third.
-    const QRT::InterfaceRef<TestNode> mNodes[3] = {NewNode(1), NewNode(2), NewNode(3)};
+    const QRT::InterfaceRef<TestNode> mNodes[3] = {SizedNode(1), SizedNode(2), SizedNode(3)};
     QRT::InterfaceRef<BareCutlistProvider> mBare =
         QRT::Allocated<BareCutlistProvider>::CreateInstance();
     ML::CutlistRenderParams mParams = MakeParams(8, 4);
@@ -271,13 +263,11 @@ TEST_F(RenderableCutlistSourceTest, PrefetchesCoverBothFieldsOfTheRequestedFrame
 
 TEST_F(RenderableCutlistSourceTest, FailedLookupOrProducerIsThrownAndCollectsNothing)
 {
-    auto failing = QRT::Allocated<TestCutlist>::CreateInstance();
-    failing->mLookupStatus = static_cast<QRT::Result>(0xA0990042u);
-    mBare->mCutlists[0] = failing;
+    mBare->mCutlists[0] = QRT::Allocated<FailingCutlist>::CreateInstance();
     const auto source = BareSource();
     mFrame = MakeFrame(2, 2);
     ExpectRenderException([&] { source->RenderFrame(MF::FrameTime(Ticks(0)), mParams, mFrame); },
-                          static_cast<QRT::Result>(0xA0990042u));
+                          kLookupFailure);
     EXPECT_FALSE(mFrame);
     ML::RenderableNodePrefetchList prefetches;
     source->CollectPrefetches(MF::FrameTime(Ticks(0)), mParams, prefetches);

@@ -44,7 +44,7 @@ TEST(RequestIDTest, ConcurrentCallersGetDistinctNonZeroIdentifiersAcrossTheWrap)
     constexpr int kPerThread = 5000;
     // The wrap falls in the middle of the run.
     ML::ModuleInternals::SetLastRequestID(0xFFFFFFFFu - kThreads * kPerThread / 2);
-    std::vector<std::vector<unsigned int>> taken(kThreads);
+    std::vector<unsigned int> taken(kThreads * kPerThread);
     std::vector<std::thread> threads;
     for (int t = 0; t < kThreads; ++t)
     {
@@ -52,14 +52,12 @@ TEST(RequestIDTest, ConcurrentCallersGetDistinctNonZeroIdentifiersAcrossTheWrap)
             [&taken, t]
             {
                 for (int i = 0; i < kPerThread; ++i)
-                    taken[t].push_back(ML::GetNextRequestID());
+                    taken[t * kPerThread + i] = ML::GetNextRequestID();
             });
     }
     for (std::thread& thread : threads)
         thread.join();
-    std::set<unsigned int> all;
-    for (const auto& ids : taken)
-        all.insert(ids.begin(), ids.end());
+    const std::set<unsigned int> all(taken.begin(), taken.end());
     // Exactly the identifiers on both sides of the wrap, each once.
     EXPECT_EQ(all.size(), static_cast<std::size_t>(kThreads * kPerThread));
     EXPECT_EQ(*all.begin(), 1u);

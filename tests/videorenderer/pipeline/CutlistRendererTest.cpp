@@ -25,10 +25,6 @@ protected:
     void SetUp() override
     {
         VF::SharedVideoFrameCache::Clear();
-        mNode->mProducer = mProducer;
-        mCutlist->mNode = mNode;
-        mCutlist->mStart = TickTime::TicksToTime(1000);
-        mCutlist->mEnd = TickTime::TicksToTime(2000);
         mParams.mFullFrameWidth = 16;
         mParams.mFullFrameHeight = 8;
         mParams.mQuality = 4;
@@ -51,9 +47,8 @@ protected:
     }
 
     QRT::InterfaceRef<TestProducer> mProducer = QRT::Allocated<TestProducer>::CreateInstance();
-    QRT::InterfaceRef<TestNode> mNode = QRT::Allocated<TestNode>::CreateInstance();
-    QRT::InterfaceRef<TestCutlist> mCutlist = QRT::Allocated<TestCutlist>::CreateInstance();
-    const CutlistRef mCutlistRef{mCutlist};
+    QRT::InterfaceRef<TestNode> mNode = NewNode(mProducer);
+    const CutlistRef mCutlistRef = OneSegment(mNode, 1000, 2000);
     ML::CutlistRenderParams mParams = MakeParams(8, 4);
     const std::vector<mvxmediatypes::PixelFormat> mBGRA{kBGRA};
 };
@@ -102,9 +97,9 @@ TEST_F(CutlistRendererTest, ProducerGetsNodeTimeAndFailedLookupIsReturned)
     ASSERT_EQ(ML::CutlistRenderer::GetCutlistFrameHash(hash, mCutlistRef, mParams), 0);
     EXPECT_EQ(hash, mProducer->mHash);
 
-    mCutlist->mLookupStatus = static_cast<QRT::Result>(0xA0990003u);
-    EXPECT_EQ(ML::CutlistRenderer::GetProducerForCutlist(mCutlistRef, mParams, producer, local),
-              static_cast<QRT::Result>(0xA0990003u));
+    const CutlistRef failing = QRT::Allocated<FailingCutlist>::CreateInstance();
+    EXPECT_EQ(ML::CutlistRenderer::GetProducerForCutlist(failing, mParams, producer, local),
+              kLookupFailure);
     EXPECT_THROW(ML::CutlistRenderer::GetProducerForCutlist({}, mParams, producer, local),
                  QRT::NullInterfaceException);
 }

@@ -58,8 +58,7 @@ protected:
     void SetUp() override
     {
         VF::SharedVideoFrameCache::Clear();
-        mCutlist->mNode = mNode;
-        mProvider->mCutlists[0] = mCutlist;
+        mProvider->mCutlists[0] = OneSegment(mNode);
     }
 
     // Settings of request inRequestID rendered from mProvider's cutlists.
@@ -71,8 +70,7 @@ protected:
     }
 
     QRT::InterfaceRef<TestProducer> mProducer = QRT::Allocated<TestProducer>::CreateInstance();
-    QRT::InterfaceRef<TestNode> mNode = QRT::Allocated<TestNode>::CreateInstance();
-    QRT::InterfaceRef<TestCutlist> mCutlist = QRT::Allocated<TestCutlist>::CreateInstance();
+    QRT::InterfaceRef<TestNode> mNode = NewNode(mProducer);
     QRT::InterfaceRef<BareCutlistProvider> mProvider =
         QRT::Allocated<BareCutlistProvider>::CreateInstance();
 };
@@ -193,7 +191,7 @@ TEST_F(RenderFrameRequestTest, RenderParamsCarryRequestFieldsAndProviderFieldTyp
 TEST_F(RenderFrameRequestTest, CutlistChoiceSelectsGetterAndIsFetchedOnce)
 {
     for (auto& cutlist : mProvider->mCutlists)
-        cutlist = QRT::Allocated<TestCutlist>::CreateInstance();
+        cutlist = OneSegment(mNode);
     const std::uint32_t choices[] = {0, 1, 3};
     for (std::size_t i = 0; i < 3; ++i)
     {
@@ -212,10 +210,7 @@ TEST_F(RenderFrameRequestTest, CutlistChoiceSelectsGetterAndIsFetchedOnce)
 
 TEST_F(RenderFrameRequestTest, CutlistKeyUsesProducerInNodeTimeAndBlackHashOutsideSegments)
 {
-    mNode->mProducer = mProducer;
-    mCutlist->mStart = TickTime::TicksToTime(1000);
-    mCutlist->mEnd = TickTime::TicksToTime(5000);
-    mCutlist->mOffset = TickTime::TicksToTime(100);
+    mProvider->mCutlists[0] = OneSegment(mNode, 1000, 5000, 100);
     auto settings = CutlistSettings(2);
     ML::RenderFrameRequest inside = MakeRequest(settings);
     inside.ComputeKey(true);
@@ -230,7 +225,7 @@ TEST_F(RenderFrameRequestTest, CutlistKeyUsesProducerInNodeTimeAndBlackHashOutsi
     EXPECT_EQ(outside.mKey,
               ExpectedKey(ML::CutlistRenderer::GetBlackFrameHash(params), {kBGRA}, false, 0, 0));
 
-    mCutlist->mLookupStatus = static_cast<QRT::Result>(0xA0990002u);
+    mProvider->mCutlists[0] = QRT::Allocated<FailingCutlist>::CreateInstance();
     ML::RenderFrameRequest failing = MakeRequest(settings);
     EXPECT_THROW(failing.ComputeKey(true), ML::RenderRequestException);
 }
@@ -239,7 +234,7 @@ TEST_F(RenderFrameRequestTest, OnlyNormalPriorityStartsTheNodesPrefetchesOnce)
 {
     auto prefetch = QRT::Allocated<TestPrefetch>::CreateInstance();
     mNode->mPrefetch = prefetch;
-    mCutlist->mOffset = TickTime::TicksToTime(500);
+    mProvider->mCutlists[0] = OneSegment(mNode, 0, 1'000'000, 500);
     auto settings = CutlistSettings(3);
     settings.mPriority = 100;
     ML::RenderFrameRequest low = MakeRequest(settings);
@@ -259,22 +254,6 @@ TEST_F(RenderFrameRequestTest, OnlyNormalPriorityStartsTheNodesPrefetchesOnce)
     FrameRef result;
     normal.GetPrefetchResult(result);
     EXPECT_EQ(result, frame);
-}
-
-TEST_F(RenderFrameRequestTest, PrefetchOnlyRequestTakesGivenHandlesAndCopiesShareResult)
-{
-    auto prefetch = QRT::Allocated<TestPrefetch>::CreateInstance();
-    ML::RenderFrameRequest request = PrefetchOnly(12, prefetch);
-    request.StartPrefetches();
-    EXPECT_EQ(request.mActivePrefetches.size(), 1u);
-    EXPECT_TRUE(request.mGivenPrefetches.empty());
-    EXPECT_FALSE(request.PrefetchesWantMoreTime(1.0));
-    prefetch->mWantMoreTime = true;
-    EXPECT_TRUE(request.PrefetchesWantMoreTime(2.5));
-    const ML::RenderFrameRequest copy = request;
-    const auto frame = MakeFrame(2, 2);
-    copy.StoreResult(frame);
-    EXPECT_EQ(request.GetResult(), frame);
 }
 
 TEST_F(RenderFrameRequestTest, CompositeOnBlackTreatsPremultipliedStorageAsAssociatedColour)
