@@ -89,6 +89,7 @@ TEST_F(PixelFormatTest, EveryCatalogueFormatAnswersTheRendererBitTests)
                   std::tuple(e.bytesPerPixel, e.channels, e.bitDepth));
         EXPECT_EQ(e.format.GetCode(),
                   MakePixelFormatCode(e.code[0], e.code[1], e.code[2], e.code[3]));
+        EXPECT_EQ(GetPixelFormatName(e.format), e.name);
     }
 }
 
@@ -120,8 +121,6 @@ TEST_F(PixelFormatTest, WildcardsAndOtherFormatsHaveNoSizeAndNamesRoundTrip)
         EXPECT_EQ(PixelFormatFromName(GetPixelFormatName(format)), format);
     }
     EXPECT_EQ(values.size(), std::size(kCatalogue) + 2) << "catalogue values collide";
-    for (const Expected& e : kCatalogue)
-        EXPECT_EQ(GetPixelFormatName(e.format), e.name);
     EXPECT_EQ(GetPixelFormatName(PixelFormat(0x1234)), "");
     EXPECT_FALSE(PixelFormatFromName("bgra_4444_8u").has_value());
 }
@@ -150,7 +149,6 @@ TEST_F(PixelFormatTest, SelectNearestFollowsItsPreferenceOrder)
         {"model outranks depth", kVuya8, {kBgra8, kVuya32}, 5, kVuya32},
         {"raster before compressed", kYuyv, {kPixelFormat_MJPG_422_Compressed, kBgra8}, 5, kBgra8},
         {"same premultiplication and linearity", kBgrp32, {kBgra16f, kBgra32}, 5, kBgra32},
-        {"same float-ness", kBgra16f, {kBgra16, kBgra16f}, 5, kBgra16f},
         {"same chroma sampling", kYuyv, {kYuyvHalf, kYuyvFields, kVuya8}, 5, kYuyvFields},
         {"low quality: nearest depth", kBgra16, {kBgra32, kBgra8}, 2, kBgra8},
         {"medium quality: no precision lost", kBgra16, {kBgra32, kBgra8}, 3, kBgra32},
@@ -161,7 +159,7 @@ TEST_F(PixelFormatTest, SelectNearestFollowsItsPreferenceOrder)
         {"Any in the list takes the request", kYuyv, {kBgra8, kAny}, 5, kYuyv},
         {"Any requested: first concrete", kAny, {kAny, kVuya8, kBgra8}, 5, kVuya8},
         {"only wildcards", kBgra8, {kInvalid}, 5, kInvalid},
-        {"only Any for Any", kAny, {kAny}, 5, kInvalid}};
+    };
     for (const Case& c : cases)
         EXPECT_EQ(SelectNearestPixelFormat(c.requested, c.list, c.quality), c.expected) << c.why;
     // The two-argument form decides as at kRenderQuality_Max.
