@@ -1,10 +1,7 @@
 #include "BrambleSupport/BrambleSupport.h"
 
-#include <atomic>
 #include <string>
-#include <thread>
 #include <tuple>
-#include <vector>
 
 #include <gtest/gtest.h>
 
@@ -110,38 +107,6 @@ TEST_F(BrambleSupportTest, PlainCPluginCallsThroughTheBasicSuite)
         EXPECT_EQ(CallFirstSuiteFunctionFromC("Arithmetic Suite", version, 14), result);
     // The C caller released what it acquired.
     EXPECT_EQ(BrambleSupport::GetSuiteAcquireCount("Arithmetic Suite", 1), 0u);
-}
-
-TEST_F(BrambleSupportTest, ConcurrentRegistrationsAndAcquisitionsBalance)
-{
-    BrambleSupport::Initialize();
-    constexpr int kThreads = 6;
-    constexpr int kVersions = 50;
-    std::atomic<int> accepted{0};
-    std::atomic<int> wrong{0};
-    std::vector<std::thread> threads;
-    for (int t = 0; t < kThreads; ++t)
-        threads.emplace_back(
-            [&, t]
-            {
-                const IntSuite* table = (t % 2 == 0) ? &kTimesThreeSuite : &kPlusOneSuite;
-                for (int version = 1; version <= kVersions; ++version)
-                {
-                    // Every thread races for the shared names and then uses them.
-                    if (BrambleSupport::RegisterSuite("Shared Suite", version, table) == 0)
-                        ++accepted;
-                    const auto* got = static_cast<const IntSuite*>(
-                        BrambleSupport_AcquireSuite("Shared Suite", version));
-                    wrong += got != &kTimesThreeSuite && got != &kPlusOneSuite;
-                    wrong += BrambleSupport_ReleaseSuite("Shared Suite", version) != 0;
-                }
-            });
-    for (std::thread& thread : threads)
-        thread.join();
-    EXPECT_EQ(accepted.load(), kVersions);
-    EXPECT_EQ(wrong.load(), 0);
-    EXPECT_EQ(BrambleSupport::GetSuiteCount(), std::size_t{kVersions});
-    EXPECT_EQ(BrambleSupport::GetSuiteAcquireCount("Shared Suite", 1), 0u);
 }
 
 } // namespace
