@@ -63,7 +63,6 @@ TEST_F(ImageFileSourceTest, StillsReadBackAtEveryTimeScaleAndKeyByContent)
     ASSERT_TRUE(VF::WritePngFile(path, picture).Succeeded());
     const BE::VideoSourceRef source = OpenOrFail(path);
     EXPECT_TRUE(source->IsStill() && source->IsImage());
-    EXPECT_TRUE(source->IsPrefetchWanted(TickTime::FromSeconds(100)));
     EXPECT_EQ(source->GetAlphaChannel(), kAlphaChannel_Straight);
     const FrameRef frame = ReadFrameOrFail(source, TickTime::FromSeconds(3));
     for (int x = 0; x < 3; ++x)

@@ -180,6 +180,7 @@ TEST_F(PixelFormatTest, SelectFromRankedRequestsFollowsTheDocumentedSteps)
         {"nearest at draft", {kBgra16}, kYuyv, {kBgra8, kBgra32}, 0, true, kBgra8},
         {"Any offered: in hand", {kBgra8}, kYuyv, {kAny}, 5, true, kYuyv},
         {"Any offered, no nearest", {kBgra8}, kYuyv, {kAny}, 5, false, kBgra8},
+        {"Any offered, none in hand", {kBgra8}, kInvalid, {kAny}, 5, true, kBgra8},
         {"Any requested: in hand", {kAny}, kYuyv, {kBgra8, kYuyv}, 5, true, kYuyv},
         {"Any requested: first", {kAny}, kBgra32, {kVuya8, kBgra8}, 5, true, kVuya8},
         {"nothing available", {kBgra8}, kYuyv, {}, 5, true, kYuyv},
