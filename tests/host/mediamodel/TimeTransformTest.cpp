@@ -78,7 +78,7 @@ TEST_F(TimeTransformTest, TransformMapsClipTimeToMediaTimeAndBack)
         EXPECT_EQ(got.GetTicks(), expected.GetTicks());
 }
 
-TEST_F(TimeTransformTest, SpeedToRatioFindsTheIntendedFraction)
+TEST_F(TimeTransformTest, SpeedToRatioFindsTheIntendedFractionAndTheHashCoversEveryParameter)
 {
     const std::pair<double, MF::SpeedRatio> cases[] = {
         {1.0, {1, 1}},
@@ -94,10 +94,7 @@ TEST_F(TimeTransformTest, SpeedToRatioFindsTheIntendedFraction)
     const double odd = 0.123456789012345;
     const MF::SpeedRatio ratio = MF::SpeedToRatio(odd);
     EXPECT_EQ(static_cast<double>(ratio.mNumerator) / static_cast<double>(ratio.mDenominator), odd);
-}
-
-TEST_F(TimeTransformTest, HashCoversEveryParameter)
-{
+    // The hash covers every parameter.
     const QRT::HashValue base = HashOf(MF::CreateTimeTransform(2.5, Ticks(1), Ticks(2)));
     EXPECT_EQ(HashOf(MF::CreateRationalTimeTransform(5, 2, Ticks(1), Ticks(2))), base);
     EXPECT_NE(HashOf(MF::CreateTimeTransform(-2.5, Ticks(1), Ticks(2))), base);
