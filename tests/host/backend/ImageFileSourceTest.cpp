@@ -106,7 +106,6 @@ TEST_F(ImageFileSourceTest, DamagedFilesAreRefusedAtOpeningOrFailTheRead)
     WriteBytes(jpeg, "this is not a picture at all");
     status = BE::OpenVideoSource(jpeg, source);
     EXPECT_EQ(status.mResult, BE::kResult_MediaMalformed);
-    EXPECT_EQ(status.mMessage.substr(0, jpeg.size() + 2), jpeg + ": ");
     EXPECT_GT(status.mMessage.size(), jpeg.size() + 2) << "libjpeg's reason follows";
     EXPECT_EQ(BE::OpenVideoSource(mDirectory.File("absent.png"), source).mResult,
               BE::kResult_MediaCannotOpen);
