@@ -132,7 +132,9 @@ TEST_P(Y4MVariantTest, HeaderIsDescribedAndEveryFrameReadsAsBgra)
 }
 
 const FrameRate k25 = kFrameRate_Video25;
+const FrameRate k2997 = kFrameRate_Video2997;
 const FieldType kP = kFieldType_Progressive;
+const FieldType kUF = kFieldType_UpperFirst;
 
 // Without C: 4:2:0; A0:0 (unknown): square.
 INSTANTIATE_TEST_SUITE_P(
@@ -145,8 +147,8 @@ INSTANTIATE_TEST_SUITE_P(
                 4,
                 4,
                 "B",
-                kFrameRate_Video2997,
-                kFieldType_UpperFirst,
+                k2997,
+                kUF,
                 {10, 11}},
         Variant{"YUV4MPEG2 W4 H4 F25:1 Ib A0:0", 4, 4, "GR", k25, kFieldType_LowerFirst, {1, 1}}));
 

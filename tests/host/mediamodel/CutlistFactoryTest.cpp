@@ -12,10 +12,12 @@
 namespace
 {
 
-using Object = MF::HostObjectRef;
-using Cutlist = MF::RenderableCutlistRef;
+// Short names keep the factory's many overrides on one line each.
+using Obj = MF::HostObjectRef;
+using Cut = MF::RenderableCutlistRef;
 using Name = QRT::ImmutableString;
 using Ranges = MF::TickTimeRangeList;
+using Res = QRT::Result;
 using FactoryRef = QRT::InterfaceRef<MF::IRenderableCutlistFactory>;
 constexpr QRT::Result kNo = QRT::kResult_NotFound;
 
@@ -36,35 +38,26 @@ public:
     }
     ~TaggedFactory();
 
-    QRT::Result CreateSequenceCutlist(const Object&, const Name&, Cutlist&) override { return kNo; }
-    QRT::Result CreateSequenceCutlistForRanges(const Object&, const Ranges&, const Name&,
-                                               Cutlist&) override
+    Res CreateSequenceCutlist(const Obj&, const Name&, Cut&) override { return kNo; }
+    Res CreateSequenceCutlistForRanges(const Obj&, const Ranges&, const Name&, Cut&) override
     {
         return kNo;
     }
-    QRT::Result CreateTrackGroupCutlist(const Object&, const Name&, Cutlist&) override
+    Res CreateTrackGroupCutlist(const Obj&, const Name&, Cut&) override { return kNo; }
+    Res CreateTrackGroupCutlistForRanges(const Obj&, const Ranges&, const Name&, Cut&) override
     {
         return kNo;
     }
-    QRT::Result CreateTrackGroupCutlistForRanges(const Object&, const Ranges&, const Name&,
-                                                 Cutlist&) override
-    {
-        return kNo;
-    }
-    QRT::Result CreateTrackItemCutlist(const Object&, Cutlist&) override { return kNo; }
-    QRT::Result CreateMediaCutlist(const Object&, Cutlist& outCutlist) override
+    Res CreateTrackItemCutlist(const Obj&, Cut&) override { return kNo; }
+    Res CreateMediaCutlist(const Obj&, Cut& outCutlist) override
     {
         outCutlist.Reset();
         return mTag;
     }
-    QRT::Result CreatePreviewCutlist(const Object&, Cutlist&) override { return kNo; }
-    QRT::Result CreatePreviewSourceCutlist(const Object&, Cutlist&) override { return kNo; }
-    QRT::Result CreateMergedCutlist(const std::vector<Cutlist>&, const Name&, Cutlist&) override
-    {
-        return kNo;
-    }
-    QRT::Result CreateSequenceCutlistWithObject(const Object&, const Object&, const Name&,
-                                                Cutlist&) override
+    Res CreatePreviewCutlist(const Obj&, Cut&) override { return kNo; }
+    Res CreatePreviewSourceCutlist(const Obj&, Cut&) override { return kNo; }
+    Res CreateMergedCutlist(const std::vector<Cut>&, const Name&, Cut&) override { return kNo; }
+    Res CreateSequenceCutlistWithObject(const Obj&, const Obj&, const Name&, Cut&) override
     {
         return kNo;
     }
@@ -75,7 +68,7 @@ private:
 
 QRT::Result TagOf(const FactoryRef& inFactory)
 {
-    Cutlist cutlist;
+    Cut cutlist;
     return inFactory->CreateMediaCutlist({}, cutlist);
 }
 

@@ -15,7 +15,7 @@ constexpr auto Ticks = &TickTime::TicksToTime;
 
 using FrameTimeTest = ::testing::Test;
 
-TEST_F(FrameTimeTest, FieldOrderFollowsWhichFieldIsEarlierAndTheEarlierIsTheFrameTime)
+TEST_F(FrameTimeTest, FieldOrderFollowsTheEarlierFieldAndBadArgumentsBreakContracts)
 {
     const std::tuple<MF::FrameTime, FieldType, std::int64_t, std::int64_t> cases[] = {
         {MF::FrameTime(Ticks(1000), Ticks(1500)), kFieldType_UpperFirst, 1000, 1500},
@@ -33,7 +33,6 @@ TEST_F(FrameTimeTest, FieldOrderFollowsWhichFieldIsEarlierAndTheEarlierIsTheFram
     }
     const MF::FrameTime time(Ticks(100), Ticks(150));
     EXPECT_EQ(time.Swapped(), MF::FrameTime(Ticks(150), Ticks(100)));
-    EXPECT_NE(time.Swapped(), time);
     const TickTime field = Ticks(11'771'760);
     EXPECT_EQ(MF::FrameTime::Make(Ticks(0), kFieldType_UpperFirst, field),
               MF::FrameTime(Ticks(0), field));
@@ -47,11 +46,7 @@ TEST_F(FrameTimeTest, FieldOrderFollowsWhichFieldIsEarlierAndTheEarlierIsTheFram
     EXPECT_EQ(changed, MF::FrameTime(Ticks(30), Ticks(20)));
     changed.SetTime(Ticks(40));
     EXPECT_EQ(changed, MF::FrameTime(Ticks(40)));
-}
-
-TEST_F(FrameTimeTest, BadArgumentsBreakContracts)
-{
-    const MF::FrameTime time(Ticks(1), Ticks(2));
+    // Bad arguments break contracts.
     EXPECT_INPUT_CONTRACT(time.GetFieldTime(3), "inField == 1 || inField == 2");
     EXPECT_INPUT_CONTRACT(
         MF::FrameTime::Make(Ticks(0), kFieldType_AsSource, Ticks(1)),

@@ -11,7 +11,7 @@ using mvxmediatypes::TickTime;
 
 using KeyframeTest = ::testing::Test;
 
-TEST_F(KeyframeTest, ValueKindsUseThePluginNumbers)
+TEST_F(KeyframeTest, ValueKindsUseThePluginNumbersAndKeyframesKeepTheirParts)
 {
     EXPECT_EQ(MF::GetKeyframeValueKind(MF::KeyframeValue{}), MF::kKeyframeValueKind_None);
     // The plug-in numbers run from 2 in this order.
@@ -32,10 +32,7 @@ TEST_F(KeyframeTest, ValueKindsUseThePluginNumbers)
                                         MF::KeyframePoint{1.0, 2.0}};
     for (std::size_t index = 0; index < std::size(values); ++index)
         EXPECT_EQ(MF::GetKeyframeValueKind(values[index]), int(index) + 2);
-}
-
-TEST_F(KeyframeTest, KeyframeKeepsTimeInterpolationAndValue)
-{
+    // A keyframe keeps its time, interpolation and value.
     const MF::Keyframe keyframe(TickTime::TicksToTime(42), MF::KeyframePoint{0.5, -3.0}, 7);
     EXPECT_EQ(keyframe.GetValueKind(), MF::kKeyframeValueKind_Point);
     EXPECT_EQ(std::get<MF::KeyframePoint>(keyframe.GetValue()), (MF::KeyframePoint{0.5, -3.0}));

@@ -21,7 +21,7 @@ std::tuple<std::uint32_t, std::uint32_t> Terms(const PixelAspectRatio& inRatio)
 
 using PixelAspectRatioAdjustTest = ::testing::Test;
 
-TEST_F(PixelAspectRatioAdjustTest, RatioFollowsTheColumnAndRowFactorsInLowestTerms)
+TEST_F(PixelAspectRatioAdjustTest, RatioFollowsTheColumnAndRowFactorsAndBadSizesBreakContracts)
 {
     const std::uint32_t big = std::numeric_limits<std::uint32_t>::max() - 2;
     const std::int32_t maxSize = std::numeric_limits<std::int32_t>::max();
@@ -52,10 +52,7 @@ TEST_F(PixelAspectRatioAdjustTest, RatioFollowsTheColumnAndRowFactorsInLowestTer
     const long double got = static_cast<long double>(ratio.GetNumerator()) / ratio.GetDenominator();
     EXPECT_LT(std::fabs(got - exact),
               1.0L / (static_cast<long double>(ratio.GetDenominator()) * ratio.GetDenominator()));
-}
-
-TEST_F(PixelAspectRatioAdjustTest, BadSizesAndRatiosBreakContracts)
-{
+    // Bad sizes and ratios break contracts.
     EXPECT_INPUT_CONTRACT(MF::AdjustPixelAspectRatioForNonUniformDownsample(
                               kPixelAspectRatio_Square, 0, 480, 720, 480),
                           "inRequestedWidth > 0 && inRequestedHeight > 0");

@@ -41,7 +41,7 @@ std::int64_t FloorDiv(std::int64_t inValue, std::int64_t inDivisor)
 
 using PulldownTest = ::testing::Test;
 
-TEST_F(PulldownTest, EveryFilmFrameOfEveryCadenceMapsToTheVideoFrameHoldingIt)
+TEST_F(PulldownTest, EveryFilmFrameMapsToTheVideoFrameHoldingItAndBadInputIsRefused)
 {
     for (const FrameRate videoRate : {kFrameRate_Video2997, kFrameRate_Video30})
     {
@@ -66,10 +66,7 @@ TEST_F(PulldownTest, EveryFilmFrameOfEveryCadenceMapsToTheVideoFrameHoldingIt)
                 }
             }
     }
-}
-
-TEST_F(PulldownTest, BadInputViolatesContracts)
-{
+    // Bad input violates contracts.
     bool split = false;
     const auto map = [&](TickTime inTime, FrameRate inRate, int inCadence)
     {
