@@ -165,11 +165,6 @@ TEST_F(FieldFiltersTest, ReverseFieldDominanceSwapsTimesOnlyAndNeverPixels)
     EXPECT_EQ(follow->Rendered().at(0), upperFirst.Swapped());
     EXPECT_TRUE(RowsAre(frame, Marker(mTField, 1), Marker(mT, 2)));
     EXPECT_EQ(FieldRateOf(*filter), mvxmediatypes::kFrameRate_Video5994);
-
-    auto upper = MakeMarkedSource(Delivery::kUpperFirst);
-    const SourceRef fixedFilter = ReverseFieldDominanceOfSource(upper);
-    EXPECT_EQ(Conform(*fixedFilter, upperFirst, mParams), MF::FrameTime(mTField, mT));
-    EXPECT_EQ(Prefetched(*fixedFilter, *upper, upperFirst), upperFirst.Swapped());
 }
 
 TEST_F(FieldFiltersTest, InterlaceConsecutiveTakesEachFieldFromTheUpstreamFrameAtTwiceItsTime)

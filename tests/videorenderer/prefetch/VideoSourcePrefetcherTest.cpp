@@ -120,23 +120,6 @@ TEST_F(VideoSourcePrefetcherTest, CancelCallsTheCallbackOnceAndItsTaskRunsTheNex
     EXPECT_EQ(otherLog.Get(), Statuses{0});
 }
 
-TEST_F(VideoSourcePrefetcherTest, ImageSourcesAreReadOnTheImageExecutor)
-{
-    const ScriptedSourceRef image = MakeScriptedSource();
-    image->mImage = image->mNewFrames = true;
-    std::thread::id videoThread, imageThread;
-    ASSERT_TRUE(mVideo->Post([&] { videoThread = std::this_thread::get_id(); }));
-    ASSERT_TRUE(mImage->Post([&] { imageThread = std::this_thread::get_id(); }));
-    Enqueue(1, mLog, image);
-    Enqueue(1, mLog);
-    Drain(mImage);
-    Drain(mVideo);
-    ASSERT_EQ(image->FrameCalls().size(), 1u);
-    EXPECT_EQ(image->FrameCalls()[0].mThread, imageThread);
-    EXPECT_EQ(mSource->FrameCalls().at(0).mThread, videoThread);
-    EXPECT_NE(imageThread, videoThread);
-}
-
 TEST_F(VideoSourcePrefetcherTest, FlushDropsQueuedJobsWithoutCallbacksAndLaterJobsAreCancelled)
 {
     const auto gate = BlockVideoExecutor();
