@@ -185,8 +185,6 @@ TEST_F(FieldFiltersTest, InterlaceConsecutiveTakesEachFieldFromTheUpstreamFrameA
     EXPECT_EQ(Conform(*filter, MF::FrameTime(tHalf + Ticks(3)), mParams), MF::FrameTime(tHalf));
     EXPECT_EQ(Conform(*filter, MF::FrameTime(tHalf + Ticks(3), t + Ticks(3)), mParams),
               MF::FrameTime(tHalf, t));
-    EXPECT_EQ(Conform(*filter, MF::FrameTime(t + Ticks(3), tHalf + Ticks(3)), mParams),
-              MF::FrameTime(t, tHalf));
 
     // Both upstream frames are prefetched; a progressive request on one frame
     // prefetches once and renders that frame itself.

@@ -59,13 +59,6 @@ TEST_F(ScalerTest, Reducing1080iTo576iKeepsEveryFieldsRowsFromTheSameFieldAndEve
         EXPECT_EQ(frame->GetFieldType(), request.GetFieldOrder());
         EXPECT_TRUE(RowsFrom(frame, request));
     }
-    // An interlaced request for an odd height is rendered one row taller; a
-    // progressive one keeps the odd height.
-    const SourceRef scaler =
-        ScaleAndPARCorrectSource(MakeMarkedSource(Delivery::kUpperFirst, 16, 1080));
-    EXPECT_EQ(Render(*scaler, MF::FrameTime(mT, mTField), Reducing(575))->GetBounds().Height(),
-              576);
-    EXPECT_EQ(Render(*scaler, MF::FrameTime(mTField), Reducing(575))->GetBounds().Height(), 575);
 }
 
 TEST_F(ScalerTest, WhileReducingAProgressiveRequestTakesTheNearestFieldAndOrderIsSwapped)

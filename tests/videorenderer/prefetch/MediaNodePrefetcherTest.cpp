@@ -67,23 +67,6 @@ protected:
     }
 };
 
-TEST_F(MediaNodePrefetcherTest, AHandleOnlyWhenTheSourceWantsPrefetchOrReadsAsynchronously)
-{
-    mSource->mPrefetchWanted = false;
-    EXPECT_FALSE(Make(1));
-    mSource->mPrefetchWanted = true;
-    const PrefetchRef handle = Make(1);
-    ASSERT_TRUE(handle);
-    QRT::Guid key;
-    handle->GetPrefetchKey(key);
-    EXPECT_EQ(key, mSource->KeyFor(At(1)));
-
-    const ScriptedSourceRef async = MakeAsync();
-    EXPECT_TRUE(Make(VideoSourceRef(async), 1));
-    async->mAsyncEnabled = false;
-    EXPECT_FALSE(Make(VideoSourceRef(async), 1));
-}
-
 TEST_F(MediaNodePrefetcherTest, AQueuedReadIsPendingUntilItRunsThenDeliversThroughTheCache)
 {
     const auto gate = BlockVideoExecutor();

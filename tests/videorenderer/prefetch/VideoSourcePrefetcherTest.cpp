@@ -68,9 +68,7 @@ TEST_F(VideoSourcePrefetcherTest, OnlyASuccessfulReadUnderAKeyIsCached)
         QRT::Result mStatus;
         bool mNullKey;
         bool mCached;
-    } cases[] = {{QRT::kResult_Success, false, true},
-                 {QRT::kResult_Success, true, false},
-                 {failure, false, false}};
+    } cases[] = {{QRT::kResult_Success, false, true}, {failure, false, false}};
     std::int64_t ticks = 4;
     for (const auto& c : cases)
     {

@@ -67,8 +67,6 @@ TEST_F(RenderableGetVideoSourceTest, RatesFollowKindStillAndSourceFieldType)
     } cases[] = {
         {kProg, false, clip, k25, k25},
         {kLower, false, clip, k25, k50},
-        {kAsSource, false, clip, k25, k50},
-        {mvxmediatypes::kFieldType_Unknown, false, clip, k25, k25},
         {kUpper, true, clip, k1000, k1000},
         {kUpper, false, BE::Deprecated::kMediaInfoKind_TimeInvariant, kNoRate, kNoRate},
     };

@@ -399,7 +399,6 @@ struct FrameCall
     MF::BinaryData mBinaryData;
     BE::ColorProfile mColorProfile;
     std::int32_t mFlags = -1;
-    std::thread::id mThread;
 };
 
 struct PrefetchCall
@@ -510,8 +509,7 @@ public:
     {
         outFrame = nullptr;
         std::lock_guard lock(mMutex);
-        mFrameCalls.push_back(
-            {inTime, inRequest, inBinaryData, inColorProfile, inFlags, std::this_thread::get_id()});
+        mFrameCalls.push_back({inTime, inRequest, inBinaryData, inColorProfile, inFlags});
         if (inFlags == BE::Deprecated::kFrameRequestFlag_NoBlock)
         {
             const auto found = mHeld.find(inTime.GetTicks());
