@@ -139,12 +139,6 @@ TEST_F(FieldFiltersTest, FieldReverseSwapsTheFieldsOfTheFrameAtTheSwappedTime)
     EXPECT_EQ(RateOf(*filter), mvxmediatypes::kFrameRate_Video2997);
     EXPECT_EQ(FieldRateOf(*filter), mvxmediatypes::kFrameRate_Video5994);
 
-    // The other way round: an upper-first request over lower-first material.
-    const FrameRef reversed = Render(*FieldReverseSource(MakeMarkedSource(Delivery::kLowerFirst)),
-                                     MF::FrameTime(mT, mTField), mParams);
-    EXPECT_TRUE(RowsAre(reversed, Marker(mT, 2), Marker(mTField, 1)));
-    EXPECT_EQ(reversed->GetFieldType(), mvxmediatypes::kFieldType_UpperFirst);
-
     // A progressive request passes the upstream frame untouched.
     auto follow = MakeMarkedSource(Delivery::kFollowRequest);
     const FrameRef progressive =

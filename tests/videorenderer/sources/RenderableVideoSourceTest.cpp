@@ -249,7 +249,6 @@ TEST_F(RenderableVideoSourceTest, AlphaIsMadeStraightInvertedOrIgnoredAsDeclared
         {overBlue, pre, {}, false, false, {253, 0, 255, 128}},
         // Ignoring wins over inverting and over premultiplied.
         {straight, plain, {}, true, true, opaque},
-        {straight, pre, {}, true, false, opaque},
         {straight, plain, {}, false, true, {0x99, 0x66, 0x33, 191}},
     };
     for (const auto& c : cases)
@@ -369,7 +368,6 @@ TEST_F(RenderableVideoSourceTest, CollectsOneHandleForTheConvertedTimeOnlyWhenWa
     {
         EXPECT_EQ(hint.mTime.GetTicks(), 3 * kField25);
         EXPECT_EQ(hint.mRequest.mFieldType, kLower);
-        EXPECT_EQ(hint.mRequest.mQuality, 4u);
         EXPECT_EQ(hint.mBinaryData, mBinaryData);
     }
     // The handle reads the frame of the converted time with the same record.
