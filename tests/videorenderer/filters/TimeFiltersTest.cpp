@@ -94,9 +94,7 @@ TEST_F(TimeFiltersTest, TimeMixAtDraftQualityForOneFieldConformsToItsProgressive
         std::uint32_t mQuality;
         std::uint32_t mSingleField;
         MF::FrameTime mConformed;
-    } cases[] = {{2, 2, MF::FrameTime(F(7))},
-                 {2, 1, MF::FrameTime(F(6))},
-                 {3, 1, MF::FrameTime(F(6), F(7))}};
+    } cases[] = {{2, 2, MF::FrameTime(F(7))}, {3, 1, MF::FrameTime(F(6), F(7))}};
     for (const auto& c : cases)
     {
         CutlistRenderParams params = MakeParams(4, 6, c.mQuality);

@@ -101,9 +101,6 @@ TEST_F(RenderableGetVideoSourceTest, FrameGridIsAnchoredAtTheOriginAndKeepsTheRe
     EXPECT_EQ(Conformed(source, late, early), Pair(frame + kField25, frame));
     // A progressive request stays progressive, on the frame grid.
     EXPECT_EQ(Conformed(source, late, late), Pair(frame, frame));
-    // Over a progressive source the second field lies a whole frame later.
-    scripted->mFieldType = kProg;
-    EXPECT_EQ(Conformed(source, early, late), Pair(frame, frame + kFrame25));
 
     // Stills are not aligned; time-invariant media and clips without a rate conform to 0.
     scripted->mFieldType = kUpper;
@@ -142,9 +139,6 @@ TEST_F(RenderableGetVideoSourceTest, DrawsIntoNearestFormatWithTheClipsArguments
     // Quality 2 of the params is kRenderQuality_Low; field type 2 is lower first.
     EXPECT_EQ(calls[0].mArguments, "data 2 origin 300 second 4242 quality 2 field 2 progressive 0 "
                                    "ignore 0 invert 1 third 1 value 0.625");
-    Render(*source, MF::FrameTime(early), params);
-    EXPECT_NE(scripted->DrawCalls().at(1).mArguments.find("field 0 progressive 1"),
-              std::string::npos);
 }
 
 TEST_F(RenderableGetVideoSourceTest, ConvertsTimeByFrameNumberOnlyBetweenVideoRates)
