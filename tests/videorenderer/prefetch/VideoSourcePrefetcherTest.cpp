@@ -60,34 +60,6 @@ TEST_F(VideoSourcePrefetcherTest, ReadsOfOneSourceRunEarliestTimeFirst)
     EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 0u);
 }
 
-TEST_F(VideoSourcePrefetcherTest, OnlyASuccessfulReadUnderAKeyIsCached)
-{
-    const QRT::Result failure = static_cast<QRT::Result>(0xA0100003u);
-    const struct
-    {
-        QRT::Result mStatus;
-        bool mNullKey;
-        bool mCached;
-    } cases[] = {{QRT::kResult_Success, false, true}, {failure, false, false}};
-    std::int64_t ticks = 4;
-    for (const auto& c : cases)
-    {
-        SCOPED_TRACE(testing::Message() << "status " << c.mStatus << " null key " << c.mNullKey);
-        mSource->mFrameStatus = c.mStatus;
-        const auto& stats = VF::SharedVideoFrameCache::GetStatistics;
-        const std::uint64_t offered = stats().mInsertions + stats().mRefused;
-        CallbackLog log;
-        Enqueue(++ticks, log, {}, c.mNullKey);
-        Drain(mVideo);
-        EXPECT_EQ(log.Get(), Statuses{c.mStatus});
-        EXPECT_EQ(mSource->ReadTicks().back(), ticks);
-        const FrameRef cached =
-            VF::SharedVideoFrameCache::RetrieveFromCache(mSource->KeyFor(At(ticks)));
-        EXPECT_EQ(cached != nullptr, c.mCached);
-        EXPECT_EQ(stats().mInsertions + stats().mRefused - offered, c.mCached ? 1u : 0u);
-    }
-}
-
 TEST_F(VideoSourcePrefetcherTest, CancelCallsTheCallbackOnceAndItsTaskRunsTheNextJob)
 {
     const auto gate = BlockVideoExecutor();
