@@ -80,7 +80,6 @@ TEST_F(ScalerTest, WhileReducingAProgressiveRequestTakesTheNearestFieldAndOrderI
     EXPECT_EQ(Conform(*upperScaler, nearLater, MakeParams(16, 1080)), MF::FrameTime(mT, mTField));
     const MF::FrameTime lowerFirst(mTField, mT);
     EXPECT_EQ(Conform(*upperScaler, lowerFirst, Reducing(576)), lowerFirst);
-    EXPECT_EQ(Conform(*upperScaler, lowerFirst, MakeParams(16, 1080)), MF::FrameTime(mT, mTField));
     RenderableNodePrefetchList prefetches;
     upperScaler->CollectPrefetches(lowerFirst, Reducing(576), prefetches);
     EXPECT_EQ(upper->Prefetched().at(0), MF::FrameTime(mT, mTField));
