@@ -65,14 +65,12 @@ public:
         const std::int64_t video = conformed.GetTime().GetTicks() / kFrame;
         // The earlier field (2 x video) lies in slot 1 when upper first.
         const std::int32_t earlierSlot = mOrder == mvxmediatypes::kFieldType_UpperFirst ? 1 : 2;
-        const FrameRef frame = MakeFrame(4, mHeight,
-                                         [&](std::int32_t inX, std::int32_t inY)
-                                         {
-                                             const std::int32_t slot = inY % 2 == 0 ? 1 : 2;
-                                             const std::int64_t field =
-                                                 2 * video + (slot == earlierSlot ? 0 : 1);
-                                             return FilmPixel(FilmOfField(field), inX, inY);
-                                         });
+        const auto pixel = [&](std::int32_t inX, std::int32_t inY)
+        {
+            const std::int32_t slot = inY % 2 == 0 ? 1 : 2;
+            return FilmPixel(FilmOfField(2 * video + (slot == earlierSlot ? 0 : 1)), inX, inY);
+        };
+        const FrameRef frame = MakeFrame(4, mHeight, pixel);
         Deliver(conformed,
                 mFieldsApart ? Converted(frame, mvxmediatypes::kPixelFormat_YUYV_422_8u_Fields)
                              : frame,

@@ -59,13 +59,6 @@ TEST_F(ScalerTest, Reducing1080iTo576iKeepsEveryFieldsRowsFromTheSameFieldAndEve
         EXPECT_EQ(frame->GetFieldType(), request.GetFieldOrder());
         EXPECT_TRUE(RowsFrom(frame, request));
     }
-    // An interlaced request for an odd height is rendered one row taller; a
-    // progressive one keeps the odd height.
-    const SourceRef scaler =
-        ScaleAndPARCorrectSource(MakeMarkedSource(Delivery::kUpperFirst, 16, 1080));
-    EXPECT_EQ(Render(*scaler, MF::FrameTime(mT, mTField), Reducing(575))->GetBounds().Height(),
-              576);
-    EXPECT_EQ(Render(*scaler, MF::FrameTime(mTField), Reducing(575))->GetBounds().Height(), 575);
 }
 
 TEST_F(ScalerTest, WhileReducingAProgressiveRequestTakesTheNearestFieldAndOrderIsSwapped)
@@ -87,7 +80,6 @@ TEST_F(ScalerTest, WhileReducingAProgressiveRequestTakesTheNearestFieldAndOrderI
     EXPECT_EQ(Conform(*upperScaler, nearLater, MakeParams(16, 1080)), MF::FrameTime(mT, mTField));
     const MF::FrameTime lowerFirst(mTField, mT);
     EXPECT_EQ(Conform(*upperScaler, lowerFirst, Reducing(576)), lowerFirst);
-    EXPECT_EQ(Conform(*upperScaler, lowerFirst, MakeParams(16, 1080)), MF::FrameTime(mT, mTField));
     RenderableNodePrefetchList prefetches;
     upperScaler->CollectPrefetches(lowerFirst, Reducing(576), prefetches);
     EXPECT_EQ(upper->Prefetched().at(0), MF::FrameTime(mT, mTField));

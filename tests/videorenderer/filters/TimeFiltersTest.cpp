@@ -51,26 +51,16 @@ protected:
     const CutlistRenderParams mParams = MakeParams(4, 6);
 };
 
-// Time mix of a request upstream delivers, and time blend at speed one on
-// the grid, return the upstream frame object.
-TEST_F(TimeFiltersTest, ARequestUpstreamDeliversReturnsTheUpstreamFrameObject)
+TEST_F(TimeFiltersTest, TimeMixTakesEachFieldOrFrameFromUpstreamAtItsTime)
 {
     auto upper = MakeMarkedSource(Delivery::kUpperFirst);
     const SourceRef mix = TimeMixSource(upper);
-    const SourceRef blend = Blend(upper, 1.0);
-    const MF::FrameTime request(F(6), F(7));
-    EXPECT_EQ(Conform(*mix, request, mParams), request);
-    EXPECT_TRUE(upper->LastFrame() == Render(*mix, request, mParams));
-    EXPECT_TRUE(upper->LastFrame() == Render(*blend, request, mParams));
-    EXPECT_EQ(RateOf(*mix), mvxmediatypes::kFrameRate_Video5994);
-    EXPECT_EQ(RateOf(*blend), mvxmediatypes::kFrameRate_Video1000);
-}
-
-TEST_F(TimeFiltersTest, TimeMixTakesEachFieldFromTheUpstreamFieldAtItsTimeInBothOrders)
-{
-    auto upper = MakeMarkedSource(Delivery::kUpperFirst);
-    const SourceRef mix = TimeMixSource(upper);
-    // The request straddles upstream frames 3 (fields 6, 7) and 4 (fields 8, 9).
+    EXPECT_TRUE(
+        RowsAre(Render(*mix, MF::FrameTime(F(7)), mParams), Marker(F(7), 2), Marker(F(7), 2)));
+    EXPECT_EQ(upper->Rendered().size(), 1u);
+    EXPECT_TRUE(
+        RowsAre(Render(*mix, MF::FrameTime(F(6)), mParams), Marker(F(6), 1), Marker(F(6), 1)));
+    // An interlaced request straddling upstream frames 3 (fields 6, 7) and 4 (fields 8, 9).
     const MF::FrameTime upperFirst(F(7), F(8));
     EXPECT_TRUE(RowsAre(Render(*mix, upperFirst, mParams), Marker(F(7), 2), Marker(F(8), 1)));
     EXPECT_TRUE(RowsAre(Render(*mix, MF::FrameTime(F(8), F(7)), mParams), Marker(F(8), 1),
@@ -80,17 +70,15 @@ TEST_F(TimeFiltersTest, TimeMixTakesEachFieldFromTheUpstreamFieldAtItsTimeInBoth
               (std::vector{MF::FrameTime(F(8), F(9)), MF::FrameTime(F(6), F(7))}));
     // Times off the field grid are aligned down to it.
     EXPECT_EQ(Conform(*mix, MF::FrameTime(F(7) + Ticks(5), F(8) + Ticks(5)), mParams), upperFirst);
-}
-
-TEST_F(TimeFiltersTest, TimeMixOfAProgressiveRequestKeepsTheFieldOrFrameAtItsTime)
-{
-    auto upper = MakeMarkedSource(Delivery::kUpperFirst);
-    const SourceRef mix = TimeMixSource(upper);
-    EXPECT_TRUE(
-        RowsAre(Render(*mix, MF::FrameTime(F(7)), mParams), Marker(F(7), 2), Marker(F(7), 2)));
-    EXPECT_EQ(upper->Rendered().size(), 1u);
-    EXPECT_TRUE(
-        RowsAre(Render(*mix, MF::FrameTime(F(6)), mParams), Marker(F(6), 1), Marker(F(6), 1)));
+    // A request upstream delivers, also through time blend at speed one on the
+    // grid, returns the upstream frame object.
+    const SourceRef blend = Blend(upper, 1.0);
+    const MF::FrameTime request(F(6), F(7));
+    EXPECT_EQ(Conform(*mix, request, mParams), request);
+    EXPECT_TRUE(upper->LastFrame() == Render(*mix, request, mParams));
+    EXPECT_TRUE(upper->LastFrame() == Render(*blend, request, mParams));
+    EXPECT_EQ(RateOf(*mix), mvxmediatypes::kFrameRate_Video5994);
+    EXPECT_EQ(RateOf(*blend), mvxmediatypes::kFrameRate_Video1000);
     // Progressive material off its grid keeps the whole frame.
     auto progressive = MakeMarkedSource(Delivery::kProgressive);
     const FrameRef frame = Render(*TimeMixSource(progressive), MF::FrameTime(F(7)), mParams);
@@ -106,9 +94,7 @@ TEST_F(TimeFiltersTest, TimeMixAtDraftQualityForOneFieldConformsToItsProgressive
         std::uint32_t mQuality;
         std::uint32_t mSingleField;
         MF::FrameTime mConformed;
-    } cases[] = {{2, 2, MF::FrameTime(F(7))},
-                 {2, 1, MF::FrameTime(F(6))},
-                 {3, 1, MF::FrameTime(F(6), F(7))}};
+    } cases[] = {{2, 2, MF::FrameTime(F(7))}, {3, 1, MF::FrameTime(F(6), F(7))}};
     for (const auto& c : cases)
     {
         CutlistRenderParams params = MakeParams(4, 6, c.mQuality);
@@ -138,16 +124,15 @@ TEST_F(TimeFiltersTest, TimeBlendAtHalfSpeedBlendsTheTwoFieldsAroundEachOutputFi
                         WeightedSum({{0.5, seven}, {0.5, Marker(F(8), 1)}}), Marker(F(8), 1), 1));
     EXPECT_EQ(Prefetches(*blend, *upper, straddling),
               (std::vector{MF::FrameTime(F(6), F(7)), MF::FrameTime(F(8), F(9))}));
-}
 
-TEST_F(TimeFiltersTest, TimeBlendOfAProgressiveRequestBlendsTheFramesAroundItsSecondTime)
-{
-    const SourceRef blend = Blend(MakeMarkedSource(Delivery::kProgressive), 0.5);
+    // A progressive request blends the frames around its time.
+    const SourceRef progressive = Blend(MakeMarkedSource(Delivery::kProgressive), 0.5);
     const TickTime three = Ticks(3 * kFrame);
     const TickTime four = Ticks(4 * kFrame);
-    EXPECT_TRUE(RowsAre(Render(*blend, MF::FrameTime(Ticks(3 * kFrame + kFrame / 4)), mParams),
-                        WeightedSum({{0.75, Marker(three, 1)}, {0.25, Marker(four, 1)}}),
-                        WeightedSum({{0.75, Marker(three, 2)}, {0.25, Marker(four, 2)}}), 1));
+    EXPECT_TRUE(
+        RowsAre(Render(*progressive, MF::FrameTime(Ticks(3 * kFrame + kFrame / 4)), mParams),
+                WeightedSum({{0.75, Marker(three, 1)}, {0.25, Marker(four, 1)}}),
+                WeightedSum({{0.75, Marker(three, 2)}, {0.25, Marker(four, 2)}}), 1));
 }
 
 TEST_F(TimeFiltersTest, TimeBlendAtTwoAndAHalfAccumulatesEveryFieldInEachOutputFieldsSpan)

@@ -67,23 +67,6 @@ protected:
     }
 };
 
-TEST_F(MediaNodePrefetcherTest, AHandleOnlyWhenTheSourceWantsPrefetchOrReadsAsynchronously)
-{
-    mSource->mPrefetchWanted = false;
-    EXPECT_FALSE(Make(1));
-    mSource->mPrefetchWanted = true;
-    const PrefetchRef handle = Make(1);
-    ASSERT_TRUE(handle);
-    QRT::Guid key;
-    handle->GetPrefetchKey(key);
-    EXPECT_EQ(key, mSource->KeyFor(At(1)));
-
-    const ScriptedSourceRef async = MakeAsync();
-    EXPECT_TRUE(Make(VideoSourceRef(async), 1));
-    async->mAsyncEnabled = false;
-    EXPECT_FALSE(Make(VideoSourceRef(async), 1));
-}
-
 TEST_F(MediaNodePrefetcherTest, AQueuedReadIsPendingUntilItRunsThenDeliversThroughTheCache)
 {
     const auto gate = BlockVideoExecutor();
@@ -152,22 +135,6 @@ TEST_F(MediaNodePrefetcherTest, HandlesForOneKeyShareOneReadThatTheLastCancelWit
     }
 }
 
-TEST_F(MediaNodePrefetcherTest, CachedFrameIsTakenAtOnce)
-{
-    const Guid key = mSource->KeyFor(At(9));
-    const FrameRef cached = MakeFilledFrame(6, 2, Pixel{});
-    VF::SharedVideoFrameCache::InsertIntoCache(cached, key, VF::kCachePriority_High);
-    const PrefetchRef handle = Make(9);
-    EXPECT_EQ(handle->InitiatePrefetch(), QRT::kResult_Success);
-    EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 0u);
-    EXPECT_EQ(mSource->HoldCount(), 0);
-    EXPECT_EQ(GetMediaNodePrefetchReferenceCount(key), 0u);
-    EXPECT_FALSE(handle->ContinueWaitingForPrefetch(0.0));
-    EXPECT_EQ(Taken(handle).Get(), cached.Get());
-    Drain(mVideo);
-    EXPECT_TRUE(mSource->ReadTicks().empty());
-}
-
 // A frame that reaches the cache by another road while the key's read is still
 // queued: the last handle, taking it, withdraws the read instead of leaving it
 // counted and running for nobody.
@@ -186,6 +153,13 @@ TEST_F(MediaNodePrefetcherTest, FrameCachedWhileTheReadIsQueuedWithdrawsTheRead)
         EXPECT_EQ(GetMediaNodePrefetchReferenceCount(key), 0u);
         gate->Open();
     }
+    // A frame already cached when the handle starts is taken at once.
+    const PrefetchRef handle = Make(5);
+    EXPECT_EQ(handle->InitiatePrefetch(), QRT::kResult_Success);
+    EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 0u);
+    EXPECT_EQ(GetMediaNodePrefetchReferenceCount(key), 0u);
+    EXPECT_FALSE(handle->ContinueWaitingForPrefetch(0.0));
+    EXPECT_TRUE(Taken(handle));
     Drain(mVideo);
     EXPECT_TRUE(mSource->ReadTicks().empty());
 }
@@ -233,7 +207,7 @@ TEST_F(MediaNodePrefetcherTest, NullKeyHandlesReadForThemselvesWithoutCaching)
     }
 }
 
-TEST_F(MediaNodePrefetcherTest, AsyncReadIsStartedOnceWaitedForTakenAndWithdrawnByTheLastCancel)
+TEST_F(MediaNodePrefetcherTest, AsyncReadIsStartedOnceTakenAndWithdrawnByTheLastCancelOrFailure)
 {
     const ScriptedSourceRef async = MakeAsync();
     const Guid key = async->KeyFor(At(2));
@@ -259,22 +233,19 @@ TEST_F(MediaNodePrefetcherTest, AsyncReadIsStartedOnceWaitedForTakenAndWithdrawn
     EXPECT_EQ(cancelled->mCancels.load(), 0);
     b->CancelPrefetch();
     EXPECT_EQ(cancelled->mCancels.load(), 1);
-}
 
-TEST_F(MediaNodePrefetcherTest, FailedAsyncStartLeavesTheHandleInert)
-{
-    const ScriptedSourceRef async = MakeAsync();
+    // A failed start leaves the handle inert.
+    const ScriptedSourceRef failing = MakeAsync();
     const QRT::Result failure = static_cast<QRT::Result>(0xA0100004u);
-    async->mStartStatus = failure;
-    const Guid key = async->KeyFor(At(3));
-    const PrefetchRef handle = Make(VideoSourceRef(async), 3);
+    failing->mStartStatus = failure;
+    const PrefetchRef handle = Make(VideoSourceRef(failing), 3);
     EXPECT_EQ(handle->InitiatePrefetch(), failure);
-    EXPECT_EQ(GetMediaNodePrefetchReferenceCount(key), 0u);
-    EXPECT_EQ(Dependencies(key), 0u);
+    EXPECT_EQ(GetMediaNodePrefetchReferenceCount(failing->KeyFor(At(3))), 0u);
+    EXPECT_EQ(Dependencies(failing->KeyFor(At(3))), 0u);
     EXPECT_FALSE(handle->ContinueWaitingForPrefetch(0.0));
     EXPECT_FALSE(Taken(handle));
     EXPECT_EQ(handle->CancelPrefetch(), QRT::kResult_Success);
-    EXPECT_EQ(async->mCancels.load(), 0);
+    EXPECT_EQ(failing->mCancels.load(), 0);
 }
 
 TEST_F(MediaNodePrefetcherTest, AsyncTimeoutAssertsOnceUnlessSilencedAndFallsBackToTheQueue)

@@ -4,8 +4,6 @@
 #include "PrefetchFixture.h"
 #include "mvxcore/config/Error.h"
 
-#include <random>
-
 namespace ML::Test
 {
 namespace
@@ -62,40 +60,6 @@ TEST_F(VideoSourcePrefetcherTest, ReadsOfOneSourceRunEarliestTimeFirst)
     EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 0u);
 }
 
-TEST_F(VideoSourcePrefetcherTest, OnlyASuccessfulReadUnderAKeyIsCached)
-{
-    const QRT::Result failure = static_cast<QRT::Result>(0xA0100003u);
-    const struct
-    {
-        QRT::Result mStatus;
-        bool mNullKey;
-        bool mCached;
-    } cases[] = {{QRT::kResult_Success, false, true},
-                 {QRT::kResult_Success, true, false},
-                 {failure, false, false}};
-    std::int64_t ticks = 4;
-    for (const auto& c : cases)
-    {
-        SCOPED_TRACE(testing::Message() << "status " << c.mStatus << " null key " << c.mNullKey);
-        mSource->mFrameStatus = c.mStatus;
-        const auto& stats = VF::SharedVideoFrameCache::GetStatistics;
-        const std::uint64_t offered = stats().mInsertions + stats().mRefused;
-        CallbackLog log;
-        Enqueue(++ticks, log, {}, c.mNullKey);
-        Drain(mVideo);
-        EXPECT_EQ(log.Get(), Statuses{c.mStatus});
-        EXPECT_EQ(mSource->ReadTicks().back(), ticks);
-        const FrameRef cached =
-            VF::SharedVideoFrameCache::RetrieveFromCache(mSource->KeyFor(At(ticks)));
-        EXPECT_EQ(cached != nullptr, c.mCached);
-        if (cached)
-        {
-            EXPECT_EQ(cached->GetBounds(), QRT::ParamRect(0, 0, 4, 2));
-        }
-        EXPECT_EQ(stats().mInsertions + stats().mRefused - offered, c.mCached ? 1u : 0u);
-    }
-}
-
 TEST_F(VideoSourcePrefetcherTest, CancelCallsTheCallbackOnceAndItsTaskRunsTheNextJob)
 {
     const auto gate = BlockVideoExecutor();
@@ -112,8 +76,9 @@ TEST_F(VideoSourcePrefetcherTest, CancelCallsTheCallbackOnceAndItsTaskRunsTheNex
     CancelVideoSourcePrefetch(VideoSourceRef(mSource), Guid());
     EXPECT_EQ(cancelled.Get(), Statuses{kResult_Cancelled});
     EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 3u);
-    // A second cancel finds nothing and calls nothing.
+    // A second cancel finds nothing and calls nothing, nor does one for a source without jobs.
     CancelVideoSourcePrefetch(VideoSourceRef(mSource), mSource->KeyFor(At(1)));
+    CancelVideoSourcePrefetch(VideoSourceRef(MakeScriptedSource()), mSource->KeyFor(At(2)));
 
     gate->Open();
     Drain(mVideo);
@@ -123,23 +88,6 @@ TEST_F(VideoSourcePrefetcherTest, CancelCallsTheCallbackOnceAndItsTaskRunsTheNex
     EXPECT_EQ(cancelled.Get().size(), 1u);
     EXPECT_EQ(mLog.Get(), (Statuses{0, 0}));
     EXPECT_EQ(otherLog.Get(), Statuses{0});
-}
-
-TEST_F(VideoSourcePrefetcherTest, ImageSourcesAreReadOnTheImageExecutor)
-{
-    const ScriptedSourceRef image = MakeScriptedSource();
-    image->mImage = image->mNewFrames = true;
-    std::thread::id videoThread, imageThread;
-    ASSERT_TRUE(mVideo->Post([&] { videoThread = std::this_thread::get_id(); }));
-    ASSERT_TRUE(mImage->Post([&] { imageThread = std::this_thread::get_id(); }));
-    Enqueue(1, mLog, image);
-    Enqueue(1, mLog);
-    Drain(mImage);
-    Drain(mVideo);
-    ASSERT_EQ(image->FrameCalls().size(), 1u);
-    EXPECT_EQ(image->FrameCalls()[0].mThread, imageThread);
-    EXPECT_EQ(mSource->FrameCalls().at(0).mThread, videoThread);
-    EXPECT_NE(imageThread, videoThread);
 }
 
 TEST_F(VideoSourcePrefetcherTest, FlushDropsQueuedJobsWithoutCallbacksAndLaterJobsAreCancelled)
@@ -181,54 +129,6 @@ TEST_F(VideoSourcePrefetcherTest, EnqueueWithoutExecutorsViolatesItsInputContrac
               "sVideoSourcePrefetcherQueue != NULL && sImageSourcePrefetcherQueue != NULL");
     EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 0u);
     EXPECT_TRUE(mLog.Get().empty());
-}
-
-// Many threads enqueue and cancel reads of a few sources while two executor
-// threads run them: every job ends exactly once, as a read or a cancellation.
-TEST_F(VideoSourcePrefetcherTest, ConcurrentEnqueueAndCancelEndEveryJobExactlyOnce)
-{
-    const ExecutorRef video = UseTwoVideoThreads();
-    const std::vector<ScriptedSourceRef> sources{mSource, MakeScriptedSource(),
-                                                 MakeScriptedSource()};
-    sources[1]->mNewFrames = sources[2]->mNewFrames = true;
-    constexpr int kThreads = 4;
-    constexpr int kJobsPerThread = 200;
-    std::atomic<int> completed{0}, cancelled{0}, other{0};
-    const auto callback = [&](QRT::Result inStatus)
-    {
-        ++(inStatus == QRT::kResult_Success ? completed
-           : inStatus == kResult_Cancelled  ? cancelled
-                                            : other);
-    };
-    std::vector<std::thread> threads;
-    for (int t = 0; t < kThreads; ++t)
-        threads.emplace_back(
-            [&, t]
-            {
-                std::mt19937 random(t);
-                for (int j = 0; j < kJobsPerThread; ++j)
-                {
-                    const ScriptedSourceRef& source = sources[random() % sources.size()];
-                    const TickTime time = At(t * 100000 + j);
-                    EnqueueVideoSourcePrefetch(time, VideoSourceRef(source), {}, {}, {},
-                                               source->KeyFor(time), callback);
-                    if (random() % 2)
-                        CancelVideoSourcePrefetch(VideoSourceRef(source), source->KeyFor(time));
-                }
-            });
-    for (std::thread& thread : threads)
-        thread.join();
-    while (GetQueuedVideoSourcePrefetchCount() != 0)
-        std::this_thread::yield();
-    video->BeginShutdown();
-    video->WaitForRunningTasks();
-
-    std::size_t reads = 0;
-    for (const ScriptedSourceRef& source : sources)
-        reads += source->ReadTicks().size();
-    EXPECT_EQ(completed.load() + cancelled.load(), kThreads * kJobsPerThread);
-    EXPECT_EQ(other.load(), 0);
-    EXPECT_EQ(reads, static_cast<std::size_t>(completed.load()));
 }
 
 } // namespace

@@ -22,6 +22,7 @@
 #include "BE/IVideoSource.h"
 #include "ML/CutlistRenderParams.h"
 #include "ML/IRenderableSource.h"
+#include "ML/RenderRequestException.h"
 #include "QRT/Allocated.h"
 #include "VF/VideoFrame.h"
 #include "VF/VideoFrameManipulators.h"
@@ -95,29 +96,20 @@ inline Pixel ReadPixel(const MF::IVideoFrame& inFrame, std::int32_t inX, std::in
     return pixel;
 }
 
-// Sets every pixel of a BGRA 8-bit frame to inPixelAt(x, y).
-inline void Paint(MF::IVideoFrame& ioFrame,
-                  const std::function<Pixel(std::int32_t, std::int32_t)>& inPixelAt)
+inline FrameRef MakeFrame(std::uint32_t inWidth, std::uint32_t inHeight,
+                          const std::function<Pixel(std::int32_t, std::int32_t)>& inPixelAt)
 {
-    const QRT::ParamRect bounds = ioFrame.GetBounds();
-    auto* base = static_cast<std::uint8_t*>(ioFrame.GetWritableBaseAddress());
-    for (std::int32_t y = 0; y < bounds.Height(); ++y)
-        for (std::int32_t x = 0; x < bounds.Width(); ++x)
+    FrameRef frame =
+        VF::CreateVideoFrame(mvxmediatypes::kPixelFormat_BGRA_4444_8u, inWidth, inHeight,
+                             mvxmediatypes::kPixelAspectRatio_Square, false, false);
+    auto* base = static_cast<std::uint8_t*>(frame->GetWritableBaseAddress());
+    for (std::int32_t y = 0; y < static_cast<std::int32_t>(inHeight); ++y)
+        for (std::int32_t x = 0; x < static_cast<std::int32_t>(inWidth); ++x)
         {
             const Pixel pixel = inPixelAt(x, y);
-            std::memcpy(base + static_cast<std::ptrdiff_t>(y) * ioFrame.GetRowBytes() + x * 4,
+            std::memcpy(base + static_cast<std::ptrdiff_t>(y) * frame->GetRowBytes() + x * 4,
                         &pixel, 4);
         }
-}
-
-inline FrameRef
-MakeFrame(std::uint32_t inWidth, std::uint32_t inHeight,
-          const std::function<Pixel(std::int32_t, std::int32_t)>& inPixelAt,
-          mvxmediatypes::PixelAspectRatio inRatio = mvxmediatypes::kPixelAspectRatio_Square)
-{
-    FrameRef frame = VF::CreateVideoFrame(mvxmediatypes::kPixelFormat_BGRA_4444_8u, inWidth,
-                                          inHeight, inRatio, false, false);
-    Paint(*frame, inPixelAt);
     return frame;
 }
 
@@ -212,6 +204,21 @@ inline FrameRef Render(IRenderableSource& inSource, const MF::FrameTime& inTime,
     return frame;
 }
 
+// The status of the RenderRequestException that rendering throws (0 when none).
+inline QRT::Result RenderStatus(IRenderableSource& inSource, const CutlistRenderParams& inParams,
+                                FrameRef& outFrame)
+{
+    try
+    {
+        inSource.RenderFrame(MF::FrameTime(), inParams, outFrame);
+    }
+    catch (const RenderRequestException& exception)
+    {
+        return exception.GetStatus();
+    }
+    return QRT::kResult_Success;
+}
+
 inline FrameRate RateOf(IRenderableSource& inSource)
 {
     FrameRate rate;
@@ -255,21 +262,9 @@ public:
         std::lock_guard lock(mLogLock);
         mPrefetched.push_back(inTime);
     }
-    std::vector<MF::FrameTime> Prefetched() const
-    {
-        std::lock_guard lock(mLogLock);
-        return mPrefetched;
-    }
-    std::vector<MF::FrameTime> Rendered() const
-    {
-        std::lock_guard lock(mLogLock);
-        return mRendered;
-    }
-    FrameRef LastFrame() const
-    {
-        std::lock_guard lock(mLogLock);
-        return mLastFrame;
-    }
+    std::vector<MF::FrameTime> Prefetched() const { return Locked(mPrefetched); }
+    std::vector<MF::FrameTime> Rendered() const { return Locked(mRendered); }
+    FrameRef LastFrame() const { return Locked(mLastFrame); }
 
 protected:
     // Marks inFrame shared, logs it and hands it out.
@@ -283,6 +278,13 @@ protected:
     }
 
 private:
+    template <typename T>
+    T Locked(const T& inLog) const
+    {
+        std::lock_guard lock(mLogLock);
+        return inLog;
+    }
+
     mutable std::mutex mLogLock; // guards the three logs
     std::vector<MF::FrameTime> mPrefetched;
     std::vector<MF::FrameTime> mRendered;
@@ -320,8 +322,13 @@ public:
         else if (mDelivery == Delivery::kFollowRequest && inRequested.IsProgressive())
             outConformed = MF::FrameTime(inRequested.GetTime().AlignToFrame(mRate * 2));
         else
-            outConformed =
-                MF::FrameTime::Make(frame, OrderOf(inRequested), (mRate * 2).GetFrameDuration());
+        {
+            const mvxmediatypes::FieldType order =
+                mDelivery == Delivery::kFollowRequest ? inRequested.GetFieldOrder()
+                : mDelivery == Delivery::kUpperFirst  ? mvxmediatypes::kFieldType_UpperFirst
+                                                      : mvxmediatypes::kFieldType_LowerFirst;
+            outConformed = MF::FrameTime::Make(frame, order, (mRate * 2).GetFrameDuration());
+        }
     }
 
     void RenderFrame(const MF::FrameTime& inTime, const CutlistRenderParams& inParams,
@@ -347,14 +354,6 @@ public:
     }
 
 private:
-    mvxmediatypes::FieldType OrderOf(const MF::FrameTime& inRequested) const
-    {
-        if (mDelivery == Delivery::kFollowRequest)
-            return inRequested.GetFieldOrder();
-        return mDelivery == Delivery::kUpperFirst ? mvxmediatypes::kFieldType_UpperFirst
-                                                  : mvxmediatypes::kFieldType_LowerFirst;
-    }
-
     const Delivery mDelivery;
     const FrameRate mRate;
     const std::uint32_t mWidth;
@@ -400,7 +399,6 @@ struct FrameCall
     MF::BinaryData mBinaryData;
     BE::ColorProfile mColorProfile;
     std::int32_t mFlags = -1;
-    std::thread::id mThread;
 };
 
 struct PrefetchCall
@@ -455,11 +453,7 @@ public:
     std::atomic<int> mCancels{0};
 
     // --- Records --------------------------------------------------------------
-    std::vector<FrameCall> FrameCalls() const
-    {
-        std::lock_guard lock(mMutex);
-        return mFrameCalls;
-    }
+    std::vector<FrameCall> FrameCalls() const { return Locked(mFrameCalls); }
     // The times of the reads (requests with kFrameRequestFlag_Read), in order.
     std::vector<std::int64_t> ReadTicks() const
     {
@@ -469,17 +463,8 @@ public:
                 ticks.push_back(call.mTime.GetTicks());
         return ticks;
     }
-    std::vector<PrefetchCall> PrefetchCalls() const
-    {
-        std::lock_guard lock(mMutex);
-        return mPrefetchCalls;
-    }
-    std::vector<DrawCall> DrawCalls() const
-    {
-        std::lock_guard lock(mMutex);
-        return mDrawCalls;
-    }
-    int HoldCount() const { return mHolds.load(); }
+    std::vector<PrefetchCall> PrefetchCalls() const { return Locked(mPrefetchCalls); }
+    std::vector<DrawCall> DrawCalls() const { return Locked(mDrawCalls); }
 
     Guid KeyFor(TickTime inTime) const
     {
@@ -524,8 +509,7 @@ public:
     {
         outFrame = nullptr;
         std::lock_guard lock(mMutex);
-        mFrameCalls.push_back(
-            {inTime, inRequest, inBinaryData, inColorProfile, inFlags, std::this_thread::get_id()});
+        mFrameCalls.push_back({inTime, inRequest, inBinaryData, inColorProfile, inFlags});
         if (inFlags == BE::Deprecated::kFrameRequestFlag_NoBlock)
         {
             const auto found = mHeld.find(inTime.GetTicks());
@@ -576,11 +560,7 @@ public:
     {
         return KeyFor(inTime);
     }
-    BE::Deprecated::PrefetchHold GetPrefetchHold() override
-    {
-        mHolds.fetch_add(1);
-        return std::make_shared<int>(0);
-    }
+    BE::Deprecated::PrefetchHold GetPrefetchHold() override { return std::make_shared<int>(0); }
 
     // --- IMediaInfo -------------------------------------------------------------
     std::int32_t GetKind() const noexcept override { return mKind; }
@@ -618,12 +598,18 @@ public:
     }
 
 private:
+    template <typename T>
+    T Locked(const T& inRecord) const
+    {
+        std::lock_guard lock(mMutex);
+        return inRecord;
+    }
+
     mutable std::mutex mMutex; // guards the call records and mHeld
     std::vector<FrameCall> mFrameCalls;
     std::vector<PrefetchCall> mPrefetchCalls;
     std::vector<DrawCall> mDrawCalls;
     std::map<std::int64_t, FrameRef> mHeld;
-    std::atomic<int> mHolds{0};
     std::atomic<bool> mCompleted{false};
 };
 
