@@ -181,51 +181,6 @@ TEST_F(SharedVideoFrameCacheTest, NotificationIsCalledOutsideEveryLock)
     EXPECT_EQ(calls.load(), 1 + 64 + 1);
 }
 
-TEST_F(SharedVideoFrameCacheTest, ConcurrentInsertAndRetrieveStayConsistent)
-{
-    VF::VideoFrameCache cache(40 * kFrameBytes, true);
-    constexpr uint32_t kKeys = 120;
-    std::atomic<uint64_t> notifications{0}, retrieves{0}, inserts{0}, wrongFrames{0};
-    cache.SetNotificationFunction([&](const Guid&) { ++notifications; });
-    std::vector<std::thread> threads;
-    for (uint32_t t = 0; t < 4; ++t)
-        threads.emplace_back(
-            [&, t]
-            {
-                uint32_t state = 12345u + t * 7919u;
-                for (uint32_t n = 0; n < 3000; ++n)
-                {
-                    state = state * 1664525u + 1013904223u;
-                    const uint32_t key = (state >> 8) % kKeys, action = (state >> 20) % 4;
-                    if (action == 0)
-                    {
-                        cache.InsertIntoCache(MakeTagged(uint8_t(key)), KeyFor(key),
-                                              (key % 2) * 10);
-                        ++inserts;
-                        continue;
-                    }
-                    if (action == 1)
-                        cache.RegisterDependencyOnFrame(KeyFor(key));
-                    if (const Frame frame = cache.RetrieveFromCache(KeyFor(key)))
-                        wrongFrames += TagOf(frame) != uint8_t(key);
-                    ++retrieves;
-                    if (action == 1)
-                        cache.UnregisterDependencyOnFrame(KeyFor(key));
-                }
-            });
-    for (auto& thread : threads)
-        thread.join();
-    const auto [hits, misses, insertions, refused, evictions, bytes, frames] = Counts(cache);
-    EXPECT_EQ(std::tuple(wrongFrames.load(), hits + misses, notifications.load(), bytes),
-              std::tuple(0u, retrieves.load(), inserts.load(), frames * kFrameBytes));
-    EXPECT_TRUE(bytes <= cache.GetByteBudget() && evictions > 0);
-    // Every dependency was balanced, and the frames counted are the frames held.
-    uint64_t held = 0;
-    for (uint32_t key = 0; key < kKeys; ++key)
-        held += bool(cache.RetrieveFromCache(KeyFor(key))) + cache.GetDependencyCount(KeyFor(key));
-    EXPECT_EQ(held, frames);
-}
-
 TEST_F(SharedVideoFrameCacheTest, DisabledCacheOrTooLargeFrameIsMarkedAndNotifiedButNotStored)
 {
     ASSERT_EQ(setenv("VF_DISABLE_FRAME_CACHE", "1", 1), 0);

@@ -111,15 +111,6 @@ TEST_F(VideoFrameManipulatorsTest, EightBitThroughEachStagedFormatAndBack)
                         Row(source, i / 64, i / 4 % 16)[i % 4], tolerance)
                 << mt::GetPixelFormatName(middle) << " " << i;
     }
-    // Stored values: 16-bit unsigned v * 257, float v / 255.
-    const Frame wide = MakeFrame(mt::kPixelFormat_BGRA_4444_16u, 16, 16),
-                floats = MakeFrame(kBGRA32f, 16, 16);
-    for (const Frame& staged : {wide, floats})
-        ASSERT_EQ(Copy(source, staged), QRT::kResult_Success);
-    std::array<uint16_t, 4> stored;
-    std::memcpy(stored.data(), Row(wide, 0, 2) + 8, 8);
-    EXPECT_EQ(stored, (std::array<uint16_t, 4>{2 * 257, 253 * 257, 1 * 257, 66 * 257}));
-    EXPECT_NEAR(PixelF(floats, 3, 2)[1], (255 - 35) / 255.0f, 1e-6f);
 }
 
 TEST_F(VideoFrameManipulatorsTest, FieldsStoredApartAreReorderedExactly)
