@@ -32,20 +32,6 @@ TEST_F(ConvertTest, EightBitToFloatAndBackIsExact)
     EXPECT_EQ(MaxDifference(opaque, again), 0);
 }
 
-TEST_F(ConvertTest, YUV420KnownColoursByMatrix)
-{
-    // BT.601 red (81, 90, 240), white and black, one 2x2 block each.
-    const std::uint8_t yuv[] = {81,  81, 235, 235, 16,  16,  81,  81,  235,
-                                235, 16, 16,  90,  128, 128, 240, 128, 128};
-    Image rgb(kBGRA8, 6, 2);
-    const IR_PixelFormat planar = kIR_PixelFormat_YUV_420_Planar_8u;
-    ASSERT_EQ(IR_Convert(yuv, 6, planar, rgb.Data(), rgb.RowBytes(), kBGRA8, 6, 2, 4), kIR_NoError);
-    const Pixel red = rgb.Get(1, 1);
-    EXPECT_TRUE(red[0] <= 1 && red[1] <= 1 && red[2] >= 254 && red[3] == 255);
-    EXPECT_EQ(rgb.Get(2, 0), (Pixel{255, 255, 255, 255}));
-    EXPECT_EQ(rgb.Get(5, 1), (Pixel{0, 0, 0, 255}));
-}
-
 TEST_F(ConvertTest, YUVInterleavedRoundTripsAndPicksMatrixByHeight)
 {
     for (IR_PixelFormat yuvFormat : {kIR_PixelFormat_VUYA_4444_8u, kIR_PixelFormat_YUYV_422_8u})

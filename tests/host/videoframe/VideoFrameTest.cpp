@@ -203,23 +203,4 @@ TEST_F(CopyOnWriteTest, SharedOrTwiceHeldFrameYieldsACopyAndAnEmptyFrameOnlyAttr
     EXPECT_EQ(VF::MakeWriteableVideoFrame(frame, mt::kRenderQuality_Max).Get(), copy);
 }
 
-TEST_F(CopyOnWriteTest, PlanarFrameCopiesEveryPlane)
-{
-    const Frame frame = MakeFrame(kPlanar420, 70, 9);
-    auto planeBytes = [](const Frame& inFrame, uint32_t inPlane)
-    { return size_t(inFrame->GetPlaneRowBytes(inPlane)) * (inPlane == 0 ? 9 : 5); };
-    for (uint32_t plane = 0; plane < 3; ++plane)
-        std::memset(frame->GetWritablePlaneBaseAddress(plane), int(plane + 1),
-                    planeBytes(frame, plane));
-    frame->MarkShared(1);
-    const Frame copy = VF::MakeWriteableVideoFrame(frame, mt::kRenderQuality_High);
-    for (uint32_t plane = 0; plane < 3; ++plane)
-    {
-        const auto* bytes = static_cast<const uint8_t*>(copy->GetPlaneBaseAddress(plane));
-        EXPECT_EQ(bytes[0] + bytes[planeBytes(copy, plane) - 1], 2 * (plane + 1));
-    }
-    EXPECT_INPUT_CONTRACT(VF::MakeWriteableVideoFrame(Frame(), mt::kRenderQuality_High),
-                          "inFrame != nullptr");
-}
-
 } // namespace
