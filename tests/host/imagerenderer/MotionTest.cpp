@@ -101,18 +101,6 @@ TEST_F(MotionTest, FieldPassTouchesOnlyItsRowsAndClearsThemWithoutALowerFrame)
             }
 }
 
-TEST_F(MotionTest, BottomLeftBuffersUsePictureCoordinates)
-{
-    const IR_PixelFormat bottomLeft = kBGRP8 | kIR_FormatBit_BottomLeft;
-    Image src(bottomLeft, 1, 2), dst(kBGRP8, 1, 2);
-    // Picture row 0 (the top) is the last row in memory.
-    src.Set(0, 1, {200, 0, 0, 255});
-    src.Set(0, 0, {0, 200, 0, 255});
-    ASSERT_EQ(Draw(src, dst, IR_AffineMatrix{}, 0), kIR_NoError);
-    EXPECT_EQ(dst.Get(0, 0), (Pixel{200, 0, 0, 255}));
-    EXPECT_EQ(dst.Get(0, 1), (Pixel{0, 200, 0, 255}));
-}
-
 TEST_F(MotionTest, BadInputIsRefused)
 {
     Image src(kBGRA8, 2, 2), dst(kBGRA8, 2, 2);

@@ -31,21 +31,6 @@ TEST_F(FrameMemoryPoolTest, SizeClassesRoundUpWithBoundedWaste)
         EXPECT_EQ(VF::FrameMemoryPool::SizeClassFor(bytes), sizeClass) << bytes;
 }
 
-TEST_F(FrameMemoryPoolTest, ReturnedBufferIsReusedForTheSameClass)
-{
-    VF::FrameMemoryPool pool(size_t{64} << 20);
-    const VF::PoolBuffer first = pool.Acquire(100'000);
-    const uint64_t capacity = VF::FrameMemoryPool::SizeClassFor(100'000);
-    EXPECT_EQ(reinterpret_cast<uintptr_t>(first.mData) % 64 + first.mCapacity, capacity);
-    pool.Return(first);
-    EXPECT_EQ(Counts(pool), (Expected{1, 0, 0, 1, capacity, 0}));
-    // Another size of the same class gets the same buffer.
-    const VF::PoolBuffer second = pool.Acquire(99'000);
-    EXPECT_EQ(second.mData, first.mData);
-    EXPECT_EQ(Counts(pool), (Expected{1, 1, 0, 0, 0, capacity}));
-    pool.Return(second);
-}
-
 TEST_F(FrameMemoryPoolTest, CapTrimsLeastRecentlyReturnedFirstAndRefusesLargerBuffers)
 {
     VF::FrameMemoryPool pool(8192);
