@@ -82,12 +82,6 @@ TEST_F(CutlistInfoTest, ATreeUsedByTwoSegmentsIsPrintedOnceAndAnEmptyCutlistHasN
     const std::size_t first = text.find(tree);
     ASSERT_NE(first, std::string::npos) << text;
     EXPECT_EQ(text.find(tree, first + 1), std::string::npos) << text;
-
-    auto empty = ML::CreateMutableCutlist(QRT::ImmutableString::CreateStatic("Empty"));
-    empty->MakeImmutable();
-    EXPECT_EQ(vrender::DescribeCutlist(*empty), "Cutlist \"Empty\" " +
-                                                    empty->GetCutlistHash().ToString() +
-                                                    "\n0 segments:\nNode trees:\n");
 }
 
 } // namespace

@@ -6,7 +6,6 @@
 #include "Options.h"
 #include "VF/PngFile.h"
 #include "VF/VideoFrame.h"
-#include "VF/VideoFrameManipulators.h"
 #include "VrenderTestSupport.h"
 
 #include <algorithm>
@@ -93,38 +92,6 @@ TEST_F(FrameWritersTest, Y4M420PlanesAreExactOnAnOddSizedFrameAndSizesMustMatch)
     for (const int value : {106, 107, 121, 122, 195, 193, 180, 178})
         expected += static_cast<char>(value);
     EXPECT_EQ(vrendertest::ReadText(path), expected);
-}
-
-TEST_F(FrameWritersTest, Y4MIntegerKernelMatchesTheGeneralConversion)
-{
-    // Heights on both sides of the BT.601 / BT.709 switch at 720 rows.
-    for (const std::uint32_t height : {8u, 720u})
-    {
-        std::uint32_t seed = 12345;
-        const auto next = [&]
-        { return static_cast<int>((seed = seed * 1664525u + 1013904223u) >> 24); };
-        const FrameRef bgra = MakeFrame(mt::kPixelFormat_BGRA_4444_8u, 37, height,
-                                        [&](int, int) {
-                                            return std::array<int, 4>{next(), next(), next(), 255};
-                                        });
-        FrameRef vuya = VF::CreateVideoFrame(mt::kPixelFormat_VUYA_4444_8u, 37, height,
-                                             mt::kPixelAspectRatio_Square, false, false);
-        ASSERT_EQ(VF::VideoFrameManipulators::CopyFrame(bgra, vuya, mt::kRenderQuality_Max), 0);
-        for (const Y4MChroma chroma : {Y4MChroma::k444, Y4MChroma::k420})
-        {
-            auto writer =
-                vrender::CreateY4MWriter(nullptr, (mDirectory / "k.y4m").string(), chroma);
-            std::string error;
-            ASSERT_TRUE(writer->Begin({37, height}, error)) << error;
-            const std::vector<std::uint8_t> fast = writer->Encode(0, bgra).mBytes;
-            const std::vector<std::uint8_t> general = writer->Encode(0, vuya).mBytes;
-            ASSERT_EQ(fast.size(), general.size());
-            int worst = 0;
-            for (std::size_t i = 0; i < fast.size(); ++i)
-                worst = std::max(worst, std::abs(fast[i] - general[i]));
-            EXPECT_LE(worst, 1) << "height " << height;
-        }
-    }
 }
 
 TEST_F(FrameWritersTest, OutputThatCannotBeCreatedIsNamed)

@@ -100,23 +100,6 @@ TEST_F(SolidColorNodeTest, ProducerFillsEveryPixelWithTheColourTheDefaultOrZero)
     }
 }
 
-TEST_F(SolidColorNodeTest, FramesThatCannotBeMadeOrFilledAnswerAStatusAndNoFrame)
-{
-    const std::tuple<std::uint32_t, mt::PixelFormat, QRT::Result> cases[] = {
-        {0, mt::kPixelFormat_BGRA_4444_8u, QRT::kResult_NotFound},
-        {4, mt::kPixelFormat_Invalid, QRT::kResult_NotFound},
-        {4, mt::kPixelFormat_BGRA_4444_16u, kIR_UnsupportedFormat}};
-    for (const auto& [width, format, status] : cases)
-    {
-        const ML::CutlistRenderParams params = Params(width, 4, format);
-        FrameRef frame;
-        EXPECT_EQ(ProducerOf(ML::CreateSolidColorNode(0xFF000000u), params)
-                      ->ProduceFrame({}, params, frame),
-                  status);
-        EXPECT_FALSE(frame);
-    }
-}
-
 TEST_F(SolidColorNodeTest, FrameHashIsColourFormatSizeAndAspectButNotTime)
 {
     ML::CutlistRenderParams params = Params(16, 9, mt::kPixelFormat_VUYA_4444_8u);
