@@ -205,12 +205,8 @@ TEST_F(MessagingTest, PumpingThreadIsTheUIThreadAndDoesNotChaseMessagesPostedByR
             record(inMessage);
             Post(station, 9);
         });
-    {
-        const Number message(NumberMessage{41});
-        ASSERT_EQ(QRT::StationUtils::PostMessageToUIThread(station, message), QRT::kResult_Success);
-    }
+    ASSERT_EQ(Post(station, 41), QRT::kResult_Success);
     Post(station, 0);
-    EXPECT_EQ(UIThread::GetPendingMessageCount(), 2u);
     EXPECT_EQ(UIThread::PumpMessages(), 2u);
     EXPECT_EQ(recorder.Get(), (Values{41, 0}));
     EXPECT_TRUE(recorder.mAlwaysOnUIThread);
