@@ -1,6 +1,5 @@
 #include "ML/CutlistRenderer.h"
 
-#include "QRT/Hash.h"
 #include "TestCutlists.h"
 #include "TestFrames.h"
 #include "TestNode.h"
@@ -52,20 +51,6 @@ protected:
     ML::CutlistRenderParams mParams = MakeParams(8, 4);
     const std::vector<mvxmediatypes::PixelFormat> mBGRA{kBGRA};
 };
-
-TEST_F(CutlistRendererTest, BlackFrameHashMixesPrefixSizeRatioAndFormat)
-{
-    QRT::HashValue hash;
-    const std::string prefix = "BlackVideoFrame from RenderFrameFromCutlist";
-    QRT::MixHash::MixInData(hash, prefix.data(), prefix.size());
-    const std::uint32_t terms[] = {8, 4, 1, 1}; // width, height, then the ratio in one
-    QRT::MixHash::MixInData(hash, &terms[0], 4);
-    QRT::MixHash::MixInData(hash, &terms[1], 4);
-    QRT::MixHash::MixInData(hash, &terms[2], 8);
-    const std::uint64_t format = kBGRA.GetValue();
-    QRT::MixHash::MixInData(hash, &format, 8);
-    EXPECT_EQ(ML::CutlistRenderer::GetBlackFrameHash(mParams), QRT::HashValueToGuid(hash));
-}
 
 TEST_F(CutlistRendererTest, TimeOutsideSegmentsGivesOneCachedBlackFrame)
 {
