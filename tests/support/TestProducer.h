@@ -1,6 +1,6 @@
 #pragma once
 
-// A node producer whose hash, frame and failure a test sets, and
+// A node producer whose hash, frame, latency and failure a test sets, and
 // that records what it is asked. Producing may be called from any thread.
 
 #include "ML/IRenderableNodeProducer.h"
@@ -10,11 +10,13 @@
 #include "Waiting.h"
 
 #include <atomic>
+#include <chrono>
 #include <functional>
 #include <memory>
 #include <mutex>
 #include <new>
 #include <stdexcept>
+#include <thread>
 
 namespace vrtest
 {
@@ -42,6 +44,7 @@ public:
     // Called on every frame made, before it is answered.
     std::function<void(MF::IVideoFrame&)> mPaint;
     std::shared_ptr<Gate> mGate;
+    std::chrono::microseconds mLatency{0};
     ProducerFailure mFailure = ProducerFailure::kNone;
     QRT::Result mFailureStatus = static_cast<QRT::Result>(0xA0990001u);
     // Called at the start of ProduceFrame, and with the opposite flag at its
@@ -87,6 +90,7 @@ private:
     {
         if (mGate)
             mGate->Wait();
+        std::this_thread::sleep_for(mLatency);
         switch (mFailure)
         {
         case ProducerFailure::kStatus:

@@ -486,8 +486,8 @@ TEST_F(RenderFrameQueueTest, PrefetchOnlyRequestsEndWithTheirFrameOrTimeOutAfter
 
 TEST_F(RenderFrameQueueTest, StressEveryRequestDeliveredOnceWithinBudget)
 {
-    // Adders queue requests of random priorities, sizes, formats and keys (a
-    // few only, so that identical renders meet); some
+    // Adders queue requests of random priorities, sizes, formats, keys (a few
+    // only, so that identical renders meet), latencies and failures; some
     // wait a few polls for their prefetch. One in eight is held in its
     // prefetch wait by a handle that never completes and cancelled by its
     // identifier right after it is queued, so only that cancel ends it. The
@@ -511,6 +511,9 @@ TEST_F(RenderFrameQueueTest, StressEveryRequestDeliveredOnceWithinBudget)
                     const std::uint32_t id = nextID.fetch_add(1);
                     const bool held = id % 8 == 0;
                     auto producer = NewProducer(random() % 40);
+                    producer->mLatency = std::chrono::microseconds(random() % 200);
+                    if (random() % 10 == 0)
+                        producer->mFailure = ProducerFailure::kStatus;
                     const std::int32_t sizes[][2] = {{64, 32}, {1920, 1080}, {4000, 3000}};
                     const auto& size = sizes[random() % 3];
                     producer->mFormat = random() % 2 ? kDeep : kBGRA;
