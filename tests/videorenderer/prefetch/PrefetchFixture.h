@@ -59,6 +59,7 @@ protected:
         boost::atomic_store(&sVideoSourcePrefetcherQueue, mSavedVideo);
         boost::atomic_store(&sImageSourcePrefetcherQueue, mSavedImage);
         mvxcore::debug::SetAssertHook(mSavedAssertHook);
+        SilenceMediaNodePrefetchTimeoutAssertion(false);
     }
 
     std::vector<std::string> Asserts()

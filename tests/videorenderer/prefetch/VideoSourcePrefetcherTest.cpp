@@ -25,11 +25,7 @@ struct CallbackLog
             mStatuses.push_back(inStatus);
         };
     }
-    Statuses Get()
-    {
-        std::lock_guard lock(mMutex);
-        return mStatuses;
-    }
+    Statuses Get() { return Locked(mMutex, mStatuses); }
 };
 
 class VideoSourcePrefetcherTest : public PrefetchFixture
