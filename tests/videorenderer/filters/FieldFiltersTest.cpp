@@ -102,7 +102,6 @@ TEST_F(FieldFiltersTest, DeinterlaceStepTakesOneFieldOfATallFieldByFieldFrame)
             FieldFilterSteps::DeinterlaceKeepingField(fields, params, c.mKept == 1);
         ASSERT_TRUE(result);
         EXPECT_EQ(result->GetBounds(), QRT::ParamRect(0, 0, kWidth, kHeight));
-        EXPECT_EQ(result->GetPixelFormat(), fieldsFormat);
         EXPECT_EQ(result->GetFieldType(), mt::kFieldType_Progressive);
         const bool mean = c.mMultiple == 4 && c.mQuality >= 3;
         const auto expected = [&](std::int32_t inX, std::int32_t inY)

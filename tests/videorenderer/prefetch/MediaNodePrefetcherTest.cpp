@@ -18,7 +18,7 @@ class MediaNodePrefetcherTest : public PrefetchFixture
 protected:
     static PrefetchRef Make(const VideoSourceRef& inSource, std::int64_t inTicks)
     {
-        return CreateMediaNodePrefetcher(inSource, At(inTicks), {}, {}, {});
+        return CreateMediaNodePrefetcher(inSource, Ticks(inTicks), {}, {}, {});
     }
     PrefetchRef Make(std::int64_t inTicks) const { return Make(VideoSourceRef(mSource), inTicks); }
     // Two started handles for one time of inSource.
@@ -56,7 +56,7 @@ protected:
 // counted and running for nobody.
 TEST_F(MediaNodePrefetcherTest, FrameCachedWhileTheReadIsQueuedWithdrawsTheRead)
 {
-    const Guid key = mSource->KeyFor(At(5));
+    const Guid key = mSource->KeyFor(Ticks(5));
     {
         const auto gate = BlockVideoExecutor();
         const PrefetchRef handle = Make(5);
@@ -110,12 +110,12 @@ TEST_F(MediaNodePrefetcherTest, NullKeyHandlesReadForThemselvesWithoutCaching)
 TEST_F(MediaNodePrefetcherTest, AsyncReadIsStartedOnceTakenAndWithdrawnByTheLastCancelOrFailure)
 {
     const ScriptedSourceRef async = MakeAsync();
-    const Guid key = async->KeyFor(At(2));
+    const Guid key = async->KeyFor(Ticks(2));
     const auto [first, second] = StartTwo(async, 2);
     EXPECT_EQ(async->mStarts.load(), 1);
     EXPECT_TRUE(first->ContinueWaitingForPrefetch(0.1));
 
-    async->CompleteRead(At(2));
+    async->CompleteRead(Ticks(2));
     EXPECT_FALSE(first->ContinueWaitingForPrefetch(0.2));
     EXPECT_FALSE(second->ContinueWaitingForPrefetch(0.2));
     const FrameRef frame = Taken(first);
@@ -137,7 +137,7 @@ TEST_F(MediaNodePrefetcherTest, AsyncReadIsStartedOnceTakenAndWithdrawnByTheLast
     failing->mStartStatus = failure;
     const PrefetchRef handle = Make(VideoSourceRef(failing), 3);
     EXPECT_EQ(handle->InitiatePrefetch(), failure);
-    EXPECT_EQ(GetMediaNodePrefetchReferenceCount(failing->KeyFor(At(3))), 0u);
+    EXPECT_EQ(GetMediaNodePrefetchReferenceCount(failing->KeyFor(Ticks(3))), 0u);
     EXPECT_FALSE(handle->ContinueWaitingForPrefetch(0.0));
     EXPECT_FALSE(Taken(handle));
     EXPECT_EQ(handle->CancelPrefetch(), QRT::kResult_Success);
@@ -171,7 +171,7 @@ TEST_F(MediaNodePrefetcherTest, AsyncTimeoutAssertsOnceUnlessSilencedAndFallsBac
         const FrameRef frame = Taken(second);
         ASSERT_TRUE(frame);
         EXPECT_EQ(frame.Get(),
-                  VF::SharedVideoFrameCache::RetrieveFromCache(async->KeyFor(At(ticks))).Get());
+                  VF::SharedVideoFrameCache::RetrieveFromCache(async->KeyFor(Ticks(ticks))).Get());
         EXPECT_EQ(async->ReadTicks(), std::vector<std::int64_t>{ticks});
     }
     EXPECT_EQ(Asserts(), std::vector<std::string>{
@@ -182,7 +182,7 @@ TEST_F(MediaNodePrefetcherTest, AsyncTimeoutAssertsOnceUnlessSilencedAndFallsBac
 TEST_F(MediaNodePrefetcherTest, FlushedRegistryEndsEveryWait)
 {
     const auto gate = BlockVideoExecutor();
-    const Guid key = mSource->KeyFor(At(13));
+    const Guid key = mSource->KeyFor(Ticks(13));
     const auto [first, second] = StartTwo(mSource, 13);
     const ScriptedSourceRef async = MakeAsync();
     const PrefetchRef asyncHandle = Make(VideoSourceRef(async), 13);
@@ -239,8 +239,8 @@ TEST_F(MediaNodePrefetcherTest, ConcurrentHandlesLeaveNothingBehind)
     EXPECT_GT(framesTaken.load(), 0);
     for (int k = 0; k < kKeys; ++k)
     {
-        EXPECT_EQ(GetMediaNodePrefetchReferenceCount(mSource->KeyFor(At(k))), 0u);
-        EXPECT_EQ(Dependencies(mSource->KeyFor(At(k))), 0u);
+        EXPECT_EQ(GetMediaNodePrefetchReferenceCount(mSource->KeyFor(Ticks(k))), 0u);
+        EXPECT_EQ(Dependencies(mSource->KeyFor(Ticks(k))), 0u);
     }
     EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 0u);
 }

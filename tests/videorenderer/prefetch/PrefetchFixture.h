@@ -20,11 +20,6 @@ namespace ML::Test
 
 using VideoSourceRef = QRT::InterfaceRef<BE::Deprecated::IVideoSource>;
 
-inline TickTime At(std::int64_t inTicks)
-{
-    return Ticks(inTicks);
-}
-
 class PrefetchFixture : public ::testing::Test
 {
 protected:
