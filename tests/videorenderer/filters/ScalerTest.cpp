@@ -119,9 +119,7 @@ TEST_F(ScalerTest, DraftQualityKeepsAFullFrameRenderingAtTheRequestedTimeWhole)
     };
     for (const auto& c : cases)
     {
-        SCOPED_TRACE(testing::Message()
-                     << "quality " << c.mQuality << " delivery " << int(c.mDelivery) << " height "
-                     << c.mNativeHeight << " request " << c.mRequest.GetTime().GetTicks());
+        SCOPED_TRACE(testing::Message() << "case " << &c - cases);
         auto source = MakeMarkedSource(c.mDelivery, 16, c.mNativeHeight);
         const FrameRef frame =
             Render(*ScaleAndPARCorrectSource(source), c.mRequest, Reducing(540, c.mQuality));

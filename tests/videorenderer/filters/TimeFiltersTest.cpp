@@ -57,7 +57,6 @@ TEST_F(TimeFiltersTest, TimeMixTakesEachFieldOrFrameFromUpstreamAtItsTime)
     const SourceRef mix = TimeMixSource(upper);
     EXPECT_TRUE(
         RowsAre(Render(*mix, MF::FrameTime(F(7)), mParams), Marker(F(7), 2), Marker(F(7), 2)));
-    EXPECT_EQ(upper->Rendered().size(), 1u);
     EXPECT_TRUE(
         RowsAre(Render(*mix, MF::FrameTime(F(6)), mParams), Marker(F(6), 1), Marker(F(6), 1)));
     // An interlaced request straddling upstream frames 3 (fields 6, 7) and 4 (fields 8, 9).

@@ -1,10 +1,8 @@
 #include "prefetch/MediaNodePrefetcher.h"
 
-#include "ML/RenderStatus.h"
 #include "PrefetchFixture.h"
 
 #include <random>
-#include <tuple>
 
 namespace ML::Test
 {
@@ -91,9 +89,6 @@ TEST_F(MediaNodePrefetcherTest, NullKeyHandlesReadForThemselvesWithoutCaching)
         const auto gate = BlockVideoExecutor();
         const std::size_t readsBefore = mSource->ReadTicks().size();
         const auto [first, second] = StartTwo(mSource, holds ? 11 : 12);
-        QRT::Guid key = MakeKey();
-        first->GetPrefetchKey(key);
-        EXPECT_TRUE(key.IsNil());
         // Without a key nothing is shared: each handle queued a read of its own.
         EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 2u);
         EXPECT_TRUE(first->ContinueWaitingForPrefetch(0.0));

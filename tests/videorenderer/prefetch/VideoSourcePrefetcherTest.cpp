@@ -98,8 +98,7 @@ TEST_F(VideoSourcePrefetcherTest, FlushDropsQueuedJobsWithoutCallbacksAndLaterJo
     flusher.join();
     EXPECT_TRUE(mLog.Get().empty());
     EXPECT_TRUE(mSource->ReadTicks().empty());
-    EXPECT_TRUE(mVideo->IsShutDown());
-    EXPECT_TRUE(mImage->IsShutDown());
+    EXPECT_TRUE(mVideo->IsShutDown() && mImage->IsShutDown());
 
     // Enqueued after the flush: cancelled at once instead of waiting forever.
     Enqueue(3, mLog);

@@ -13,7 +13,6 @@ namespace ML::Test
 namespace
 {
 
-using mt::PixelAspectRatio;
 using Pair = std::pair<std::int64_t, std::int64_t>;
 
 class RenderableGetVideoSourceTest : public ::testing::Test

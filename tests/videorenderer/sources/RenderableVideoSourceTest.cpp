@@ -93,8 +93,7 @@ TEST_F(RenderableVideoSourceTest, RatesFollowTheDeclarationTheSourceAndStills)
     };
     for (const auto& c : cases)
     {
-        SCOPED_TRACE(testing::Message() << "declared " << c.mDeclared << " rate "
-                                        << c.mDeclaredRate.GetTicksPerFrame());
+        SCOPED_TRACE(testing::Message() << "case " << &c - cases);
         const SourceRef source =
             Make(c.mSource, {.mFrameRate = c.mDeclaredRate, .mFieldType = c.mDeclared});
         EXPECT_EQ(RateOf(*source), c.mRate);
@@ -154,25 +153,6 @@ TEST_F(RenderableVideoSourceTest, ConformsToTheFrameOrFieldGridInTheDeliveredOrd
     EXPECT_EQ(TicksOf(Conform(*Make(still, {}), MF::FrameTime(Ticks(time)))), TickPair(time, time));
     const SourceRef pattern = Make(OpenPattern("pattern:solid?size=8x4"), {.mFieldType = kUpper});
     EXPECT_EQ(TicksOf(Conform(*pattern, interlaced)), TickPair(0, 0));
-}
-
-TEST_F(RenderableVideoSourceTest, FrameRequestCarriesParamsFieldOrderAndClipData)
-{
-    const ScriptedSourceRef scripted = Handing(MakeFilledFrame(4, 2, Pixel{0, 0, 0, 255}));
-    const SourceRef source = Make(scripted, {});
-    CutlistRenderParams params = MakeParams(4, 2, 3, mt::kPixelFormat_VUYA_4444_8u);
-    params.mPixelAspectRatio = PixelAspectRatio(10, 11);
-    const std::int64_t early = kFrame25 * 5 + 17;
-    ASSERT_TRUE(Render(*source, MF::FrameTime(Ticks(early + kField25), Ticks(early)), params));
-    const FrameCall call = scripted->FrameCalls().at(0);
-    // Same rates: the earlier field time goes to the source as it is.
-    EXPECT_EQ(call.mTime.GetTicks(), early);
-    const BE::VideoFrameRequest expected{
-        4, 2, PixelAspectRatio(10, 11), mt::kPixelFormat_VUYA_4444_8u, kLower, 3};
-    EXPECT_EQ(call.mRequest, expected);
-    EXPECT_EQ(call.mBinaryData, mBinaryData);
-    EXPECT_EQ(call.mColorProfile, mProfile);
-    EXPECT_EQ(call.mFlags, BE::Deprecated::kFrameRequestFlag_Read);
 }
 
 TEST_F(RenderableVideoSourceTest, FailuresAreThrownAndEmptyTheOutput)
@@ -332,7 +312,11 @@ TEST_F(RenderableVideoSourceTest, CollectsOneHandleForTheConvertedTimeOnlyWhenWa
     ASSERT_EQ(scripted->PrefetchCalls().size(), 2u);
     const FrameCall hint = scripted->PrefetchCalls().back();
     EXPECT_EQ(hint.mTime.GetTicks(), 3 * kField25);
-    EXPECT_EQ(hint.mRequest.mFieldType, kLower);
+    // The request the read would make: the params' size, ratio, format and
+    // quality, in the request's field order.
+    const BE::VideoFrameRequest request{
+        4, 2, mt::kPixelAspectRatio_Square, mt::kPixelFormat_BGRA_4444_8u, kLower, 4};
+    EXPECT_EQ(hint.mRequest, request);
     EXPECT_EQ(hint.mBinaryData, mBinaryData);
     // The handle reads the frame of the converted time with the same record.
     QRT::Guid key;
