@@ -89,45 +89,8 @@ TEST_F(RenderExecutorsTest, ShutDownStopsAndResetsAllFourAndDropsTheirPendingTas
     for (const ML::ExecutorRef& executor : CurrentExecutors())
         EXPECT_FALSE(executor);
     for (const ML::ExecutorRef& executor : executors)
-    {
         EXPECT_TRUE(executor->IsShutDown());
-        EXPECT_FALSE(executor->Post([] {}));
-    }
     EXPECT_EQ(ran.load(), 0);
-}
-
-TEST_F(RenderExecutorsTest, StartUpReplacesOnlyTheExecutorsThatWereShutDown)
-{
-    ML::Foundation::StartUp();
-    const Executors before = CurrentExecutors();
-    // The render queue's own shutdown stops the two render executors only.
-    for (const ML::ExecutorRef& executor : {before[0], before[1]})
-    {
-        executor->BeginShutdown();
-        executor->DiscardPendingTasks();
-        executor->WaitForRunningTasks();
-    }
-    ML::Foundation::StartUp();
-    const Executors partly = CurrentExecutors();
-    for (size_t i = 0; i < partly.size(); ++i)
-        EXPECT_EQ(partly[i] == before[i], i >= 2) << i;
-    ExpectWorking(partly);
-}
-
-TEST_F(RenderExecutorsTest, ShutDownFromARenderTaskDoesNotDeadlock)
-{
-    ML::Foundation::StartUp();
-    CountingSignal done;
-    std::atomic<bool> resetSeen{false};
-    ML::sNormalPriorityRenderQueue->Post(
-        [&]
-        {
-            ML::Foundation::ShutDown();
-            resetSeen = !boost::atomic_load(&ML::sNormalPriorityRenderQueue);
-            done.Notify();
-        });
-    ASSERT_TRUE(done.WaitFor());
-    EXPECT_TRUE(resetSeen.load());
 }
 
 } // namespace

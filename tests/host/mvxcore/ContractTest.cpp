@@ -103,16 +103,8 @@ TEST_F(ContractTest, ViolationThrowsAContractErrorAndCallsTheDialogOnceAndAssert
     EXPECT_EQ(mAsserts.size(), 1u);
 }
 
-TEST_F(ContractTest, ReplacedHookAnswersAndABreakAnswerDoesNotTrapWithoutDebugger)
+TEST_F(ContractTest, ABreakAnswerDoesNotTrapWithoutDebugger)
 {
-    int calls = 0;
-    const auto previous =
-        mvxcore::debug::SetContractDialogHook([&](const ContractFailure&) { return ++calls < 0; });
-    EXPECT_THROW(RequirePositive(-1), Error);
-    EXPECT_EQ(calls, 1);
-    EXPECT_TRUE(mContracts.empty());
-    // The fixture's hook comes back and sees the next failure.
-    mvxcore::debug::SetContractDialogHook(previous);
     if (mvxcore::debug::IsDebuggerAttached())
         GTEST_SKIP() << "a debugger is attached; the break would be taken";
     mAnswerBreak = true;

@@ -170,19 +170,4 @@ TEST_F(ClassFactoryTest, BadRegistrationsAreContractViolations)
     EXPECT_FALSE(ClassFactory::IsClassRegistered(kGreeterA));
 }
 
-TEST_F(ClassFactoryTest, CreatorMayUseTheFactory)
-{
-    // A creation callback runs outside the table's lock.
-    ASSERT_EQ(Register(kGreeterB, "GreeterB", MakeGreeterCreator(5)), QRT::kResult_Success);
-    ASSERT_EQ(Register(kGreeterA, "GreeterA",
-                       [](QRT::InterfaceRef<QRT::QRTUnknown>& outObject)
-                       {
-                           ClassFactory::CreateInstance(kGreeterB, outObject);
-                           ClassFactory::UnregisterQRTClass(kGreeterB);
-                       }),
-              QRT::kResult_Success);
-    EXPECT_EQ(GreetingOf("GreeterA"), 5);
-    EXPECT_EQ(GreetingOf("GreeterA"), -1);
-}
-
 } // namespace

@@ -168,8 +168,6 @@ TEST_F(EndToEndTest, PngFilesAtHalfSpeedThroughTimeMixOrTimeBlend)
     const FrameRef mix2 = ReadPng(mDirectory / "mix" / "f_002.png");
     const FrameRef blend1 = ReadPng(mDirectory / "blend" / "f_001.png");
     ASSERT_TRUE(mix0 && mix1 && mix2 && blend1);
-    EXPECT_EQ(mix0->GetBounds().Width(), 64);
-    EXPECT_EQ(mix0->GetBounds().Height(), 36);
     EXPECT_FALSE(Differ(mix0, mix1, 0)) << "time mix repeats media frame 0";
     EXPECT_TRUE(Differ(mix1, mix2, 0));
     EXPECT_TRUE(Differ(blend1, mix0, 0)) << "time blend mixes media frames 0 and 1";

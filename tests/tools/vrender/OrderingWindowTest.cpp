@@ -4,11 +4,7 @@
 
 #include "ContractExpect.h"
 
-#include <algorithm>
-#include <numeric>
-#include <random>
 #include <string>
-#include <thread>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -40,36 +36,6 @@ TEST_F(OrderingWindowTest, OutOfOrderDeliveriesComeOutInOrderAndEachIndexOnce)
     EXPECT_EQ(window.TakeAllWaiting(), (std::vector<std::string>{"fourteen", "sixteen"}));
     EXPECT_EQ(window.GetWaitingCount(), 0u);
     EXPECT_EQ(window.GetNextIndex(), 13);
-}
-
-TEST_F(OrderingWindowTest, ManyProducersInRandomOrderReachAWaitingConsumerInOrder)
-{
-    constexpr int kCount = 2000;
-    constexpr int kThreads = 4;
-    std::vector<int> order(kCount);
-    std::iota(order.begin(), order.end(), 0);
-    std::shuffle(order.begin(), order.end(), std::mt19937(7));
-    vrender::OrderingWindow<int> window(0);
-    std::vector<std::thread> producers;
-    for (int t = 0; t < kThreads; ++t)
-        producers.emplace_back(
-            [&, t]
-            {
-                for (int i = t; i < kCount; i += kThreads)
-                    window.Deliver(order[i], order[i] * 3);
-            });
-    std::vector<int> taken;
-    while (static_cast<int>(taken.size()) < kCount)
-    {
-        const std::optional<int> item = window.TakeNext(10s);
-        ASSERT_TRUE(item) << "stalled after " << taken.size();
-        taken.push_back(*item);
-    }
-    for (std::thread& producer : producers)
-        producer.join();
-    for (int i = 0; i < kCount; ++i)
-        ASSERT_EQ(taken[i], i * 3) << i;
-    EXPECT_EQ(window.GetWaitingCount(), 0u);
 }
 
 } // namespace

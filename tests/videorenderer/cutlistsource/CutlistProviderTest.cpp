@@ -70,12 +70,6 @@ TEST_F(CutlistProviderTest, GettersAnswerTheCutlistsOfTheNameOrTheDefaultSet)
     mProvider->RemoveCutlists(mSequence);
     EXPECT_EQ(mProvider->GetMainCutlist(mSequence, true), fallback);
     mProvider->RemoveCutlists(QRT::ImmutableString::CreateStatic("never registered"));
-
-    // Setting a name's cutlists replaces its whole set.
-    mProvider->SetCutlists(mSequence, {main, main, main});
-    mProvider->SetCutlists(mSequence, {third, {}, {}});
-    EXPECT_EQ(mProvider->GetMainCutlist(mSequence, true), third);
-    EXPECT_FALSE(mProvider->GetThirdCutlist(mSequence, true));
 }
 
 TEST_F(CutlistProviderTest, BadSettingsBreakTheContractAndChangeNothing)

@@ -83,7 +83,7 @@ TEST_F(ScalerTest, WhileReducingAProgressiveRequestTakesTheNearestFieldAndOrderI
     RenderableNodePrefetchList prefetches;
     upperScaler->CollectPrefetches(lowerFirst, Reducing(576), prefetches);
     EXPECT_EQ(upper->Prefetched().at(0), MF::FrameTime(mT, mTField));
-    EXPECT_EQ(FieldRateOf(*upperScaler), mvxmediatypes::kFrameRate_Video5994);
+    EXPECT_EQ(FieldRateOf(*upperScaler), mt::kFrameRate_Video5994);
 
     // Every row comes from the field nearest the requested time.
     for (const auto& [scaler, slot] : {std::pair{upperScaler, 2}, std::pair{lowerScaler, 1}})
@@ -119,9 +119,7 @@ TEST_F(ScalerTest, DraftQualityKeepsAFullFrameRenderingAtTheRequestedTimeWhole)
     };
     for (const auto& c : cases)
     {
-        SCOPED_TRACE(testing::Message()
-                     << "quality " << c.mQuality << " delivery " << int(c.mDelivery) << " height "
-                     << c.mNativeHeight << " request " << c.mRequest.GetTime().GetTicks());
+        SCOPED_TRACE(testing::Message() << "case " << &c - cases);
         auto source = MakeMarkedSource(c.mDelivery, 16, c.mNativeHeight);
         const FrameRef frame =
             Render(*ScaleAndPARCorrectSource(source), c.mRequest, Reducing(540, c.mQuality));

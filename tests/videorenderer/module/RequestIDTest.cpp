@@ -2,8 +2,6 @@
 #include "module/ModuleInternals.h"
 
 #include <cstdint>
-#include <set>
-#include <thread>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -36,33 +34,6 @@ TEST(RequestIDTest, IdentifiersStartAtTwoAndTheWrapSkipsZero)
         for (unsigned int expected : testCase.mExpected)
             EXPECT_EQ(ML::GetNextRequestID(), expected) << "after " << testCase.mLast;
     }
-}
-
-TEST(RequestIDTest, ConcurrentCallersGetDistinctNonZeroIdentifiersAcrossTheWrap)
-{
-    constexpr int kThreads = 4;
-    constexpr int kPerThread = 5000;
-    // The wrap falls in the middle of the run.
-    ML::ModuleInternals::SetLastRequestID(0xFFFFFFFFu - kThreads * kPerThread / 2);
-    std::vector<unsigned int> taken(kThreads * kPerThread);
-    std::vector<std::thread> threads;
-    for (int t = 0; t < kThreads; ++t)
-    {
-        threads.emplace_back(
-            [&taken, t]
-            {
-                for (int i = 0; i < kPerThread; ++i)
-                    taken[t * kPerThread + i] = ML::GetNextRequestID();
-            });
-    }
-    for (std::thread& thread : threads)
-        thread.join();
-    const std::set<unsigned int> all(taken.begin(), taken.end());
-    // Exactly the identifiers on both sides of the wrap, each once.
-    EXPECT_EQ(all.size(), static_cast<std::size_t>(kThreads * kPerThread));
-    EXPECT_EQ(*all.begin(), 1u);
-    EXPECT_EQ(*all.rbegin(), 0xFFFFFFFFu);
-    EXPECT_EQ(ML::GetNextRequestID(), static_cast<unsigned int>(kThreads * kPerThread / 2 + 1));
 }
 
 TEST(AcceleratedRendererIDTest, NilUntilSetThenTheLastValueSet)

@@ -20,11 +20,6 @@ namespace ML::Test
 
 using VideoSourceRef = QRT::InterfaceRef<BE::Deprecated::IVideoSource>;
 
-inline TickTime At(std::int64_t inTicks)
-{
-    return Ticks(inTicks);
-}
-
 class PrefetchFixture : public ::testing::Test
 {
 protected:
@@ -59,6 +54,7 @@ protected:
         boost::atomic_store(&sVideoSourcePrefetcherQueue, mSavedVideo);
         boost::atomic_store(&sImageSourcePrefetcherQueue, mSavedImage);
         mvxcore::debug::SetAssertHook(mSavedAssertHook);
+        SilenceMediaNodePrefetchTimeoutAssertion(false);
     }
 
     std::vector<std::string> Asserts()

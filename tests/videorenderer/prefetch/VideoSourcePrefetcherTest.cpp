@@ -2,7 +2,6 @@
 
 #include "ML/RenderStatus.h"
 #include "PrefetchFixture.h"
-#include "mvxcore/config/Error.h"
 
 namespace ML::Test
 {
@@ -25,11 +24,7 @@ struct CallbackLog
             mStatuses.push_back(inStatus);
         };
     }
-    Statuses Get()
-    {
-        std::lock_guard lock(mMutex);
-        return mStatuses;
-    }
+    Statuses Get() { return Locked(mMutex, mStatuses); }
 };
 
 class VideoSourcePrefetcherTest : public PrefetchFixture
@@ -39,8 +34,8 @@ protected:
                  bool inNullKey = false)
     {
         const ScriptedSourceRef& source = inSource ? inSource : mSource;
-        EnqueueVideoSourcePrefetch(At(inTicks), VideoSourceRef(source), {}, {}, {},
-                                   inNullKey ? Guid() : source->KeyFor(At(inTicks)),
+        EnqueueVideoSourcePrefetch(Ticks(inTicks), VideoSourceRef(source), {}, {}, {},
+                                   inNullKey ? Guid() : source->KeyFor(Ticks(inTicks)),
                                    ioLog.Callback());
     }
 
@@ -72,13 +67,13 @@ TEST_F(VideoSourcePrefetcherTest, CancelCallsTheCallbackOnceAndItsTaskRunsTheNex
     CallbackLog otherLog;
     Enqueue(1, otherLog, other);
     Enqueue(3, mLog, {}, true);
-    CancelVideoSourcePrefetch(VideoSourceRef(mSource), mSource->KeyFor(At(1)));
+    CancelVideoSourcePrefetch(VideoSourceRef(mSource), mSource->KeyFor(Ticks(1)));
     CancelVideoSourcePrefetch(VideoSourceRef(mSource), Guid());
     EXPECT_EQ(cancelled.Get(), Statuses{kResult_Cancelled});
     EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 3u);
     // A second cancel finds nothing and calls nothing, nor does one for a source without jobs.
-    CancelVideoSourcePrefetch(VideoSourceRef(mSource), mSource->KeyFor(At(1)));
-    CancelVideoSourcePrefetch(VideoSourceRef(MakeScriptedSource()), mSource->KeyFor(At(2)));
+    CancelVideoSourcePrefetch(VideoSourceRef(mSource), mSource->KeyFor(Ticks(1)));
+    CancelVideoSourcePrefetch(VideoSourceRef(MakeScriptedSource()), mSource->KeyFor(Ticks(2)));
 
     gate->Open();
     Drain(mVideo);
@@ -103,32 +98,12 @@ TEST_F(VideoSourcePrefetcherTest, FlushDropsQueuedJobsWithoutCallbacksAndLaterJo
     flusher.join();
     EXPECT_TRUE(mLog.Get().empty());
     EXPECT_TRUE(mSource->ReadTicks().empty());
-    EXPECT_TRUE(mVideo->IsShutDown());
-    EXPECT_TRUE(mImage->IsShutDown());
+    EXPECT_TRUE(mVideo->IsShutDown() && mImage->IsShutDown());
 
     // Enqueued after the flush: cancelled at once instead of waiting forever.
     Enqueue(3, mLog);
     EXPECT_EQ(mLog.Get(), Statuses{kResult_Cancelled});
     EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 0u);
-}
-
-TEST_F(VideoSourcePrefetcherTest, EnqueueWithoutExecutorsViolatesItsInputContract)
-{
-    std::string expression;
-    const auto savedHook = mvxcore::debug::SetContractDialogHook(
-        [&expression](const mvxcore::debug::ContractFailure& inFailure)
-        {
-            expression = std::string(inFailure.expression);
-            return false;
-        });
-    boost::atomic_store(&sImageSourcePrefetcherQueue, ExecutorRef());
-    EXPECT_THROW(Enqueue(1, mLog), mvxcore::config::Error);
-    mvxcore::debug::SetContractDialogHook(savedHook);
-    boost::atomic_store(&sImageSourcePrefetcherQueue, mImage);
-    EXPECT_EQ(expression,
-              "sVideoSourcePrefetcherQueue != NULL && sImageSourcePrefetcherQueue != NULL");
-    EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 0u);
-    EXPECT_TRUE(mLog.Get().empty());
 }
 
 } // namespace

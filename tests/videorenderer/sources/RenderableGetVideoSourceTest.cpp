@@ -13,7 +13,6 @@ namespace ML::Test
 namespace
 {
 
-using mvxmediatypes::PixelAspectRatio;
 using Pair = std::pair<std::int64_t, std::int64_t>;
 
 class RenderableGetVideoSourceTest : public ::testing::Test
@@ -23,22 +22,19 @@ protected:
     {
         TickTime mOrigin{};
         QRT::ParamColor mMatte{};
-        mvxmediatypes::AlphaChannel mAlphaKind = mvxmediatypes::kAlphaChannel_Straight;
-        bool mIgnoreAlpha = false;
-        bool mInvertAlpha = false;
+        mt::AlphaChannel mAlphaKind = mt::kAlphaChannel_Straight;
+        bool mIgnoreAlpha = false, mInvertAlpha = false;
         FrameRate mFrameRate = k25;
     };
 
-    SourceRef Make(const BE::VideoSourceRef& inSource, const Declaration& inDeclaration) const
+    // inSource: a back-end video source reference or a scripted source.
+    template <typename Source>
+    SourceRef Make(const Source& inSource, const Declaration& inDeclaration) const
     {
         return CreateRenderableGetVideoSource(
-            inSource, mBinaryData, inDeclaration.mOrigin, Ticks(4242), inDeclaration.mMatte,
-            inDeclaration.mAlphaKind, inDeclaration.mIgnoreAlpha, inDeclaration.mInvertAlpha, true,
-            0.625, inDeclaration.mFrameRate);
-    }
-    SourceRef Make(const ScriptedSourceRef& inScripted, const Declaration& inDeclaration) const
-    {
-        return Make(BE::VideoSourceRef(inScripted), inDeclaration);
+            BE::VideoSourceRef(inSource), mBinaryData, inDeclaration.mOrigin, Ticks(4242),
+            inDeclaration.mMatte, inDeclaration.mAlphaKind, inDeclaration.mIgnoreAlpha,
+            inDeclaration.mInvertAlpha, true, 0.625, inDeclaration.mFrameRate);
     }
     // The two field times of the conformed request, in ticks.
     static Pair Conformed(const SourceRef& inSource, TickTime inFirst, TickTime inSecond)
@@ -60,7 +56,7 @@ TEST_F(RenderableGetVideoSourceTest, RatesFollowKindStillAndSourceFieldType)
     const std::int32_t clip = BE::Deprecated::kMediaInfoKind_Clip;
     const struct
     {
-        mvxmediatypes::FieldType mFieldType;
+        mt::FieldType mFieldType;
         bool mStill;
         std::int32_t mKind;
         FrameRate mRate, mFieldRate;
@@ -113,39 +109,11 @@ TEST_F(RenderableGetVideoSourceTest, FrameGridIsAnchoredAtTheOriginAndKeepsTheRe
     EXPECT_EQ(Conformed(Make(scripted, {.mFrameRate = kNoRate}), early, late), Pair(0, 0));
 }
 
-TEST_F(RenderableGetVideoSourceTest, DrawsIntoNearestFormatWithTheClipsArguments)
-{
-    const ScriptedSourceRef scripted = MakeScriptedSource();
-    scripted->mPixelFormats = {mvxmediatypes::kPixelFormat_BGRA_4444_8u,
-                               mvxmediatypes::kPixelFormat_VUYA_4444_8u};
-    const SourceRef source = Make(scripted, {.mOrigin = Ticks(300), .mInvertAlpha = true});
-    CutlistRenderParams params = MakeParams(6, 4, 2, mvxmediatypes::kPixelFormat_VUYA_4444_32f);
-    params.mPixelAspectRatio = PixelAspectRatio(4, 3);
-    const TickTime early = Ticks(kFrame25 * 2 + 11);
-    const TickTime late = Ticks(kFrame25 * 2 + 11 + kField25);
-
-    const FrameRef frame = Render(*source, MF::FrameTime(late, early), params);
-    ASSERT_TRUE(frame);
-    // The YUV model is nearer than depth: the 8-bit VUYA the source offers.
-    EXPECT_EQ(frame->GetPixelFormat(), mvxmediatypes::kPixelFormat_VUYA_4444_8u);
-    EXPECT_EQ(frame->GetBounds(), QRT::ParamRect(0, 0, 6, 4));
-    EXPECT_EQ(frame->GetPixelAspectRatio(), PixelAspectRatio(4, 3));
-    EXPECT_EQ(frame->GetFieldType(), kLower);
-    const std::vector<DrawCall> calls = scripted->DrawCalls();
-    ASSERT_EQ(calls.size(), 1u);
-    // Its own frame is worked on in place (here: the inverted alpha).
-    EXPECT_EQ(calls[0].mDestination, static_cast<const void*>(frame.Get()));
-    EXPECT_EQ(calls[0].mTime, early);
-    // Quality 2 of the params is kRenderQuality_Low; field type 2 is lower first.
-    EXPECT_EQ(calls[0].mArguments, "data 2 origin 300 second 4242 quality 2 field 2 progressive 0 "
-                                   "ignore 0 invert 1 third 1 value 0.625");
-}
-
 TEST_F(RenderableGetVideoSourceTest, ConvertsTimeByFrameNumberOnlyBetweenVideoRates)
 {
     const ScriptedSourceRef scripted = MakeScriptedSource();
     const MF::FrameTime time(Ticks(kFrame25 * 9 + 3));
-    const Declaration noRate{.mFrameRate = kNoRate};
+    const Declaration noRate{.mOrigin = Ticks(300), .mInvertAlpha = true, .mFrameRate = kNoRate};
     // Still rates are not numbered against video rates, nor is a clip without a rate.
     const struct
     {
@@ -160,6 +128,10 @@ TEST_F(RenderableGetVideoSourceTest, ConvertsTimeByFrameNumberOnlyBetweenVideoRa
         Render(*Make(scripted, c.mDeclaration), time, MakeParams(2, 2));
         EXPECT_EQ(scripted->DrawCalls().back().mTime.GetTicks(), c.mTicks);
     }
+    // The clip's arguments; quality 4 of the params is kRenderQuality_High.
+    EXPECT_EQ(scripted->DrawCalls().back().mArguments,
+              "data 2 origin 300 second 4242 quality 4 field 0 progressive 1 ignore 0 invert 1 "
+              "third 1 value 0.625");
 }
 
 TEST_F(RenderableGetVideoSourceTest, FailuresAreThrownWithTheirStatusAndNoPrefetchIsCollected)

@@ -13,7 +13,7 @@ namespace ML::Test
 namespace
 {
 
-using mvxmediatypes::PixelAspectRatio;
+using mt::PixelAspectRatio;
 using TickPair = std::pair<std::int64_t, std::int64_t>;
 
 // The two field times in ticks, for readable comparisons.
@@ -35,25 +35,22 @@ class RenderableVideoSourceTest : public ::testing::Test
 protected:
     struct Declaration
     {
-        mvxmediatypes::AlphaChannel mAlphaKind = mvxmediatypes::kAlphaChannel_Straight;
+        mt::AlphaChannel mAlphaKind = mt::kAlphaChannel_Straight;
         QRT::ParamColor mMatte{};
-        bool mIgnoreAlpha = false;
-        bool mInvertAlpha = false;
+        bool mIgnoreAlpha = false, mInvertAlpha = false;
         FrameRate mFrameRate = k25;
-        mvxmediatypes::FieldType mFieldType = kProg;
-        PixelAspectRatio mRatio = mvxmediatypes::kPixelAspectRatio_Square;
+        mt::FieldType mFieldType = kProg;
+        PixelAspectRatio mRatio = mt::kPixelAspectRatio_Square;
     };
 
-    SourceRef Make(const BE::VideoSourceRef& inSource, const Declaration& inDeclaration) const
+    // inSource: a back-end video source reference or a scripted source.
+    template <typename Source>
+    SourceRef Make(const Source& inSource, const Declaration& inDeclaration) const
     {
-        return CreateRenderableSource(inSource, mBinaryData, inDeclaration.mAlphaKind,
-                                      inDeclaration.mMatte, inDeclaration.mIgnoreAlpha,
-                                      inDeclaration.mInvertAlpha, inDeclaration.mFrameRate,
-                                      inDeclaration.mFieldType, inDeclaration.mRatio, mProfile);
-    }
-    SourceRef Make(const ScriptedSourceRef& inScripted, const Declaration& inDeclaration) const
-    {
-        return Make(BE::VideoSourceRef(inScripted), inDeclaration);
+        return CreateRenderableSource(
+            BE::VideoSourceRef(inSource), mBinaryData, inDeclaration.mAlphaKind,
+            inDeclaration.mMatte, inDeclaration.mIgnoreAlpha, inDeclaration.mInvertAlpha,
+            inDeclaration.mFrameRate, inDeclaration.mFieldType, inDeclaration.mRatio, mProfile);
     }
     // A scripted source handing out inFrame, marked shared.
     static ScriptedSourceRef Handing(const FrameRef& inFrame)
@@ -86,7 +83,7 @@ TEST_F(RenderableVideoSourceTest, RatesFollowTheDeclarationTheSourceAndStills)
     const struct
     {
         ScriptedSourceRef mSource;
-        mvxmediatypes::FieldType mDeclared;
+        mt::FieldType mDeclared;
         FrameRate mDeclaredRate, mRate, mFieldRate;
     } cases[] = {
         {lower, kProg, k25, k25, k25},           {progressive, kUpper, k25, k25, k50},
@@ -96,8 +93,7 @@ TEST_F(RenderableVideoSourceTest, RatesFollowTheDeclarationTheSourceAndStills)
     };
     for (const auto& c : cases)
     {
-        SCOPED_TRACE(testing::Message() << "declared " << c.mDeclared << " rate "
-                                        << c.mDeclaredRate.GetTicksPerFrame());
+        SCOPED_TRACE(testing::Message() << "case " << &c - cases);
         const SourceRef source =
             Make(c.mSource, {.mFrameRate = c.mDeclaredRate, .mFieldType = c.mDeclared});
         EXPECT_EQ(RateOf(*source), c.mRate);
@@ -120,7 +116,7 @@ TEST_F(RenderableVideoSourceTest, ConformsToTheFrameOrFieldGridInTheDeliveredOrd
     // request, conformed field times.
     const struct
     {
-        mvxmediatypes::FieldType mSourceFieldType, mDeclared;
+        mt::FieldType mSourceFieldType, mDeclared;
         std::int32_t mKind;
         FrameRate mDeclaredRate;
         MF::FrameTime mRequest;
@@ -159,35 +155,6 @@ TEST_F(RenderableVideoSourceTest, ConformsToTheFrameOrFieldGridInTheDeliveredOrd
     EXPECT_EQ(TicksOf(Conform(*pattern, interlaced)), TickPair(0, 0));
 }
 
-TEST_F(RenderableVideoSourceTest, FrameRequestCarriesParamsFieldOrderClipDataAndConvertedTime)
-{
-    const ScriptedSourceRef scripted = Handing(MakeFilledFrame(4, 2, Pixel{0, 0, 0, 255}));
-    const SourceRef source = Make(scripted, {});
-    CutlistRenderParams params = MakeParams(4, 2, 3, mvxmediatypes::kPixelFormat_VUYA_4444_8u);
-    params.mPixelAspectRatio = PixelAspectRatio(10, 11);
-    const std::int64_t early = kFrame25 * 5 + 17;
-    ASSERT_TRUE(Render(*source, MF::FrameTime(Ticks(early + kField25), Ticks(early)), params));
-    const FrameCall call = scripted->FrameCalls().at(0);
-    // Same rates: the earlier field time goes to the source as it is.
-    EXPECT_EQ(call.mTime.GetTicks(), early);
-    const BE::VideoFrameRequest expected{
-        4, 2, PixelAspectRatio(10, 11), mvxmediatypes::kPixelFormat_VUYA_4444_8u, kLower, 3};
-    EXPECT_EQ(call.mRequest, expected);
-    EXPECT_EQ(call.mBinaryData, mBinaryData);
-    EXPECT_EQ(call.mColorProfile, mProfile);
-    EXPECT_EQ(call.mFlags, BE::Deprecated::kFrameRequestFlag_Read);
-    Render(*source, MF::FrameTime(Ticks(early)), params);
-    EXPECT_EQ(scripted->FrameCalls().at(1).mRequest.mFieldType, kProg);
-
-    // Frame 7 at 25 (anywhere inside it) is frame 7 at 50.
-    scripted->mFrameRate = k50;
-    Render(*Make(scripted, {}), MF::FrameTime(Ticks(kFrame25 * 7 + kFrame25 - 1)), m4x2);
-    EXPECT_EQ(scripted->FrameCalls().at(2).mTime.GetTicks(), 7 * kField25);
-    // A clip without a rate passes the time unchanged.
-    Render(*Make(scripted, {.mFrameRate = kNoRate}), MF::FrameTime(Ticks(kFrame25 + 5)), m4x2);
-    EXPECT_EQ(scripted->FrameCalls().at(3).mTime.GetTicks(), kFrame25 + 5);
-}
-
 TEST_F(RenderableVideoSourceTest, FailuresAreThrownAndEmptyTheOutput)
 {
     const ScriptedSourceRef failing = MakeScriptedSource();
@@ -224,8 +191,8 @@ TEST_F(RenderableVideoSourceTest, AlphaIsMadeStraightInvertedOrIgnoredAsDeclared
     const std::string overBlue =
         "pattern:solid?size=8x4&color=FF0000&alpha=premultiplied&opacity=128&matte=0000FF";
     const std::string straight = "pattern:solid?size=8x4&color=336699&alpha=straight&opacity=64";
-    const auto pre = mvxmediatypes::kAlphaChannel_Premultiplied;
-    const auto plain = mvxmediatypes::kAlphaChannel_Straight;
+    const auto pre = mt::kAlphaChannel_Premultiplied;
+    const auto plain = mt::kAlphaChannel_Straight;
     const QRT::ParamColor blue = QRT::ParamColor::FromRGBA(0, 0, 0xFF);
     // Only the colour bytes count: an alpha byte alone is still a black matte.
     const QRT::ParamColor black = QRT::ParamColor::FromRGBA(0, 0, 0, 0xFF);
@@ -233,7 +200,7 @@ TEST_F(RenderableVideoSourceTest, AlphaIsMadeStraightInvertedOrIgnoredAsDeclared
     const struct
     {
         const std::string& mMedia;
-        mvxmediatypes::AlphaChannel mKind;
+        mt::AlphaChannel mKind;
         QRT::ParamColor mMatte;
         bool mIgnore, mInvert;
         Pixel mExpected;
@@ -262,45 +229,31 @@ TEST_F(RenderableVideoSourceTest, AlphaIsMadeStraightInvertedOrIgnoredAsDeclared
 
 TEST_F(RenderableVideoSourceTest, SixteenBitPremultipliedIsMadeStraightThroughStaging)
 {
-    // Full red at alpha 32768 / 65535 premultiplied over black.
-    const auto format = mvxmediatypes::kPixelFormat_BGRA_4444_16u;
-    const auto channels = [](const FrameRef& inFrame, int inX, int inY)
-    {
-        return const_cast<std::uint16_t*>(reinterpret_cast<const std::uint16_t*>(
-                   static_cast<const std::uint8_t*>(inFrame->GetBaseAddress()) +
-                   inY * inFrame->GetRowBytes())) +
-               4 * inX;
-    };
-    FrameRef delivered =
-        VF::CreateVideoFrame(format, 4, 2, mvxmediatypes::kPixelAspectRatio_Square, true, false);
-    for (int i = 0; i < 8; ++i)
-        channels(delivered, i % 4, i / 4)[2] = channels(delivered, i % 4, i / 4)[3] = 32768;
-    const FrameRef frame = Render(
-        *Make(Handing(delivered), {.mAlphaKind = mvxmediatypes::kAlphaChannel_Premultiplied}),
-        MF::FrameTime(), MakeParams(4, 2, 5, format));
+    // Red at alpha one half, premultiplied over black, in 16 bits per channel.
+    const auto format = mt::kPixelFormat_BGRA_4444_16u;
+    const FrameRef delivered = Converted(MakeFilledFrame(4, 2, Pixel{0, 0, 128, 128}), format);
+    const FrameRef frame =
+        Render(*Make(Handing(delivered), {.mAlphaKind = mt::kAlphaChannel_Premultiplied}),
+               MF::FrameTime(), MakeParams(4, 2, 5, format));
     ASSERT_EQ(frame->GetPixelFormat(), format);
-    EXPECT_EQ(frame->GetAlphaChannel(), mvxmediatypes::kAlphaChannel_Straight);
-    for (int i = 0; i < 8; ++i)
-    {
-        const std::uint16_t* pixel = channels(frame, i % 4, i / 4);
-        EXPECT_EQ(std::vector<int>(pixel, pixel + 4), (std::vector<int>{0, 0, 65535, 32768}));
-    }
+    EXPECT_EQ(frame->GetAlphaChannel(), mt::kAlphaChannel_Straight);
+    EXPECT_TRUE(AllPixelsAre(Converted(frame), Pixel{0, 0, 255, 128}));
 }
 
 TEST_F(RenderableVideoSourceTest, StraightDeclarationRelabelsAndOpaqueFormatsAreLeftAlone)
 {
     FrameRef delivered = MakeFilledFrame(4, 2, Pixel{0x10, 0x20, 0x40, 0x80});
-    delivered->SetAlphaChannel(mvxmediatypes::kAlphaChannel_Premultiplied);
+    delivered->SetAlphaChannel(mt::kAlphaChannel_Premultiplied);
     const FrameRef frame = Render(*Make(Handing(delivered), {}), MF::FrameTime(), m4x2);
     EXPECT_NE(frame.Get(), delivered.Get());
-    EXPECT_EQ(frame->GetAlphaChannel(), mvxmediatypes::kAlphaChannel_Straight);
+    EXPECT_EQ(frame->GetAlphaChannel(), mt::kAlphaChannel_Straight);
     EXPECT_TRUE(AllPixelsAre(frame, Pixel{0x10, 0x20, 0x40, 0x80}));
-    EXPECT_EQ(delivered->GetAlphaChannel(), mvxmediatypes::kAlphaChannel_Premultiplied);
+    EXPECT_EQ(delivered->GetAlphaChannel(), mt::kAlphaChannel_Premultiplied);
 
-    const auto yuyv = mvxmediatypes::kPixelFormat_YUYV_422_8u;
+    const auto yuyv = mt::kPixelFormat_YUYV_422_8u;
     const FrameRef opaque =
-        VF::CreateVideoFrame(yuyv, 4, 2, mvxmediatypes::kPixelAspectRatio_Square, true, false);
-    const Declaration declaration{.mAlphaKind = mvxmediatypes::kAlphaChannel_Premultiplied,
+        VF::CreateVideoFrame(yuyv, 4, 2, mt::kPixelAspectRatio_Square, true, false);
+    const Declaration declaration{.mAlphaKind = mt::kAlphaChannel_Premultiplied,
                                   .mIgnoreAlpha = true};
     EXPECT_EQ(
         Render(*Make(Handing(opaque), declaration), MF::FrameTime(), MakeParams(4, 2, 5, yuyv))
@@ -313,7 +266,7 @@ TEST_F(RenderableVideoSourceTest, PixelAspectRatioIsAdjustedForNonUniformDeliver
     const FrameRef delivered = MakeFilledFrame(360, 480, Pixel{0, 0, 0, 255});
     const ScriptedSourceRef scripted = Handing(delivered);
     const PixelAspectRatio ntsc(10, 11);
-    const PixelAspectRatio square = mvxmediatypes::kPixelAspectRatio_Square;
+    const PixelAspectRatio square = mt::kPixelAspectRatio_Square;
     const struct
     {
         PixelAspectRatio mDeclared;
@@ -327,7 +280,7 @@ TEST_F(RenderableVideoSourceTest, PixelAspectRatioIsAdjustedForNonUniformDeliver
         // A frame that already has the ratio is handed on untouched, and a
         // clip that accepts any ratio keeps the source's.
         {PixelAspectRatio(2, 2), 360, 480, square, true},
-        {mvxmediatypes::kPixelAspectRatio_Any, 720, 480, square, true},
+        {mt::kPixelAspectRatio_Any, 720, 480, square, true},
     };
     for (const auto& c : cases)
     {
@@ -356,14 +309,15 @@ TEST_F(RenderableVideoSourceTest, CollectsOneHandleForTheConvertedTimeOnlyWhenWa
     ASSERT_EQ(prefetches.size(), 1u);
     ASSERT_TRUE(prefetches[0]);
 
-    const std::vector<PrefetchCall> hints = scripted->PrefetchCalls();
-    ASSERT_EQ(hints.size(), 2u);
-    for (const PrefetchCall& hint : hints)
-    {
-        EXPECT_EQ(hint.mTime.GetTicks(), 3 * kField25);
-        EXPECT_EQ(hint.mRequest.mFieldType, kLower);
-        EXPECT_EQ(hint.mBinaryData, mBinaryData);
-    }
+    ASSERT_EQ(scripted->PrefetchCalls().size(), 2u);
+    const FrameCall hint = scripted->PrefetchCalls().back();
+    EXPECT_EQ(hint.mTime.GetTicks(), 3 * kField25);
+    // The request the read would make: the params' size, ratio, format and
+    // quality, in the request's field order.
+    const BE::VideoFrameRequest request{
+        4, 2, mt::kPixelAspectRatio_Square, mt::kPixelFormat_BGRA_4444_8u, kLower, 4};
+    EXPECT_EQ(hint.mRequest, request);
+    EXPECT_EQ(hint.mBinaryData, mBinaryData);
     // The handle reads the frame of the converted time with the same record.
     QRT::Guid key;
     prefetches[0]->GetPrefetchKey(key);

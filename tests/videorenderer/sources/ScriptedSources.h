@@ -47,11 +47,12 @@
 namespace ML::Test
 {
 
+namespace mt = mvxmediatypes;
 using FrameRef = QRT::InterfaceRef<MF::IVideoFrame>;
 using SourceRef = QRT::InterfaceRef<IRenderableSource>;
+using mt::FrameRate;
+using mt::TickTime;
 using mvxcore::utility::Guid;
-using mvxmediatypes::FrameRate;
-using mvxmediatypes::TickTime;
 
 inline TickTime Ticks(std::int64_t inTicks)
 {
@@ -65,14 +66,14 @@ inline constexpr std::int64_t kFrame25 = 28'224'000;
 inline constexpr std::int64_t kField25 = kFrame25 / 2;
 
 // Short names for the tables of the source tests.
-inline constexpr mvxmediatypes::FieldType kProg = mvxmediatypes::kFieldType_Progressive;
-inline constexpr mvxmediatypes::FieldType kUpper = mvxmediatypes::kFieldType_UpperFirst;
-inline constexpr mvxmediatypes::FieldType kLower = mvxmediatypes::kFieldType_LowerFirst;
-inline constexpr mvxmediatypes::FieldType kAsSource = mvxmediatypes::kFieldType_AsSource;
-inline const FrameRate k25 = mvxmediatypes::kFrameRate_Video25;
-inline const FrameRate k50 = mvxmediatypes::kFrameRate_Video50;
-inline const FrameRate k1000 = mvxmediatypes::kFrameRate_Video1000;
-inline const FrameRate kNoRate = mvxmediatypes::kFrameRate_Zero;
+inline constexpr mt::FieldType kProg = mt::kFieldType_Progressive;
+inline constexpr mt::FieldType kUpper = mt::kFieldType_UpperFirst;
+inline constexpr mt::FieldType kLower = mt::kFieldType_LowerFirst;
+inline constexpr mt::FieldType kAsSource = mt::kFieldType_AsSource;
+inline const FrameRate k25 = mt::kFrameRate_Video25;
+inline const FrameRate k50 = mt::kFrameRate_Video50;
+inline const FrameRate k1000 = mt::kFrameRate_Video1000;
+inline const FrameRate kNoRate = mt::kFrameRate_Zero;
 
 // A BGRA 8-bit pixel as stored in memory.
 struct Pixel
@@ -99,9 +100,8 @@ inline Pixel ReadPixel(const MF::IVideoFrame& inFrame, std::int32_t inX, std::in
 inline FrameRef MakeFrame(std::uint32_t inWidth, std::uint32_t inHeight,
                           const std::function<Pixel(std::int32_t, std::int32_t)>& inPixelAt)
 {
-    FrameRef frame =
-        VF::CreateVideoFrame(mvxmediatypes::kPixelFormat_BGRA_4444_8u, inWidth, inHeight,
-                             mvxmediatypes::kPixelAspectRatio_Square, false, false);
+    FrameRef frame = VF::CreateVideoFrame(mt::kPixelFormat_BGRA_4444_8u, inWidth, inHeight,
+                                          mt::kPixelAspectRatio_Square, false, false);
     auto* base = static_cast<std::uint8_t*>(frame->GetWritableBaseAddress());
     for (std::int32_t y = 0; y < static_cast<std::int32_t>(inHeight); ++y)
         for (std::int32_t x = 0; x < static_cast<std::int32_t>(inWidth); ++x)
@@ -157,34 +157,30 @@ inline ::testing::AssertionResult RowsAre(const FrameRef& inFrame, Pixel inFirst
 }
 
 // A copy of inFrame in inFormat (BGRA 8-bit unless told), converted at high quality.
-inline FrameRef
-Converted(const FrameRef& inFrame,
-          mvxmediatypes::PixelFormat inFormat = mvxmediatypes::kPixelFormat_BGRA_4444_8u)
+inline FrameRef Converted(const FrameRef& inFrame,
+                          mt::PixelFormat inFormat = mt::kPixelFormat_BGRA_4444_8u)
 {
     const QRT::ParamRect bounds = inFrame->GetBounds();
     FrameRef copy = VF::CreateVideoFrame(inFormat, static_cast<std::uint32_t>(bounds.Width()),
                                          static_cast<std::uint32_t>(bounds.Height()),
                                          inFrame->GetPixelAspectRatio(), false, false);
-    EXPECT_GE(
-        VF::VideoFrameManipulators::CopyFrame(inFrame, copy, mvxmediatypes::kRenderQuality_High),
-        0);
+    EXPECT_GE(VF::VideoFrameManipulators::CopyFrame(inFrame, copy, mt::kRenderQuality_High), 0);
     return copy;
 }
 
 // Render parameters for a frame of the given size (also the full frame) at
 // 29.97; the secondary quality is the quality.
-inline CutlistRenderParams
-MakeParams(std::uint32_t inWidth, std::uint32_t inHeight, std::uint32_t inQuality = 4,
-           mvxmediatypes::PixelFormat inFormat = mvxmediatypes::kPixelFormat_BGRA_4444_8u)
+inline CutlistRenderParams MakeParams(std::uint32_t inWidth, std::uint32_t inHeight,
+                                      std::uint32_t inQuality = 4,
+                                      mt::PixelFormat inFormat = mt::kPixelFormat_BGRA_4444_8u)
 {
     CutlistRenderParams params;
     params.mWidth = params.mFullFrameWidth = inWidth;
     params.mHeight = params.mFullFrameHeight = inHeight;
-    params.mPixelAspectRatio = params.mFullFramePixelAspectRatio =
-        mvxmediatypes::kPixelAspectRatio_Square;
+    params.mPixelAspectRatio = params.mFullFramePixelAspectRatio = mt::kPixelAspectRatio_Square;
     params.mPixelFormat = inFormat;
     params.mQuality = params.mSecondaryQuality = inQuality;
-    params.mFrameRate = mvxmediatypes::kFrameRate_Video2997;
+    params.mFrameRate = mt::kFrameRate_Video2997;
     return params;
 }
 
@@ -252,6 +248,14 @@ inline Pixel GradientMarker(TickTime inTime, std::int32_t inSlot, std::int32_t i
     return pixel;
 }
 
+// A copy of inRecord taken under inMutex.
+template <typename T>
+T Locked(std::mutex& inMutex, const T& inRecord)
+{
+    std::lock_guard lock(inMutex);
+    return inRecord;
+}
+
 // Base of the renderable test sources: logs prefetch requests and renders.
 class LoggingSource : public QRT::Implements<IRenderableSource>
 {
@@ -262,9 +266,9 @@ public:
         std::lock_guard lock(mLogLock);
         mPrefetched.push_back(inTime);
     }
-    std::vector<MF::FrameTime> Prefetched() const { return Locked(mPrefetched); }
-    std::vector<MF::FrameTime> Rendered() const { return Locked(mRendered); }
-    FrameRef LastFrame() const { return Locked(mLastFrame); }
+    std::vector<MF::FrameTime> Prefetched() const { return Locked(mLogLock, mPrefetched); }
+    std::vector<MF::FrameTime> Rendered() const { return Locked(mLogLock, mRendered); }
+    FrameRef LastFrame() const { return Locked(mLogLock, mLastFrame); }
 
 protected:
     // Marks inFrame shared, logs it and hands it out.
@@ -278,16 +282,8 @@ protected:
     }
 
 private:
-    template <typename T>
-    T Locked(const T& inLog) const
-    {
-        std::lock_guard lock(mLogLock);
-        return inLog;
-    }
-
     mutable std::mutex mLogLock; // guards the three logs
-    std::vector<MF::FrameTime> mPrefetched;
-    std::vector<MF::FrameTime> mRendered;
+    std::vector<MF::FrameTime> mPrefetched, mRendered;
     FrameRef mLastFrame;
 };
 
@@ -323,10 +319,10 @@ public:
             outConformed = MF::FrameTime(inRequested.GetTime().AlignToFrame(mRate * 2));
         else
         {
-            const mvxmediatypes::FieldType order =
+            const mt::FieldType order =
                 mDelivery == Delivery::kFollowRequest ? inRequested.GetFieldOrder()
-                : mDelivery == Delivery::kUpperFirst  ? mvxmediatypes::kFieldType_UpperFirst
-                                                      : mvxmediatypes::kFieldType_LowerFirst;
+                : mDelivery == Delivery::kUpperFirst  ? mt::kFieldType_UpperFirst
+                                                      : mt::kFieldType_LowerFirst;
             outConformed = MF::FrameTime::Make(frame, order, (mRate * 2).GetFrameDuration());
         }
     }
@@ -366,8 +362,8 @@ inline QRT::InterfaceRef<MarkedSource> MakeMarkedSource(Delivery inDelivery,
                                                         std::uint32_t inHeight = 0,
                                                         bool inGradient = false)
 {
-    return QRT::Allocated<MarkedSource>::CreateInstance(
-        inDelivery, mvxmediatypes::kFrameRate_Video2997, inWidth, inHeight, inGradient);
+    return QRT::Allocated<MarkedSource>::CreateInstance(inDelivery, mt::kFrameRate_Video2997,
+                                                        inWidth, inHeight, inGradient);
 }
 
 // A one-shot latch: Wait blocks until Open (called once).
@@ -401,20 +397,12 @@ struct FrameCall
     std::int32_t mFlags = -1;
 };
 
-struct PrefetchCall
-{
-    TickTime mTime;
-    BE::VideoFrameRequest mRequest;
-    MF::BinaryData mBinaryData;
-};
-
-// A draw request: its time, destination (the address only: holding a
-// reference would make the adaptor copy the frame before it writes) and the
-// other arguments as one text.
+// A prefetch hint is logged as a FrameCall without profile and flags.
+// A draw request: its time and the other arguments but the destination as one
+// text.
 struct DrawCall
 {
     TickTime mTime;
-    const void* mDestination = nullptr;
     std::string mArguments;
 };
 
@@ -424,19 +412,16 @@ class ScriptedVideoSource
 {
 public:
     // --- Settings -------------------------------------------------------------
-    FrameRate mFrameRate = mvxmediatypes::kFrameRate_Video25;
+    FrameRate mFrameRate = mt::kFrameRate_Video25;
     bool mStill = false;
-    bool mImage = false;
-    mvxmediatypes::FieldType mFieldType = mvxmediatypes::kFieldType_Progressive;
+    mt::FieldType mFieldType = mt::kFieldType_Progressive;
     std::int32_t mKind = BE::Deprecated::kMediaInfoKind_Clip;
-    std::vector<mvxmediatypes::PixelFormat> mPixelFormats = {
-        mvxmediatypes::kPixelFormat_BGRA_4444_8u};
+    std::vector<mt::PixelFormat> mPixelFormats = {mt::kPixelFormat_BGRA_4444_8u};
     // A read answers mFrameStatus and on success mFrame, or with mNewFrames a new 4x2 frame per
     // read. Frames read are held (when mHoldsReadFrames) and answer kFrameRequestFlag_NoBlock.
     QRT::Result mFrameStatus = QRT::kResult_Success;
     FrameRef mFrame;
-    bool mNewFrames = false;
-    bool mHoldsReadFrames = true;
+    bool mNewFrames = false, mHoldsReadFrames = true;
     // DrawVideoFrame answers mDrawStatus.
     QRT::Result mDrawStatus = QRT::kResult_Success;
     bool mPrefetchWanted = false;
@@ -448,12 +433,10 @@ public:
     std::atomic<bool> mAsyncEnabled{false};
     std::atomic<QRT::Result> mStartStatus{QRT::kResult_Success};
     std::atomic<bool> mWaitAnswer{true};
-    std::atomic<int> mStarts{0};
-    std::atomic<int> mWaits{0};
-    std::atomic<int> mCancels{0};
+    std::atomic<int> mStarts{0}, mCancels{0};
 
     // --- Records --------------------------------------------------------------
-    std::vector<FrameCall> FrameCalls() const { return Locked(mFrameCalls); }
+    std::vector<FrameCall> FrameCalls() const { return Locked(mMutex, mFrameCalls); }
     // The times of the reads (requests with kFrameRequestFlag_Read), in order.
     std::vector<std::int64_t> ReadTicks() const
     {
@@ -463,8 +446,8 @@ public:
                 ticks.push_back(call.mTime.GetTicks());
         return ticks;
     }
-    std::vector<PrefetchCall> PrefetchCalls() const { return Locked(mPrefetchCalls); }
-    std::vector<DrawCall> DrawCalls() const { return Locked(mDrawCalls); }
+    std::vector<FrameCall> PrefetchCalls() const { return Locked(mMutex, mPrefetchCalls); }
+    std::vector<DrawCall> DrawCalls() const { return Locked(mMutex, mDrawCalls); }
 
     Guid KeyFor(TickTime inTime) const
     {
@@ -484,23 +467,17 @@ public:
     // --- IVideoSource -----------------------------------------------------------
     FrameRate GetFrameRate() const noexcept override { return mFrameRate; }
     bool IsStill() const noexcept override { return mStill; }
-    bool IsImage() const noexcept override { return mImage; }
-    mvxmediatypes::FieldType GetFieldType() const noexcept override { return mFieldType; }
+    bool IsImage() const noexcept override { return false; }
+    mt::FieldType GetFieldType() const noexcept override { return mFieldType; }
     QRT::ParamRect GetBounds() const noexcept override { return {0, 0, 4, 2}; }
-    mvxmediatypes::PixelAspectRatio GetPixelAspectRatio() const noexcept override
+    mt::PixelAspectRatio GetPixelAspectRatio() const noexcept override
     {
-        return mvxmediatypes::kPixelAspectRatio_Square;
+        return mt::kPixelAspectRatio_Square;
     }
-    mvxmediatypes::AlphaChannel GetAlphaChannel() const noexcept override
-    {
-        return mvxmediatypes::kAlphaChannel_None;
-    }
+    mt::AlphaChannel GetAlphaChannel() const noexcept override { return mt::kAlphaChannel_None; }
     QRT::ParamColor GetMatteColor() const noexcept override { return {}; }
     BE::ColorProfile GetColorProfile() const override { return {"sRGB", nullptr}; }
-    std::vector<mvxmediatypes::PixelFormat> GetPixelFormats() const override
-    {
-        return mPixelFormats;
-    }
+    std::vector<mt::PixelFormat> GetPixelFormats() const override { return mPixelFormats; }
 
     QRT::Result GetVideoFrame(TickTime inTime, const BE::VideoFrameRequest& inRequest,
                               const MF::BinaryData& inBinaryData,
@@ -530,16 +507,14 @@ public:
                             const MF::BinaryData& inBinaryData) override
     {
         std::lock_guard lock(mMutex);
-        mPrefetchCalls.push_back({inTime, inRequest, inBinaryData});
+        mPrefetchCalls.push_back({inTime, inRequest, inBinaryData, {}, -1});
     }
 
     QRT::Result DrawVideoFrame(TickTime inTime, const MF::BinaryData& inBinaryData,
-                               TickTime inFrameGridOrigin, TickTime inSecondTime,
-                               const FrameRef& ioDestination,
-                               mvxmediatypes::RenderQuality inQuality,
-                               mvxmediatypes::FieldType inFieldType, bool inProgressive,
-                               bool inIgnoreAlpha, bool inInvertAlpha, bool inThirdFlag,
-                               double inValue) override
+                               TickTime inFrameGridOrigin, TickTime inSecondTime, const FrameRef&,
+                               mt::RenderQuality inQuality, mt::FieldType inFieldType,
+                               bool inProgressive, bool inIgnoreAlpha, bool inInvertAlpha,
+                               bool inThirdFlag, double inValue) override
     {
         std::ostringstream arguments;
         arguments << "data " << inBinaryData.GetSize() << " origin " << inFrameGridOrigin.GetTicks()
@@ -549,7 +524,7 @@ public:
                   << inValue;
         {
             std::lock_guard lock(mMutex);
-            mDrawCalls.push_back({inTime, ioDestination.Get(), arguments.str()});
+            mDrawCalls.push_back({inTime, arguments.str()});
         }
         return mDrawStatus;
     }
@@ -574,7 +549,7 @@ public:
     {
         return QRT::InterfaceRef<BE::Deprecated::IVideoSource>(this);
     }
-    TickTime GetDuration() const noexcept override { return mvxmediatypes::kTime_Max; }
+    TickTime GetDuration() const noexcept override { return mt::kTime_Max; }
     QRT::InterfaceRef<BE::Deprecated::IMediaInfo> Copy() const override { return {}; }
 
     // --- IAsyncVideoSource ------------------------------------------------------
@@ -588,7 +563,6 @@ public:
     bool WaitForAsyncRead(TickTime, const BE::VideoFrameRequest&, const MF::BinaryData&,
                           const BE::ColorProfile&, double) override
     {
-        mWaits.fetch_add(1);
         return mCompleted.load() || mWaitAnswer.load();
     }
     void CancelAsyncRead(TickTime, const BE::VideoFrameRequest&, const MF::BinaryData&,
@@ -598,16 +572,8 @@ public:
     }
 
 private:
-    template <typename T>
-    T Locked(const T& inRecord) const
-    {
-        std::lock_guard lock(mMutex);
-        return inRecord;
-    }
-
     mutable std::mutex mMutex; // guards the call records and mHeld
-    std::vector<FrameCall> mFrameCalls;
-    std::vector<PrefetchCall> mPrefetchCalls;
+    std::vector<FrameCall> mFrameCalls, mPrefetchCalls;
     std::vector<DrawCall> mDrawCalls;
     std::map<std::int64_t, FrameRef> mHeld;
     std::atomic<bool> mCompleted{false};
