@@ -137,20 +137,13 @@ const FieldType kP = kFieldType_Progressive;
 const FieldType kUF = kFieldType_UpperFirst;
 
 // Without C: 4:2:0; A0:0 (unknown): square.
-INSTANTIATE_TEST_SUITE_P(
-    Variants, Y4MVariantTest,
-    ::testing::Values(
-        Variant{"YUV4MPEG2 W8 H6 F25:1 Ip A1:1 C420jpeg", 8, 6, "RGB", k25, kP, {1, 1}},
-        Variant{"YUV4MPEG2 W6 H4 F30:1 C422", 6, 4, "G", kFrameRate_Video30, kP, {1, 1}},
-        Variant{"YUV4MPEG2 W4 H720 F25:1 C420", 4, 720, "R", k25, kP, {1, 1}},
-        Variant{"YUV4MPEG2 W4 H4 F30000:1001 It A10:11 C444 XYSCSS=444",
-                4,
-                4,
-                "B",
-                k2997,
-                kUF,
-                {10, 11}},
-        Variant{"YUV4MPEG2 W4 H4 F25:1 Ib A0:0", 4, 4, "GR", k25, kFieldType_LowerFirst, {1, 1}}));
+const Variant kVariants[] = {
+    {"YUV4MPEG2 W8 H6 F25:1 Ip A1:1 C420jpeg", 8, 6, "RGB", k25, kP, {1, 1}},
+    {"YUV4MPEG2 W6 H4 F30:1 C422", 6, 4, "G", kFrameRate_Video30, kP, {1, 1}},
+    {"YUV4MPEG2 W4 H720 F25:1 C420", 4, 720, "R", k25, kP, {1, 1}},
+    {"YUV4MPEG2 W4 H4 F30000:1001 It A10:11 C444 XYSCSS=444", 4, 4, "B", k2997, kUF, {10, 11}},
+    {"YUV4MPEG2 W4 H4 F25:1 Ib A0:0", 4, 4, "GR", k25, kFieldType_LowerFirst, {1, 1}}};
+INSTANTIATE_TEST_SUITE_P(Variants, Y4MVariantTest, ::testing::ValuesIn(kVariants));
 
 TEST_F(Y4MSourceTest, FramesBeyondTheFileAreOutOfRangeAndKeysFollowTheFile)
 {
