@@ -69,12 +69,6 @@ TEST_F(ImageFileSourceTest, StillsReadBackAtEveryTimeScaleAndKeyByContent)
         EXPECT_EQ(Pixel(frame, x, 0),
                   Bgra(pixels[x * 4], pixels[x * 4 + 1], pixels[x * 4 + 2], pixels[x * 4 + 3]))
             << x;
-    // Every time shows the same still: one held frame.
-    FrameRef again;
-    EXPECT_EQ(ReadFrame(source, TickTime::FromSeconds(9), again,
-                        BE::Deprecated::kFrameRequestFlag_NoBlock),
-              QRT::kResult_Success);
-    EXPECT_EQ(again.Get(), frame.Get());
     // A JPEG still reads back, scales and is keyed by its content.
     const std::string jpeg = mDirectory.File("still.jpeg");
     WriteSolidJpeg(jpeg, 16, 8, 200, 100, 50);

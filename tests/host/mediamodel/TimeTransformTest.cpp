@@ -53,7 +53,6 @@ TEST_F(TimeTransformTest, TransformMapsClipTimeToMediaTimeAndBack)
         EXPECT_EQ(transform->Transform(Ticks(clip)), Ticks(media));
         EXPECT_TRUE(!inverse || transform->InverseTransform(Ticks(media)) == Ticks(clip));
     }
-    EXPECT_EQ(std::tuple(half->GetSpeed(), reverse->GetSpeed()), std::tuple(0.5, -1.0));
     // At real time or faster every clip tick has its own media tick, so clip to
     // media and back is exact; slower, media to clip and back is exact.
     for (const auto& transform : {fast, reverse, half, third})

@@ -128,64 +128,50 @@ TEST_F(PixelFormatTest, SelectNearestFollowsItsPreferenceOrder)
         MakePixelFormatCode('t', '2', '4', ' '),
         MakePixelProperties(false, kPixelSampleKind_16u, 4, true, false, kPixelChroma_444, false,
                             kPixelFieldLayout_Interleaved, 1, 24));
-    struct Case
-    {
-        const char* why;
-        PixelFormat requested;
-        std::vector<PixelFormat> list;
-        std::uint32_t quality;
-        PixelFormat expected;
-    };
-    const Case cases[] = {
-        {"exact match", kBgra16, {kBgra32, kBgra16}, 5, kBgra16},
-        {"nothing deeper: deepest below", kBgra32, {kBgra8, kBgra16}, 5, kBgra16},
-        {"model outranks depth", kVuya8, {kBgra8, kVuya32}, 5, kVuya32},
-        {"raster before compressed", kYuyv, {kPixelFormat_MJPG_422_Compressed, kBgra8}, 5, kBgra8},
-        {"same chroma sampling", kYuyv, {kYuyvHalf, kYuyvFields, kVuya8}, 5, kYuyvFields},
-        {"low quality: nearest depth", kBgra16, {kBgra32, kBgra8}, 2, kBgra8},
-        {"tie at draft: the shallower", rgb24, {kBgra32, kBgra16}, 0, kBgra16},
-        {"list order on equals, swapped", kBgra16, {rgba, kBgra8}, 5, rgba},
-        {"empty list", kBgra8, {}, 5, kInvalid},
-        {"invalid request", kInvalid, {kBgra8}, 5, kInvalid},
-        {"only wildcards", kBgra8, {kInvalid}, 5, kInvalid},
-        {"Any in the list takes the request", kYuyv, {kBgra8, kAny}, 5, kYuyv},
-        {"Any requested: first concrete", kAny, {kAny, kVuya8, kBgra8}, 5, kVuya8},
-    };
-    for (const Case& c : cases)
-        EXPECT_EQ(SelectNearestPixelFormat(c.requested, c.list, c.quality), c.expected) << c.why;
+    // (why, requested, list, quality, expected)
+    const std::tuple<const char*, PixelFormat, std::vector<PixelFormat>, std::uint32_t, PixelFormat>
+        cases[] = {
+            {"exact match", kBgra16, {kBgra32, kBgra16}, 5, kBgra16},
+            {"nothing deeper: deepest below", kBgra32, {kBgra8, kBgra16}, 5, kBgra16},
+            {"model outranks depth", kVuya8, {kBgra8, kVuya32}, 5, kVuya32},
+            {"raster first", kYuyv, {kPixelFormat_MJPG_422_Compressed, kBgra8}, 5, kBgra8},
+            {"same chroma sampling", kYuyv, {kYuyvHalf, kYuyvFields, kVuya8}, 5, kYuyvFields},
+            {"low quality: nearest depth", kBgra16, {kBgra32, kBgra8}, 2, kBgra8},
+            {"tie at draft: the shallower", rgb24, {kBgra32, kBgra16}, 0, kBgra16},
+            {"list order on equals, swapped", kBgra16, {rgba, kBgra8}, 5, rgba},
+            {"empty list", kBgra8, {}, 5, kInvalid},
+            {"invalid request", kInvalid, {kBgra8}, 5, kInvalid},
+            {"only wildcards", kBgra8, {kInvalid}, 5, kInvalid},
+            {"Any in the list takes the request", kYuyv, {kBgra8, kAny}, 5, kYuyv},
+            {"Any requested: first concrete", kAny, {kAny, kVuya8, kBgra8}, 5, kVuya8},
+        };
+    for (const auto& [why, requested, list, quality, expected] : cases)
+        EXPECT_EQ(SelectNearestPixelFormat(requested, list, quality), expected) << why;
     // The two-argument form decides as at kRenderQuality_Max.
     EXPECT_EQ(SelectNearestPixelFormat(kBgra16, {rgba, kBgra8}), rgba);
 }
 
 TEST_F(PixelFormatTest, SelectFromRankedRequestsFollowsTheDocumentedSteps)
 {
-    struct Case
-    {
-        const char* why;
-        std::vector<PixelFormat> requested;
-        PixelFormat fallback;
-        std::vector<PixelFormat> available;
-        std::uint32_t quality;
-        bool allowNearest;
-        PixelFormat expected;
-    };
-    const Case cases[] = {
-        {"ranking among exact", {kBgra32, kBgra8}, kYuyv, {kBgra8, kBgra32}, 5, true, kBgra32},
-        {"no nearest: fallback", {kBgra16}, kInvalid, {kVuya8, kBgra32}, 5, false, kInvalid},
-        {"the format in hand", {kBgra8}, kYuyv, {kVuya8, kYuyv}, 5, true, kYuyv},
-        {"nearest at draft", {kBgra16}, kYuyv, {kBgra8, kBgra32}, 0, true, kBgra8},
-        {"Any offered: in hand", {kBgra8}, kYuyv, {kAny}, 5, true, kYuyv},
-        {"Any offered, no nearest", {kBgra8}, kYuyv, {kAny}, 5, false, kBgra8},
-        {"Any offered, none in hand", {kBgra8}, kInvalid, {kAny}, 5, true, kBgra8},
-        {"Any requested: in hand", {kAny}, kYuyv, {kBgra8, kYuyv}, 5, true, kYuyv},
-        {"Any requested: first", {kAny}, kBgra32, {kVuya8, kBgra8}, 5, true, kVuya8},
-        {"nothing available", {kBgra8}, kYuyv, {}, 5, true, kYuyv},
-        {"only invalid requested", {kInvalid}, kInvalid, {kBgra8}, 5, true, kInvalid}};
-    for (const Case& c : cases)
-        EXPECT_EQ(SelectNearestPixelFormat(c.requested, c.fallback, c.available, c.quality,
-                                           c.allowNearest),
-                  c.expected)
-            << c.why;
+    // (why, requested, fallback, available, quality, allow nearest, expected)
+    const std::tuple<const char*, std::vector<PixelFormat>, PixelFormat, std::vector<PixelFormat>,
+                     std::uint32_t, bool, PixelFormat>
+        cases[] = {
+            {"ranking among exact", {kBgra32, kBgra8}, kYuyv, {kBgra8, kBgra32}, 5, true, kBgra32},
+            {"no nearest: fallback", {kBgra16}, kInvalid, {kVuya8, kBgra32}, 5, false, kInvalid},
+            {"the format in hand", {kBgra8}, kYuyv, {kVuya8, kYuyv}, 5, true, kYuyv},
+            {"nearest at draft", {kBgra16}, kYuyv, {kBgra8, kBgra32}, 0, true, kBgra8},
+            {"Any offered: in hand", {kBgra8}, kYuyv, {kAny}, 5, true, kYuyv},
+            {"Any offered, no nearest", {kBgra8}, kYuyv, {kAny}, 5, false, kBgra8},
+            {"Any offered, none in hand", {kBgra8}, kInvalid, {kAny}, 5, true, kBgra8},
+            {"Any requested: in hand", {kAny}, kYuyv, {kBgra8, kYuyv}, 5, true, kYuyv},
+            {"Any requested: first", {kAny}, kBgra32, {kVuya8, kBgra8}, 5, true, kVuya8},
+            {"nothing available", {kBgra8}, kYuyv, {}, 5, true, kYuyv},
+            {"only invalid requested", {kInvalid}, kInvalid, {kBgra8}, 5, true, kInvalid}};
+    for (const auto& [why, requested, fallback, available, quality, nearest, expected] : cases)
+        EXPECT_EQ(SelectNearestPixelFormat(requested, fallback, available, quality, nearest),
+                  expected)
+            << why;
 }
 
 } // namespace
