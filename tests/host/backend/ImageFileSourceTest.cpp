@@ -74,10 +74,7 @@ TEST_F(ImageFileSourceTest, StillsReadBackAtEveryTimeScaleAndKeyByContent)
     WriteSolidJpeg(jpeg, 16, 8, 200, 100, 50);
     const BE::VideoSourceRef solid = OpenOrFail(jpeg);
     EXPECT_EQ(solid->GetAlphaChannel(), kAlphaChannel_None);
-    BE::VideoFrameRequest request;
-    request.mWidth = 4;
-    request.mHeight = 2;
-    const FrameRef small = ReadFrameOrFail(solid, TickTime(), request);
+    const FrameRef small = ReadFrameOrFail(solid, TickTime(), {4, 2});
     EXPECT_EQ(small->GetBounds(), QRT::ParamRect(0, 0, 4, 2));
     const auto pixel = Pixel(small, 3, 1);
     for (const auto& [channel, value] : {std::pair{0, 50}, {1, 100}, {2, 200}, {3, 255}})

@@ -20,14 +20,6 @@ TickTime FrameTime(std::int64_t inFrame)
     return TickTime::FromFrame(inFrame, kFrameRate_Video25);
 }
 
-BE::VideoFrameRequest Sized(int inWidth, int inHeight)
-{
-    BE::VideoFrameRequest request;
-    request.mWidth = inWidth;
-    request.mHeight = inHeight;
-    return request;
-}
-
 // The left edge of the moving box in the given row, or -1 when the row shows no box.
 int BoxLeft(const FrameRef& inFrame, int inRow)
 {
@@ -61,8 +53,8 @@ TEST_F(PatternSourceTest, PixelsHaveTheirExactValues)
         for (int x = 0; x < 70; ++x)
             ASSERT_EQ(Pixel(bars, x, y), colours[x / 10]) << x << "," << y;
     // A smaller request is scaled down.
-    const FrameRef small = ReadFrameOrFail(OpenOrFail("pattern:solid?size=64x32&color=336699"),
-                                           TickTime(), Sized(16, 8));
+    const FrameRef small =
+        ReadFrameOrFail(OpenOrFail("pattern:solid?size=64x32&color=336699"), TickTime(), {16, 8});
     EXPECT_EQ(small->GetBounds(), QRT::ParamRect(0, 0, 16, 8));
     EXPECT_EQ(Pixel(small, 15, 7), Bgra(0x99, 0x66, 0x33));
 }
@@ -91,7 +83,7 @@ TEST_F(PatternSourceTest, MovingBoxAdvancesEveryFieldAndTheFrameNumberIsDrawn)
         ReadFrameOrFail(OpenOrFail("pattern:moving?size=64x32&field=lower"), FrameTime(2));
     EXPECT_EQ(std::tuple(BoxLeft(lower, 31), BoxLeft(lower, 30)), std::tuple(8, 10));
     // Scaled to half height, the fields stay apart.
-    const FrameRef scaled = ReadFrameOrFail(upper, FrameTime(2), Sized(64, 16));
+    const FrameRef scaled = ReadFrameOrFail(upper, FrameTime(2), {64, 16});
     ASSERT_EQ(scaled->GetBounds().Height(), 16);
     EXPECT_EQ(std::tuple(BoxLeft(scaled, 14), BoxLeft(scaled, 15)), std::tuple(8, 10));
 }
@@ -158,7 +150,7 @@ TEST_F(PatternSourceTest, NoBlockRequestsAnswerOnlyHeldFramesAndKeysTellFramesAp
     const auto key = KeyOf(source, FrameTime(4));
     EXPECT_EQ(key, KeyOf(source, FrameTime(4) + TickTime::TicksToTime(5))) << "the same frame";
     EXPECT_NE(key, KeyOf(source, FrameTime(5)));
-    EXPECT_NE(key, KeyOf(source, FrameTime(4), Sized(16, 8)));
+    EXPECT_NE(key, KeyOf(source, FrameTime(4), {16, 8}));
     const auto profile = std::make_shared<const std::vector<std::uint8_t>>(3, 1);
     EXPECT_NE(key, KeyOf(source, FrameTime(4), {}, BE::ColorProfile{"sRGB", profile}));
     // Time-invariant media: one key for every time.

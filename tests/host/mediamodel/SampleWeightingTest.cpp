@@ -21,16 +21,9 @@ const FrameRate kFieldRate = kFrameRate_Video5994;
 const FrameRate kSequenceRate = kFrameRate_Video2997;
 constexpr auto Ticks = &TickTime::TicksToTime;
 
-// inHalves half fields: HalfFields(5) is 2.5 P.
-TickTime HalfFields(std::int64_t inHalves)
-{
-    return Ticks(inHalves * kField / 2);
-}
-
-TickTime Fields(std::int64_t inFields)
-{
-    return Ticks(inFields * kField);
-}
+// Whole and half field periods: HalfFields(5) is 2.5 P.
+const auto Fields = [](std::int64_t inFields) { return Ticks(inFields * kField); };
+const auto HalfFields = [](std::int64_t inHalves) { return Ticks(inHalves * kField / 2); };
 
 // The reference, first-field and second-field durations in media time.
 std::tuple<TickTime, TickTime, TickTime> Durations(const FrameRate& inUpstream,
