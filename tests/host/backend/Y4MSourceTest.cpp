@@ -146,11 +146,10 @@ TEST_F(Y4MSourceTest, FramesBeyondTheFileAreOutOfRangeAndKeysFollowTheFile)
     EXPECT_EQ(QRT::QueryRef<BE::Deprecated::IMediaInfo>(source)->GetDuration(),
               TickTime::FromFrame(3, rate));
     // YUV formats are delivered when asked for.
-    BE::VideoFrameRequest request;
-    request.mPixelFormat = kPixelFormat_VUYA_4444_8u;
-    EXPECT_EQ(Pixel(ReadFrameOrFail(source, TickTime(), request), 3, 1), Bgra(34, 54, 145));
-    request.mPixelFormat = kPixelFormat_YUYV_422_8u;
-    EXPECT_EQ(Pixel(ReadFrameOrFail(source, TickTime(), request), 1, 1), Bgra(145, 54, 145, 34));
+    const auto InFormat = [&](PixelFormat inFormat)
+    { return ReadFrameOrFail(source, TickTime(), {.mPixelFormat = inFormat}); };
+    EXPECT_EQ(Pixel(InFormat(kPixelFormat_VUYA_4444_8u), 3, 1), Bgra(34, 54, 145));
+    EXPECT_EQ(Pixel(InFormat(kPixelFormat_YUYV_422_8u), 1, 1), Bgra(145, 54, 145, 34));
     // Keys are stable across opens; the same content in another file is other material.
     const auto key = source->GetFrameKey(TickTime(), {}, {}, {});
     EXPECT_EQ(key, OpenOrFail(mPath)->GetFrameKey(TickTime(), {}, {}, {}));
