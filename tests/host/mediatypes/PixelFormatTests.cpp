@@ -20,10 +20,8 @@ constexpr unsigned kRender = 1, kFields = 2, kHalved = 4, kYuv = 8, kAlpha = 16,
 struct Expected
 {
     PixelFormat format;
-    const char* name;
-    const char* code;
-    std::uint32_t bytesPerPixel, channels, bitDepth, sampleKind;
-    unsigned traits;
+    const char *name, *code;
+    std::uint32_t bytesPerPixel, channels, bitDepth, sampleKind, traits;
 };
 
 const Expected kCatalogue[] = {
@@ -67,9 +65,8 @@ TEST_F(PixelFormatTest, EveryCatalogueFormatAnswersTheRendererBitTests)
     {
         SCOPED_TRACE(e.name);
         const std::uint32_t word = Word(e.format);
-        const auto has = [&](unsigned inTrait) { return (e.traits & inTrait) != 0; };
         // The renderer tests the raw word for render formats.
-        EXPECT_EQ((word & 0xC0000) == 0x40000 && (word & 0xC00) == 0, has(kRender));
+        EXPECT_EQ((word & 0xC0000) == 0x40000 && (word & 0xC00) == 0, (e.traits & kRender) != 0);
         EXPECT_EQ((word >> 1) & 7, e.sampleKind) << "bits 1-3 are the sample kind";
         const PixelFormat f = e.format;
         const unsigned traits = kRender * f.IsRenderFormat() | kFields * f.IsFieldByField() |
