@@ -52,11 +52,6 @@ TEST_F(PatternSourceTest, PixelsHaveTheirExactValues)
     for (int y = 0; y < 4; ++y)
         for (int x = 0; x < 70; ++x)
             ASSERT_EQ(Pixel(bars, x, y), colours[x / 10]) << x << "," << y;
-    // A smaller request is scaled down.
-    const FrameRef small =
-        ReadFrameOrFail(OpenOrFail("pattern:solid?size=64x32&color=336699"), TickTime(), {16, 8});
-    EXPECT_EQ(small->GetBounds(), QRT::ParamRect(0, 0, 16, 8));
-    EXPECT_EQ(Pixel(small, 15, 7), Bgra(0x99, 0x66, 0x33));
 }
 
 TEST_F(PatternSourceTest, MovingBoxAdvancesEveryFieldAndTheFrameNumberIsDrawn)
@@ -110,11 +105,6 @@ TEST_F(PatternSourceTest, DescriptionAndMediaInterfacesFollowThePattern)
               moving->GetFrameKey(TickTime(), {}, {}, {}));
     EXPECT_EQ(QRT::QueryRef<BE::Deprecated::IMediaInfo>(OpenOrFail("pattern:bars"))->GetKind(),
               BE::Deprecated::kMediaInfoKind_TimeInvariant);
-    // Alpha and matte reach the source and its frames.
-    const BE::VideoSourceRef matte = OpenOrFail(
-        "pattern:solid?size=4x4&color=204060&alpha=premultiplied&opacity=100&matte=FFFFFF");
-    EXPECT_EQ(matte->GetMatteColor().GetRGB24(), 0xFFFFFFu);
-    EXPECT_EQ(ReadFrameOrFail(matte, TickTime())->GetAlphaChannel(), kAlphaChannel_Premultiplied);
 }
 
 TEST_F(PatternSourceTest, NoBlockRequestsAnswerOnlyHeldFramesAndKeysTellFramesApart)
