@@ -133,12 +133,6 @@ TEST_F(SampleWeightingTest, BadArgumentsBreakContracts)
     EXPECT_INPUT_CONTRACT(
         MF::GetWeightedSamplesForRange(kTime_Min, kTime_Max, kFieldRate, 1, samples),
         "count <= static_cast<Int128>(kMaxSamplesPerRange)");
-    EXPECT_INPUT_CONTRACT(
-        MF::GetWeightedSamplesForRange(Fields(1), Fields(2), kFrameRate_Zero, 1, samples),
-        "inUpstreamFieldRate.GetTicksPerFrame() > 0");
-    EXPECT_INPUT_CONTRACT(
-        MF::GetWeightedSamplesForRange(kTime_Invalid, Fields(1), kFieldRate, 1, samples),
-        "inStart.IsValid()");
     MF::WeightedSampleList negative{{{Fields(1), 1}, -0.5}};
     EXPECT_INPUT_CONTRACT(MF::NormalizeSampleWeights(negative),
                           "std::isfinite(sample.second) && sample.second >= 0.0");
