@@ -4,7 +4,6 @@
 #include "VF/VideoFrame.h"
 
 #include <cstdio>
-#include <tuple>
 
 #include <gtest/gtest.h>
 #include <jpeglib.h>

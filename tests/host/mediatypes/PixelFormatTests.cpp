@@ -1,6 +1,5 @@
 #include "mvxmediatypes/PixelFormat.h"
 
-#include <algorithm>
 #include <set>
 #include <string>
 #include <tuple>
