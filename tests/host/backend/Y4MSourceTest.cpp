@@ -1,8 +1,6 @@
 #include "BE/MediaStatus.h"
 #include "BackendTestSupport.h"
 
-#include <algorithm>
-#include <cmath>
 #include <cstring>
 #include <tuple>
 
@@ -14,18 +12,20 @@ namespace
 using namespace betest;
 using namespace mvxmediatypes;
 
+// A frame colour as video-range Y'CbCr and as 8-bit BGRA by the BT.601 and BT.709 matrices.
 struct Yuv
 {
     int mY, mCb, mCr;
+    std::array<int, 4> mBT601, mBT709;
 };
 
-const Yuv kReddish{81, 90, 240};
-const Yuv kGreenish{145, 54, 34};
-const Yuv kBluish{41, 240, 110};
+const Yuv kColours[] = {{81, 90, 240, Bgra(0, 0, 254), Bgra(0, 24, 255)},
+                        {145, 54, 34, Bgra(1, 255, 0), Bgra(0, 216, 0)},
+                        {41, 240, 110, Bgra(255, 0, 0), Bgra(255, 15, 0)}};
 
-Yuv Colour(char inName)
+const Yuv& Colour(char inName)
 {
-    return inName == 'R' ? kReddish : inName == 'G' ? kGreenish : kBluish;
+    return kColours[inName == 'R' ? 0 : inName == 'G' ? 1 : 2];
 }
 
 // A Y4M file of inWidth x inHeight with one frame per letter of inFrames (R, G
@@ -39,26 +39,13 @@ std::string MakeY4M(const std::string& inHeader, int inWidth, int inHeight, cons
     std::string bytes = inHeader + "\n";
     for (const char* name = inFrames; *name; ++name)
     {
-        const Yuv frame = Colour(*name);
+        const Yuv& frame = Colour(*name);
         bytes += "FRAME\n";
         bytes.append(std::size_t(inWidth) * inHeight, char(frame.mY));
         bytes.append(chroma, char(frame.mCb));
         bytes.append(chroma, char(frame.mCr));
     }
     return bytes;
-}
-
-// Video-range Y'CbCr to 8-bit B, G, R by the matrix's luma weights.
-std::array<int, 4> ExpectedBgra(const Yuv& inYuv, bool inBT601)
-{
-    const double kr = inBT601 ? 0.299 : 0.2126;
-    const double kb = inBT601 ? 0.114 : 0.0722;
-    const double y = (inYuv.mY - 16) * 255.0 / 219.0;
-    const double red = y + 2 * (1 - kr) * (inYuv.mCr - 128) * 255.0 / 224.0;
-    const double blue = y + 2 * (1 - kb) * (inYuv.mCb - 128) * 255.0 / 224.0;
-    const double green = (y - kr * red - kb * blue) / (1 - kr - kb);
-    auto clamp = [](double inValue) { return int(std::lround(std::clamp(inValue, 0.0, 255.0))); };
-    return Bgra(clamp(blue), clamp(green), clamp(red));
 }
 
 void ExpectNear(const std::array<int, 4>& inActual, const std::array<int, 4>& inExpected)
@@ -125,7 +112,8 @@ TEST_P(Y4MVariantTest, HeaderIsDescribedAndEveryFrameReadsAsBgra)
         const FrameRef frame = ReadFrameOrFail(source, TickTime::FromFrame(index, v.rate));
         ASSERT_TRUE(frame);
         EXPECT_EQ(frame->GetFieldType(), v.field);
-        const auto expected = ExpectedBgra(Colour(v.frames[index]), bt601);
+        const auto& expected =
+            bt601 ? Colour(v.frames[index]).mBT601 : Colour(v.frames[index]).mBT709;
         ExpectNear(Pixel(frame, 0, 0), expected);
         ExpectNear(Pixel(frame, v.width - 1, v.height - 1), expected);
     }
@@ -137,20 +125,13 @@ const FieldType kP = kFieldType_Progressive;
 const FieldType kUF = kFieldType_UpperFirst;
 
 // Without C: 4:2:0; A0:0 (unknown): square.
-INSTANTIATE_TEST_SUITE_P(
-    Variants, Y4MVariantTest,
-    ::testing::Values(
-        Variant{"YUV4MPEG2 W8 H6 F25:1 Ip A1:1 C420jpeg", 8, 6, "RGB", k25, kP, {1, 1}},
-        Variant{"YUV4MPEG2 W6 H4 F30:1 C422", 6, 4, "G", kFrameRate_Video30, kP, {1, 1}},
-        Variant{"YUV4MPEG2 W4 H720 F25:1 C420", 4, 720, "R", k25, kP, {1, 1}},
-        Variant{"YUV4MPEG2 W4 H4 F30000:1001 It A10:11 C444 XYSCSS=444",
-                4,
-                4,
-                "B",
-                k2997,
-                kUF,
-                {10, 11}},
-        Variant{"YUV4MPEG2 W4 H4 F25:1 Ib A0:0", 4, 4, "GR", k25, kFieldType_LowerFirst, {1, 1}}));
+const Variant kVariants[] = {
+    {"YUV4MPEG2 W8 H6 F25:1 Ip A1:1 C420jpeg", 8, 6, "RGB", k25, kP, {1, 1}},
+    {"YUV4MPEG2 W6 H4 F30:1 C422", 6, 4, "G", kFrameRate_Video30, kP, {1, 1}},
+    {"YUV4MPEG2 W4 H720 F25:1 C420", 4, 720, "R", k25, kP, {1, 1}},
+    {"YUV4MPEG2 W4 H4 F30000:1001 It A10:11 C444 XYSCSS=444", 4, 4, "B", k2997, kUF, {10, 11}},
+    {"YUV4MPEG2 W4 H4 F25:1 Ib A0:0", 4, 4, "GR", k25, kFieldType_LowerFirst, {1, 1}}};
+INSTANTIATE_TEST_SUITE_P(Variants, Y4MVariantTest, ::testing::ValuesIn(kVariants));
 
 TEST_F(Y4MSourceTest, FramesBeyondTheFileAreOutOfRangeAndKeysFollowTheFile)
 {
@@ -165,11 +146,10 @@ TEST_F(Y4MSourceTest, FramesBeyondTheFileAreOutOfRangeAndKeysFollowTheFile)
     EXPECT_EQ(QRT::QueryRef<BE::Deprecated::IMediaInfo>(source)->GetDuration(),
               TickTime::FromFrame(3, rate));
     // YUV formats are delivered when asked for.
-    BE::VideoFrameRequest request;
-    request.mPixelFormat = kPixelFormat_VUYA_4444_8u;
-    EXPECT_EQ(Pixel(ReadFrameOrFail(source, TickTime(), request), 3, 1), Bgra(34, 54, 145));
-    request.mPixelFormat = kPixelFormat_YUYV_422_8u;
-    EXPECT_EQ(Pixel(ReadFrameOrFail(source, TickTime(), request), 1, 1), Bgra(145, 54, 145, 34));
+    const auto InFormat = [&](PixelFormat inFormat)
+    { return ReadFrameOrFail(source, TickTime(), {.mPixelFormat = inFormat}); };
+    EXPECT_EQ(Pixel(InFormat(kPixelFormat_VUYA_4444_8u), 3, 1), Bgra(34, 54, 145));
+    EXPECT_EQ(Pixel(InFormat(kPixelFormat_YUYV_422_8u), 1, 1), Bgra(145, 54, 145, 34));
     // Keys are stable across opens; the same content in another file is other material.
     const auto key = source->GetFrameKey(TickTime(), {}, {}, {});
     EXPECT_EQ(key, OpenOrFail(mPath)->GetFrameKey(TickTime(), {}, {}, {}));

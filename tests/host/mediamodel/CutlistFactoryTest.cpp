@@ -4,7 +4,6 @@
 #include "QRT/Allocated.h"
 
 #include <atomic>
-#include <thread>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -112,38 +111,6 @@ TEST_F(CutlistFactoryTest, PublicationAnswersTheLatestFactoryAndReleasesTheOneBe
     MF::SetCutlistFactory(MakeFactory(3));
     EXPECT_EQ(sTagSeenAtDestruction.load(), 3);
     EXPECT_EQ(sLiveFactories.load(), 2);
-}
-
-TEST_F(CutlistFactoryTest, ConcurrentReadersSeeOnlyPublishedFactories)
-{
-    constexpr int kReaders = 4;
-    constexpr int kReplacements = 2000;
-    std::atomic<bool> writing{true};
-    std::atomic<int> badTags{0};
-    std::atomic<long> reads{0};
-    std::vector<std::thread> readers;
-    for (int reader = 0; reader < kReaders; ++reader)
-        readers.emplace_back(
-            [&]
-            {
-                while (writing.load())
-                    if (const auto factory = MF::GetCutlistFactory())
-                    {
-                        const QRT::Result tag = TagOf(factory);
-                        badTags += tag < 100 || tag >= 100 + kReplacements;
-                        ++reads;
-                    }
-            });
-    for (int index = 0; index < kReplacements; ++index)
-        MF::SetCutlistFactory(MakeFactory(100 + index));
-    while (reads.load() < kReaders)
-        std::this_thread::yield();
-    writing = false;
-    for (std::thread& thread : readers)
-        thread.join();
-    EXPECT_EQ(badTags.load(), 0);
-    EXPECT_EQ(TagOf(MF::GetCutlistFactory()), 100 + kReplacements - 1);
-    EXPECT_EQ(sLiveFactories.load(), 1);
 }
 
 } // namespace

@@ -56,9 +56,6 @@ TEST_F(PixelAspectRatioAdjustTest, RatioFollowsTheColumnAndRowFactorsAndBadSizes
     EXPECT_INPUT_CONTRACT(MF::AdjustPixelAspectRatioForNonUniformDownsample(
                               kPixelAspectRatio_Square, 0, 480, 720, 480),
                           "inRequestedWidth > 0 && inRequestedHeight > 0");
-    EXPECT_INPUT_CONTRACT(MF::AdjustPixelAspectRatioForNonUniformDownsample(
-                              kPixelAspectRatio_Square, 720, 480, 720, -1),
-                          "inFrameWidth > 0 && inFrameHeight > 0");
     EXPECT_INPUT_CONTRACT(MF::AdjustPixelAspectRatioForNonUniformDownsample(PixelAspectRatio(1, 0),
                                                                             720, 480, 720, 480),
                           "inPixelAspectRatio.IsValid() || inPixelAspectRatio.IsAny()");

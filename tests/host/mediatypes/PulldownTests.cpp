@@ -34,10 +34,8 @@ const Placement kCycle[5][4] = {
     {{1, false}, {2, false}, {4, true}, {5, false}}, // DD: A B C D
 };
 
-std::int64_t FloorDiv(std::int64_t inValue, std::int64_t inDivisor)
-{
-    return inValue >= 0 ? inValue / inDivisor : -((-inValue + inDivisor - 1) / inDivisor);
-}
+const auto FloorDiv = [](std::int64_t inValue, std::int64_t inDivisor)
+{ return inValue >= 0 ? inValue / inDivisor : -((-inValue + inDivisor - 1) / inDivisor); };
 
 using PulldownTest = ::testing::Test;
 

@@ -10,22 +10,13 @@ extern "C" int CallFirstSuiteFunctionFromC(const char* inName, int32_t inVersion
 namespace
 {
 
-int TimesThree(int inValue)
-{
-    return inValue * 3;
-}
-int PlusOne(int inValue)
-{
-    return inValue + 1;
-}
-
 struct IntSuite
 {
     int (*mFirst)(int);
 };
 
-const IntSuite kTimesThreeSuite = {&TimesThree};
-const IntSuite kPlusOneSuite = {&PlusOne};
+const IntSuite kTimesThreeSuite = {[](int inValue) { return inValue * 3; }};
+const IntSuite kPlusOneSuite = {[](int inValue) { return inValue + 1; }};
 constexpr const char* kName = "Test Suite";
 
 class BrambleSupportTest : public ::testing::Test
