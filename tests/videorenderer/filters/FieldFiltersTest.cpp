@@ -182,7 +182,9 @@ TEST_F(FieldFiltersTest, InterlaceConsecutiveTakesEachFieldFromTheUpstreamFrameA
     EXPECT_EQ(progressive->Prefetched(),
               (std::vector{MF::FrameTime(four), MF::FrameTime(five), MF::FrameTime(four)}));
     const std::size_t renders = progressive->Rendered().size();
-    EXPECT_TRUE(progressive->LastFrame() == Render(*filter, MF::FrameTime(t), mParams));
+    // Rendered first: the upstream's last frame is the one this render made.
+    const FrameRef rendered = Render(*filter, MF::FrameTime(t), mParams);
+    EXPECT_TRUE(progressive->LastFrame() == rendered);
     EXPECT_EQ(progressive->Rendered().size(), renders + 1);
 }
 

@@ -37,12 +37,15 @@ TEST_F(ScalerTest, AFrameAlreadyAtTheRequestedBoundsAndRatioPassesUnchanged)
 {
     const CutlistRenderParams params = MakeParams(8, 6);
     auto progressive = MakeMarkedSource(Delivery::kProgressive);
-    EXPECT_TRUE(progressive->LastFrame() ==
-                Render(*ScaleAndPARCorrectSource(progressive), MF::FrameTime(mT), params));
+    // Each render comes first: the upstream's last frame is the one it made.
+    const FrameRef fromProgressive =
+        Render(*ScaleAndPARCorrectSource(progressive), MF::FrameTime(mT), params);
+    EXPECT_TRUE(progressive->LastFrame() == fromProgressive);
     // Interlaced in the requested order passes too.
     auto upper = MakeMarkedSource(Delivery::kUpperFirst);
-    EXPECT_TRUE(upper->LastFrame() ==
-                Render(*ScaleAndPARCorrectSource(upper), MF::FrameTime(mT, mTField), params));
+    const FrameRef fromUpper =
+        Render(*ScaleAndPARCorrectSource(upper), MF::FrameTime(mT, mTField), params);
+    EXPECT_TRUE(upper->LastFrame() == fromUpper);
 }
 
 TEST_F(ScalerTest, Reducing1080iTo576iKeepsEveryFieldsRowsFromTheSameFieldAndEvenHeights)

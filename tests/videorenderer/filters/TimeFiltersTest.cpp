@@ -74,8 +74,11 @@ TEST_F(TimeFiltersTest, TimeMixTakesEachFieldOrFrameFromUpstreamAtItsTime)
     const SourceRef blend = Blend(upper, 1.0);
     const MF::FrameTime request(F(6), F(7));
     EXPECT_EQ(Conform(*mix, request, mParams), request);
-    EXPECT_TRUE(upper->LastFrame() == Render(*mix, request, mParams));
-    EXPECT_TRUE(upper->LastFrame() == Render(*blend, request, mParams));
+    // Each render comes first: the upstream's last frame is the one it made.
+    const FrameRef mixed = Render(*mix, request, mParams);
+    EXPECT_TRUE(upper->LastFrame() == mixed);
+    const FrameRef blended = Render(*blend, request, mParams);
+    EXPECT_TRUE(upper->LastFrame() == blended);
     EXPECT_EQ(RateOf(*mix), mt::kFrameRate_Video5994);
     EXPECT_EQ(RateOf(*blend), mt::kFrameRate_Video1000);
     // Progressive material off its grid keeps the whole frame.
