@@ -3,7 +3,9 @@
 #include "ContractExpect.h"
 #include "FrameTestSupport.h"
 
+#include <atomic>
 #include <cstdlib>
+#include <thread>
 
 #include <gtest/gtest.h>
 
@@ -147,6 +149,36 @@ TEST_F(SharedVideoFrameCacheTest, BadInputIsAContractError)
     EXPECT_INPUT_CONTRACT(mCache.InsertIntoCache(MakeTagged(0), KeyFor(0), -1), "inPriority >= 0");
     EXPECT_INPUT_CONTRACT(mCache.UnregisterDependencyOnFrame(KeyFor(3)), "registered");
     EXPECT_EQ(Counts(mCache), (Expected{0, 0, 0, 0, 0, 0, 0}));
+}
+
+TEST_F(SharedVideoFrameCacheTest, NotificationIsCalledOutsideEveryLock)
+{
+    // While the notification runs, another thread uses keys of every shard, inserts past the
+    // budget (evicting) and replaces the notification. It would block forever if the
+    // inserting thread still held any cache lock.
+    std::atomic<int> calls{0};
+    mCache.SetNotificationFunction(
+        [&](const Guid&)
+        {
+            if (calls.fetch_add(1) != 0)
+                return;
+            std::thread other(
+                [&]
+                {
+                    for (uint32_t i = 100; i < 164; ++i)
+                    {
+                        mCache.RetrieveFromCache(KeyFor(i));
+                        Insert(i, 0);
+                        mCache.RegisterDependencyOnFrame(KeyFor(i));
+                        mCache.UnregisterDependencyOnFrame(KeyFor(i));
+                    }
+                    mCache.SetNotificationFunction([&](const Guid&) { calls.fetch_add(1); });
+                });
+            other.join();
+        });
+    Insert(0, 0);
+    Insert(1, 0);
+    EXPECT_EQ(calls.load(), 1 + 64 + 1);
 }
 
 TEST_F(SharedVideoFrameCacheTest, DisabledCacheOrTooLargeFrameIsMarkedAndNotifiedButNotStored)
