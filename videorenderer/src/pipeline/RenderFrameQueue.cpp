@@ -101,7 +101,8 @@ RenderFrameQueueImpl::~RenderFrameQueueImpl()
     VF::SharedVideoFrameCache::SetNotificationFunction({});
     // Whatever is still queued can no longer be delivered; a thread that
     // waits for it is woken.
-    std::vector<QueueEntry> left = TakeEverythingQueued();
+    std::vector<QueueEntry> left = TakeEverythingQueued("RenderFrameQueue::~RenderFrameQueue",
+                                                        "RenderFrameQueue::~RenderFrameQueue2");
     for (const QueueEntry& entry : left)
         WakeWaiter(entry.mRequest);
     for (auto& [key, entry] : mRedundant)
@@ -137,17 +138,8 @@ void RenderFrameQueueImpl::Shutdown()
     try
     {
         sShuttingDown.store(true);
-        std::vector<QueueEntry> dropped;
-        {
-            QRT::CriticalSectionLock lock(mMainLock, "RenderFrameQueue::Shutdown");
-            dropped = TakeEverythingQueuedLocked();
-        }
-        {
-            QRT::CriticalSectionLock lock(mAcceleratedLock, "RenderFrameQueue::Shutdown2");
-            for (auto& [key, entry] : mAccelerated)
-                dropped.push_back(std::move(entry));
-            mAccelerated.clear();
-        }
+        std::vector<QueueEntry> dropped =
+            TakeEverythingQueued("RenderFrameQueue::Shutdown", "RenderFrameQueue::Shutdown2");
         // Dropped without notification; only a waiting thread is woken.
         for (const QueueEntry& entry : dropped)
             WakeWaiter(entry.mRequest);
@@ -213,14 +205,15 @@ std::vector<QueueEntry> RenderFrameQueueImpl::TakeEverythingQueuedLocked()
     return taken;
 }
 
-std::vector<QueueEntry> RenderFrameQueueImpl::TakeEverythingQueued()
+std::vector<QueueEntry> RenderFrameQueueImpl::TakeEverythingQueued(const char* inMainLabel,
+                                                                   const char* inAcceleratedLabel)
 {
     std::vector<QueueEntry> taken;
     {
-        QRT::CriticalSectionLock lock(mMainLock, "RenderFrameQueue::~RenderFrameQueue");
+        QRT::CriticalSectionLock lock(mMainLock, inMainLabel);
         taken = TakeEverythingQueuedLocked();
     }
-    QRT::CriticalSectionLock lock(mAcceleratedLock, "RenderFrameQueue::~RenderFrameQueue2");
+    QRT::CriticalSectionLock lock(mAcceleratedLock, inAcceleratedLabel);
     for (auto& [key, entry] : mAccelerated)
         taken.push_back(std::move(entry));
     mAccelerated.clear();

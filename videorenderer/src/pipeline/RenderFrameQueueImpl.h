@@ -251,7 +251,9 @@ private:
 
     // Called with the main lock held.
     std::vector<QueueEntry> TakeEverythingQueuedLocked();
-    std::vector<QueueEntry> TakeEverythingQueued();
+    // The lock labels name the caller (shutdown or destruction).
+    std::vector<QueueEntry> TakeEverythingQueued(const char* inMainLabel,
+                                                 const char* inAcceleratedLabel);
 
     // Guards the incoming list, the registries, the prefetch wait list and
     // both ready sets.
