@@ -22,6 +22,9 @@ public:
     std::atomic<int> mPollsUntilComplete{0};
     // Whether an incomplete handle asks for more time once the queue's wait is up.
     std::atomic<bool> mWantMoreTime{false};
+    // Whether the handle finishes (without a frame) while the queue asks it
+    // for more time, as a read ending between the queue's two questions does.
+    std::atomic<bool> mCompleteWhenAsked{false};
     std::atomic<int> mInitiateCount{0};
     std::atomic<int> mCancelCount{0};
     std::atomic<double> mLastElapsed{-1.0};
@@ -60,6 +63,8 @@ public:
     bool ContinueWaitingForPrefetch(double inElapsedSeconds) override
     {
         mLastElapsed.store(inElapsedSeconds);
+        if (mCompleteWhenAsked.load())
+            mComplete = true;
         return !mComplete.load() && mWantMoreTime.load();
     }
 

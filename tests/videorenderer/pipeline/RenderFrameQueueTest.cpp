@@ -456,7 +456,8 @@ TEST_F(RenderFrameQueueTest, PrefetchOnlyRequestsEndWithTheirFrameOrTimeOutAfter
     add(91);
     const auto patient = add(92).first;
     patient->mWantMoreTime = true;
-    ASSERT_TRUE(WaitUntil([&] { return Stats().mPrefetchWaiting == 4; }));
+    add(93).first->mCompleteWhenAsked = true;
+    ASSERT_TRUE(WaitUntil([&] { return Stats().mPrefetchWaiting == 5; }));
     EXPECT_EQ(done->mInitiateCount.load(), 1);
     const auto frame = MakeFrame(2, 2);
     done->Complete(frame);
@@ -469,7 +470,9 @@ TEST_F(RenderFrameQueueTest, PrefetchOnlyRequestsEndWithTheirFrameOrTimeOutAfter
     EXPECT_EQ(mRecorder.Count(), 1u);
     EXPECT_EQ(producer->mProduceCount.load(), 0);
     mClock.mOffsetMilliseconds = 15'100;
-    ASSERT_TRUE(mRecorder.WaitForCount(3));
+    ASSERT_TRUE(mRecorder.WaitForCount(4));
+    // A handle that finishes as it is asked for more time has not timed out.
+    EXPECT_EQ(mRecorder.Of(93).at(0).mStatus, 0);
     EXPECT_EQ(std::tuple(mRecorder.Of(91).at(0).mKind, mRecorder.Of(91)[0].mStatus),
               std::tuple(Delivery::kError, ML::kResult_PrefetchIncomplete));
     EXPECT_EQ(mRecorder.Of(95).at(0).mKind, Delivery::kComplete);
@@ -480,7 +483,7 @@ TEST_F(RenderFrameQueueTest, PrefetchOnlyRequestsEndWithTheirFrameOrTimeOutAfter
     EXPECT_GE(patient->mLastElapsed.load(), 15.0);
     EXPECT_EQ(Stats().mPrefetchWaiting, 1u);
     patient->Complete({});
-    ASSERT_TRUE(mRecorder.WaitForCount(4));
+    ASSERT_TRUE(mRecorder.WaitForCount(5));
     EXPECT_EQ(mRecorder.Of(92).at(0).mStatus, 0);
 }
 

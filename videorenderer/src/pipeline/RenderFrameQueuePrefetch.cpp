@@ -78,6 +78,13 @@ void RenderFrameQueueImpl::ProcessPrefetchRequests(bool inTimedKind)
                 const double elapsed = entry.mStopwatch.GetElapsedSeconds();
                 timedOut = elapsed > kPrefetchTimeoutSeconds &&
                            !entry.mRequest.PrefetchesWantMoreTime(elapsed);
+                // A handle may finish between the two questions: one that
+                // declines more time because it is done has not timed out.
+                if (timedOut && entry.mRequest.PrefetchesComplete())
+                {
+                    complete = true;
+                    timedOut = false;
+                }
             }
             if (complete && entry.mRequest.mPrefetchOnly)
                 entry.mRequest.GetPrefetchResult(frame);
