@@ -4,7 +4,7 @@ JOBS ?= $(shell nproc)
 CMAKE_GEN := -G Ninja
 PREFIX ?= /usr/local
 
-.PHONY: all deps build test asan tsan coverage release clang bench demo install install-check format format-check clean
+.PHONY: all deps build test asan tsan coverage release clang bench bench-compare demo install install-check format format-check clean
 
 all: build
 
@@ -72,6 +72,14 @@ demo: deps build/build.ninja
 bench: deps build/build.ninja
 	cmake --build build -j $(JOBS)
 	scripts/run-benchmarks build
+
+# Whole source renders through vrender and ffmpeg on one clip, on one core and on
+# all of them: wall and CPU time, peak memory and minor faults, with the ratios.
+bench-compare: deps build/build.ninja
+	scripts/install-bench-deps
+	cmake --build build -j $(JOBS) --target vrender
+	bench/compare/sources.sh
+	CORES=$(JOBS) bench/compare/sources.sh
 
 # Build the libraries and vrender (Release) and install them under $(PREFIX),
 # with the headers, the CMake package and videorenderer.pc.
