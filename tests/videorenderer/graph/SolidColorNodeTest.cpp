@@ -1,6 +1,5 @@
 // The solid-colour node, its producer's pixels and frame hash, and the disabled node.
 
-#include "IR/ImageRenderer.h"
 #include "ML/RenderableNodes.h"
 #include "QRT/Exception.h"
 #include "TestNodeKinds.h"
@@ -8,8 +7,11 @@
 #include "graph/RenderableNodeSolidColorImpl.h"
 
 #include <array>
+#include <cmath>
 #include <cstring>
+#include <string>
 #include <tuple>
+#include <vector>
 
 #include <gtest/gtest.h>
 
@@ -62,16 +64,11 @@ using SolidColorNodeTest = ::testing::Test;
 
 TEST_F(SolidColorNodeTest, ProducerFillsEveryPixelWithTheColourTheDefaultOrZero)
 {
-    // YUV pixels are whatever the image renderer's fill makes of the colour.
-    std::uint8_t yuv[4];
-    ASSERT_EQ(IR_FillWithColor(yuv, 4, kIR_PixelFormat_VUYA_4444_8u, 1, 1, 0xFF336699u, 0),
-              kIR_NoError);
     const mt::PixelFormat bgra = mt::kPixelFormat_BGRA_4444_8u;
     const std::tuple<const char*, mt::PixelFormat, std::array<std::uint8_t, 4>> cases[] = {
         {"4280303712", bgra, {0x60, 0x40, 0x20, 0xFF}}, // 0xFF204060, B G R A in memory
         {nullptr, bgra, {0xFF, 0xFF, 0xFF, 0xFF}},      // absent: opaque white
-        {"red", bgra, {0, 0, 0, 0}},                    // unreadable: all zero
-        {"4281558681", mt::kPixelFormat_VUYA_4444_8u, {yuv[0], yuv[1], yuv[2], yuv[3]}}};
+        {"red", bgra, {0, 0, 0, 0}}};                   // unreadable: all zero
     for (const auto& [text, format, pixel] : cases)
     {
         SCOPED_TRACE(text ? text : "absent");
@@ -90,6 +87,136 @@ TEST_F(SolidColorNodeTest, ProducerFillsEveryPixelWithTheColourTheDefaultOrZero)
         EXPECT_EQ(mismatches, 0);
     }
 }
+
+// Every format a render can ask for (the raster formats of the catalogue) at
+// two heights (below 720 rows Y'CbCr uses BT.601, from 720 on BT.709).
+class SolidColorFillTest
+    : public ::testing::TestWithParam<std::tuple<mt::PixelFormat, std::uint32_t>>
+{
+public:
+    static std::vector<mt::PixelFormat> RenderableFormats()
+    {
+        std::vector<mt::PixelFormat> formats;
+        for (const mt::PixelFormat format : mt::GetPixelFormatCatalogue())
+            if (format.IsRaster())
+                formats.push_back(format);
+        return formats;
+    }
+};
+
+enum class Sample
+{
+    k8u,
+    k16u,
+    k16f,
+    k32f,
+};
+
+// One stored group of four samples (a pixel, or a YUYV pixel pair) that a fill
+// of kColor must leave in memory, as values 0..1 (Cb and Cr of float Y'CbCr
+// -0.5..0.5), and how far a sample may be off: one code of 8- and 16-bit
+// samples, half a unit in the last place of half floats near 1, and float
+// rounding (more for the sRGB curve) of floats.
+struct ExpectedGroup
+{
+    Sample mSample = Sample::k8u;
+    std::array<double, 4> mValues{};
+    double mTolerance = 0;
+};
+
+constexpr std::uint32_t kColor = 0xC0336699u; // A 0xC0, R 0x33, G 0x66, B 0x99
+
+ExpectedGroup ExpectedFill(mt::PixelFormat inFormat, std::uint32_t inHeight)
+{
+    const double b = 0x99 / 255.0, g = 0x66 / 255.0, r = 0x33 / 255.0, a = 0xC0 / 255.0;
+    const double kr = inHeight < 720 ? 0.299 : 0.2126, kb = inHeight < 720 ? 0.114 : 0.0722;
+    const double y = kr * r + (1 - kr - kb) * g + kb * b;
+    const double cb = (b - y) / (2 * (1 - kb)), cr = (r - y) / (2 * (1 - kr));
+    const double codeY = (16 + 219 * y) / 255, codeU = (128 + 224 * cb) / 255;
+    const double codeV = (128 + 224 * cr) / 255, code = 1.0 / 255;
+    const auto linear = [a](double inC)
+    { return a * (inC <= 0.04045 ? inC / 12.92 : std::pow((inC + 0.055) / 1.055, 2.4)); };
+    if (inFormat == mt::kPixelFormat_BGRA_4444_8u)
+        return {Sample::k8u, {b, g, r, a}, code};
+    if (inFormat == mt::kPixelFormat_BGRA_4444_16u)
+        return {Sample::k16u, {b, g, r, a}, 1.0 / 65535};
+    if (inFormat == mt::kPixelFormat_BGRA_4444_16f)
+        return {Sample::k16f, {b, g, r, a}, 1.0 / 2048};
+    if (inFormat == mt::kPixelFormat_BGRA_4444_32f)
+        return {Sample::k32f, {b, g, r, a}, 1e-6};
+    if (inFormat == mt::kPixelFormat_BGRP_4444_32f_Linear)
+        return {Sample::k32f, {linear(b), linear(g), linear(r), a}, 1e-4};
+    if (inFormat == mt::kPixelFormat_VUYA_4444_8u)
+        return {Sample::k8u, {codeV, codeU, codeY, a}, code};
+    if (inFormat == mt::kPixelFormat_VUYA_4444_32f)
+        return {Sample::k32f, {cr, cb, y, a}, 1e-5};
+    // The 4:2:2 formats: Y0 U Y1 V, alpha dropped.
+    if (inFormat.IsYUV() && inFormat.GetChroma() != mt::kPixelChroma_444 && !inFormat.IsFloat())
+        return {Sample::k8u, {codeY, codeU, codeY, codeV}, code};
+    ADD_FAILURE() << "no expectation for " << mt::GetPixelFormatName(inFormat);
+    return {};
+}
+
+double ReadSample(const std::uint8_t* inBytes, Sample inSample)
+{
+    std::uint16_t word = 0;
+    std::memcpy(&word, inBytes, 2);
+    float value = 0;
+    switch (inSample)
+    {
+    case Sample::k8u:
+        return inBytes[0] / 255.0;
+    case Sample::k16u:
+        return word / 65535.0;
+    case Sample::k16f:
+        // Normal halves only (the fill's values lie in 2^-14..1).
+        return std::ldexp(1.0 + (word & 0x3FF) / 1024.0, ((word >> 10) & 0x1F) - 15) *
+               ((word & 0x8000) ? -1 : 1);
+    case Sample::k32f:
+        std::memcpy(&value, inBytes, 4);
+        return value;
+    }
+    return -1;
+}
+
+TEST_P(SolidColorFillTest, EveryStoredSampleHoldsTheColourInTheRequestedFormat)
+{
+    const auto [format, height] = GetParam();
+    constexpr std::uint32_t kWidth = 6;
+    const ML::CutlistRenderParams params = Params(kWidth, height, format);
+    FrameRef frame;
+    ASSERT_EQ(ProducerOf(ML::CreateSolidColorNode(kColor), params)->ProduceFrame({}, params, frame),
+              QRT::kResult_Success);
+    ASSERT_TRUE(frame);
+    EXPECT_EQ(frame->GetPixelFormat(), format);
+    EXPECT_EQ(frame->GetBounds(), QRT::ParamRect(0, 0, kWidth, height));
+    const ExpectedGroup want = ExpectedFill(format, height);
+    const int sampleBytes = want.mSample == Sample::k8u ? 1 : want.mSample == Sample::k32f ? 4 : 2;
+    // A YUYV group holds two pixels; a pixel-pair format's width counts groups.
+    const std::uint32_t groups = format.GetChroma() == mt::kPixelChroma_422 ? kWidth / 2 : kWidth;
+    const auto* base = static_cast<const std::uint8_t*>(frame->GetBaseAddress());
+    int wrong = 0;
+    for (std::uint32_t row = 0; row < height; ++row)
+        for (std::uint32_t i = 0; i < groups * 4; ++i)
+        {
+            const double got =
+                ReadSample(base + row * frame->GetRowBytes() + i * sampleBytes, want.mSample);
+            if (std::abs(got - want.mValues[i % 4]) > want.mTolerance && wrong++ == 0)
+                ADD_FAILURE() << "row " << row << " sample " << i << " is " << got << ", expected "
+                              << want.mValues[i % 4];
+        }
+    EXPECT_EQ(wrong, 0);
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    RenderableFormats, SolidColorFillTest,
+    ::testing::Combine(::testing::ValuesIn(SolidColorFillTest::RenderableFormats()),
+                       ::testing::Values(5u, 720u)),
+    [](const auto& inInfo)
+    {
+        return std::string(mt::GetPixelFormatName(std::get<0>(inInfo.param))) + "_" +
+               std::to_string(std::get<1>(inInfo.param));
+    });
 
 TEST_F(SolidColorNodeTest, FrameHashIsColourFormatSizeAndAspectButNotTime)
 {
