@@ -533,6 +533,37 @@ QRT::Result VideoFrameManipulators::InvertAlpha(const FrameRef& ioFrame)
     return ChangeAlpha(ioFrame, AlphaChange::kInvert);
 }
 
+QRT::Result VideoFrameManipulators::FillWithColor(const FrameRef& ioFrame, uint32_t inColor)
+{
+    MVX_INPUT_CONTRACT(ioFrame != nullptr);
+    MVX_INPUT_CONTRACT(!ioFrame->IsShared());
+    const QRT::ParamRect bounds = ioFrame->GetBounds();
+    const detail::StagingPlan plan =
+        detail::GetStagingPlan(ioFrame->GetPixelFormat(), bounds.Width(), bounds.Height());
+    QRT::Result status = QRT::kResult_Success;
+    if (plan.mKind == detail::StagingKind::kFieldsApart && ioFrame->GetPlaneCount() == 1)
+    {
+        // Every row gets the same pixels, so the order in which the fields
+        // are stored does not matter: the rows are filled as one raster.
+        status = IR_FillWithColor(ioFrame->GetWritableBaseAddress(), ioFrame->GetRowBytes(),
+                                  plan.mFormat, plan.mWidth, plan.mHeight, inColor, 0);
+    }
+    else
+    {
+        StagedImage image;
+        status = image.OpenForWriting(*ioFrame, false);
+        if (QRT::Failed(status))
+            return status;
+        status = IR_FillWithColor(image.GetWritableBase(), image.GetRowBytes(), image.GetFormat(),
+                                  image.GetWidth(), image.GetHeight(), inColor, 0);
+        if (QRT::Succeeded(status))
+            image.Commit();
+    }
+    if (QRT::Succeeded(status))
+        ioFrame->AlphaChanged();
+    return status;
+}
+
 FrameRef VideoFrameManipulators::MakeAddressableVideoFrame(const FrameRef& inFrame,
                                                            mt::PixelFormat inFormat,
                                                            mt::RenderQuality inQuality)

@@ -119,6 +119,47 @@ TEST_F(FieldFiltersTest, DeinterlaceStepTakesOneFieldOfATallFieldByFieldFrame)
     }
 }
 
+// Through the filter, an upstream frame two or four times the requested
+// height gives a frame of the requested size whose rows are the kept field's
+// own rows (at four times every other one, from quality 3 on the mean of two);
+// a wider one is narrowed to the requested width. Other heights are still
+// deinterlaced at the upstream frame's size.
+TEST_F(FieldFiltersTest, DeinterlaceTakesTheFieldOfATallUpstreamFrameAtTheRequestedSize)
+{
+    const struct
+    {
+        Delivery mDelivery;
+        std::uint32_t mWidths, mHeights, mQuality;
+    } cases[] = {{Delivery::kUpperFirst, 1, 2, 4},
+                 {Delivery::kLowerFirst, 2, 2, 1},
+                 {Delivery::kUpperFirst, 1, 4, 2},
+                 {Delivery::kLowerFirst, 1, 4, 3}};
+    for (const auto& c : cases)
+    {
+        SCOPED_TRACE(testing::Message()
+                     << int(c.mDelivery) << c.mWidths << c.mHeights << c.mQuality);
+        auto upstream =
+            MakeMarkedSource(c.mDelivery, c.mWidths * kWidth, c.mHeights * kHeight, true);
+        const FrameRef frame = Render(*DeinterlaceSource(upstream), MF::FrameTime(mT),
+                                      MakeParams(kWidth, kHeight, c.mQuality));
+        ASSERT_TRUE(frame);
+        EXPECT_EQ(frame->GetBounds(), QRT::ParamRect(0, 0, kWidth, kHeight));
+        EXPECT_EQ(frame->GetFieldType(), kProg);
+        const std::int32_t kept = c.mDelivery == Delivery::kUpperFirst ? 1 : 2;
+        const bool mean = c.mHeights == 4 && c.mQuality >= 3;
+        const auto expected = [&](std::int32_t, std::int32_t inY)
+        {
+            const auto row = static_cast<std::int32_t>(c.mHeights) * inY + kept - 1;
+            return GradientMarker(mT, kept, mean ? row + 1 : row);
+        };
+        EXPECT_TRUE(PixelsAre(frame, expected));
+    }
+    auto taller = MakeMarkedSource(Delivery::kUpperFirst, kWidth, 3 * kHeight, true);
+    const FrameRef frame = Render(*DeinterlaceSource(taller), MF::FrameTime(mT), mParams);
+    ASSERT_TRUE(frame);
+    EXPECT_EQ(frame->GetBounds(), QRT::ParamRect(0, 0, kWidth, 3 * kHeight));
+}
+
 TEST_F(FieldFiltersTest, FieldReverseSwapsTheFieldsOfTheFrameAtTheSwappedTime)
 {
     auto upper = MakeMarkedSource(Delivery::kUpperFirst);

@@ -2,13 +2,12 @@
 
 #include "graph/RenderableNodeSolidColorImpl.h"
 
-#include "IR/ImageRenderer.h"
 #include "ML/RenderableNodes.h"
 #include "ML/RenderablePropertyValue.h"
 #include "QRT/Allocated.h"
 #include "QRT/Hash.h"
-#include "VF/PixelFormatConversions.h"
 #include "VF/VideoFrame.h"
+#include "VF/VideoFrameManipulators.h"
 #include "mvxmediatypes/PixelFormat.h"
 
 #include <string_view>
@@ -22,8 +21,6 @@ namespace
 constexpr std::uint32_t kDefaultSolidColor = 0xFFFFFFFFu;
 // Transparent black: the colour of a node whose colour text cannot be read.
 constexpr std::uint32_t kUnreadableSolidColor = 0;
-// Quality handed to the fill (it has no effect on a fill).
-constexpr std::int32_t kFillQuality = 4;
 
 constexpr std::string_view kFrameHashText = "RenderableNodeSolidColorImpl FrameHash";
 
@@ -32,16 +29,6 @@ const QRT::ImmutableString& ColorKey()
     static const QRT::ImmutableString sKey =
         QRT::ImmutableString::CreateStatic(kSolidColorNodeColorKey);
     return sKey;
-}
-
-// The image-renderer format that fills frames of inFormat (invalid when the
-// fill cannot write it). A format whose fields are stored apart has ordinary
-// rows, and every row receives the same pixels, so it is filled as one raster.
-IR_PixelFormat FillFormatFor(mvxmediatypes::PixelFormat inFormat)
-{
-    if (inFormat == mvxmediatypes::kPixelFormat_YUYV_422_8u_Fields)
-        inFormat = mvxmediatypes::kPixelFormat_YUYV_422_8u;
-    return VF::BEPixelFormatToIRPixelFormat(inFormat);
 }
 
 // Renders one request of a solid-colour node. Made per request by the node,
@@ -69,14 +56,11 @@ public:
                                  inParams.mPixelAspectRatio, false, false);
         if (!frame)
             return QRT::kResult_NotFound;
-        const IR_PixelFormat fillFormat = FillFormatFor(inParams.mPixelFormat);
-        if (!IR_IsValidPixelFormat(fillFormat))
-            return kIR_UnsupportedFormat;
-        const std::int32_t status =
-            IR_FillWithColor(frame->GetWritableBaseAddress(), frame->GetRowBytes(), fillFormat,
-                             static_cast<std::int32_t>(inParams.mWidth),
-                             static_cast<std::int32_t>(inParams.mHeight), mColor, kFillQuality);
-        if (status < 0)
+        // Every raster format: the ones the image renderer writes are filled
+        // in place, the others (16-bit and half-float RGB, float Y'CbCr)
+        // through a staging copy converted into the frame.
+        const QRT::Result status = VF::VideoFrameManipulators::FillWithColor(frame, mColor);
+        if (QRT::Failed(status))
             return status;
         outFrame = std::move(frame);
         return QRT::kResult_Success;

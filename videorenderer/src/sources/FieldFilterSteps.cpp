@@ -213,44 +213,52 @@ FrameRef MakeAddressableCopy(const FrameRef& inFrame, const CutlistRenderParams&
     return copy;
 }
 
+bool IsWholeFieldMultiple(const MF::IVideoFrame& inFrame, const CutlistRenderParams& inParams)
+{
+    const std::int64_t height = inFrame.GetBounds().Height();
+    const std::int64_t requested = inParams.mHeight;
+    return requested > 0 && (height == 2 * requested || height == 4 * requested);
+}
+
+FrameRef TakeFieldDirectly(const FrameRef& inFrame, const CutlistRenderParams& inParams,
+                           bool inKeepSecond)
+{
+    MVX_INPUT_CONTRACT(inFrame != nullptr);
+    MVX_INPUT_CONTRACT(IsWholeFieldMultiple(*inFrame, inParams));
+    const RenderQuality quality = QualityOf(inParams.mQuality);
+    // The kept field goes straight into a frame of the requested height (at
+    // the source's width; a differing width or format is converted afterwards).
+    const FrameRef source = ToStaging(inFrame, quality);
+    const VF::IRFrameBuffer in = VF::GetIRFrameBuffer(*source);
+    FrameRef extracted;
+    ThrowIfFailed(VF::CreateVideoFrame(source->GetPixelFormat(),
+                                       static_cast<std::uint32_t>(in.mWidth), inParams.mHeight,
+                                       inParams.mPixelAspectRatio, false, false, extracted));
+    const VF::IRWritableFrameBuffer out = VF::GetWritableIRFrameBuffer(*extracted);
+    const bool keepSecondRows =
+        inKeepSecond != (IR_IsOriginBottomLeft(in.mFormat) && in.mHeight % 2 == 0);
+    ThrowIfFailed(IR_DeinterlaceCopy(in.mBase, in.mRowBytes, in.mHeight, out.mBase, out.mRowBytes,
+                                     out.mHeight, in.mFormat, in.mWidth, keepSecondRows,
+                                     static_cast<std::int32_t>(quality)));
+    FrameRef result = extracted;
+    if ((inParams.mPixelFormat.IsValid() && extracted->GetPixelFormat() != inParams.mPixelFormat) ||
+        extracted->GetBounds().Width() != static_cast<std::int32_t>(inParams.mWidth))
+    {
+        result = CreateFrameForParams(inParams, inFrame);
+        ThrowIfFailed(VF::VideoFrameManipulators::CopyFrame(extracted, result, quality));
+    }
+    result->SetFieldType(mvxmediatypes::kFieldType_Progressive);
+    return result;
+}
+
 FrameRef DeinterlaceKeepingField(const FrameRef& inFrame, const CutlistRenderParams& inParams,
                                  bool inKeepSecond)
 {
     MVX_INPUT_CONTRACT(inFrame != nullptr);
     const RenderQuality quality = QualityOf(inParams.mQuality);
     const PixelFormat format = inFrame->GetPixelFormat();
-    const QRT::ParamRect bounds = inFrame->GetBounds();
-    const auto requestedHeight = static_cast<std::int32_t>(inParams.mHeight);
-
-    const bool wholeMultiple = requestedHeight > 0 && (bounds.Height() == 2 * requestedHeight ||
-                                                       bounds.Height() == 4 * requestedHeight);
-    if (wholeMultiple && format.IsFieldByField())
-    {
-        // The kept field goes straight into a frame of the requested height
-        // (at the source's width; a differing width is scaled afterwards).
-        const FrameRef source = ToStaging(inFrame, quality);
-        const VF::IRFrameBuffer in = VF::GetIRFrameBuffer(*source);
-        FrameRef extracted;
-        ThrowIfFailed(VF::CreateVideoFrame(source->GetPixelFormat(),
-                                           static_cast<std::uint32_t>(in.mWidth), inParams.mHeight,
-                                           inParams.mPixelAspectRatio, false, false, extracted));
-        const VF::IRWritableFrameBuffer out = VF::GetWritableIRFrameBuffer(*extracted);
-        const bool keepSecondRows =
-            inKeepSecond != (IR_IsOriginBottomLeft(in.mFormat) && in.mHeight % 2 == 0);
-        ThrowIfFailed(IR_DeinterlaceCopy(in.mBase, in.mRowBytes, in.mHeight, out.mBase,
-                                         out.mRowBytes, out.mHeight, in.mFormat, in.mWidth,
-                                         keepSecondRows, static_cast<std::int32_t>(quality)));
-        FrameRef result = extracted;
-        if ((inParams.mPixelFormat.IsValid() &&
-             extracted->GetPixelFormat() != inParams.mPixelFormat) ||
-            extracted->GetBounds().Width() != static_cast<std::int32_t>(inParams.mWidth))
-        {
-            result = CreateFrameForParams(inParams, inFrame);
-            ThrowIfFailed(VF::VideoFrameManipulators::CopyFrame(extracted, result, quality));
-        }
-        result->SetFieldType(mvxmediatypes::kFieldType_Progressive);
-        return result;
-    }
+    if (format.IsFieldByField() && IsWholeFieldMultiple(*inFrame, inParams))
+        return TakeFieldDirectly(inFrame, inParams, inKeepSecond);
 
     FrameRef work;
     if (format.IsFieldByField())

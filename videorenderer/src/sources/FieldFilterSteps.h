@@ -55,10 +55,24 @@ FrameRef CreateFrameForParams(const CutlistRenderParams& inParams, const FrameRe
 // VF::MakeWriteableVideoFrame before writing.
 FrameRef MakeAddressableCopy(const FrameRef& inFrame, const CutlistRenderParams& inParams);
 
+// True when inFrame is exactly two or four times the requested height, so
+// that one of its fields (every row of it, or every other one) is a frame of
+// the requested height.
+bool IsWholeFieldMultiple(const MF::IVideoFrame& inFrame, const CutlistRenderParams& inParams);
+
+// A progressive frame at the requested size, pixel aspect ratio and format
+// made from one field of inFrame (its second, rows 1, 3, 5, ..., when
+// inKeepSecond) without rebuilding the other: the field's rows are read
+// directly (at four times the height every other field row, or from quality
+// 3 on the mean of two), then converted to the requested format and width
+// when they differ. Input contract: IsWholeFieldMultiple.
+FrameRef TakeFieldDirectly(const FrameRef& inFrame, const CutlistRenderParams& inParams,
+                           bool inKeepSecond);
+
 // A progressive frame made from one field of inFrame (its second field, rows
 // 1, 3, 5, ..., when inKeepSecond). A frame two or four times the requested
-// height in a field-by-field format takes the kept field directly into a
-// frame of the requested size; any other frame is deinterlaced in place on a
+// height in a field-by-field format takes the kept field directly
+// (TakeFieldDirectly); any other frame is deinterlaced in place on a
 // writeable copy (the other field rebuilt from the kept one).
 FrameRef DeinterlaceKeepingField(const FrameRef& inFrame, const CutlistRenderParams& inParams,
                                  bool inKeepSecond);

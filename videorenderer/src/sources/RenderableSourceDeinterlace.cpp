@@ -13,7 +13,8 @@ using namespace FieldFilterSteps;
 
 // RenderableSourceDeinterlace: delivers progressive frames made from the one
 // field of each upstream frame that lies at the requested time; a frame
-// upstream already delivers progressive passes unchanged. Owned by whoever
+// upstream already delivers progressive passes unchanged, and a frame two or
+// four times the requested height gives its field at the requested size. Owned by whoever
 // holds its reference (a media chain); immutable, called from render and
 // prefetch threads at once.
 class RenderableSourceDeinterlace : public FilterSourceBase
@@ -42,6 +43,12 @@ private:
         // The field to keep is the one upstream delivered at the requested
         // second time; the other one belongs to another instant.
         const bool keepSecond = inUpstreamTime.GetSecondFieldTime() == inTime.GetSecondFieldTime();
+        // A frame two or four times the requested height holds the requested
+        // frame in each of its fields: the kept field is taken directly into a
+        // frame of the requested size, with no field to rebuild.
+        if (IsWholeFieldMultiple(*inFrame, inParams))
+            return TakeFieldDirectly(inFrame, inParams, keepSecond);
+        // Any other size is deinterlaced at the upstream frame's own size.
         CutlistRenderParams params = inParams;
         const QRT::ParamRect bounds = inFrame->GetBounds();
         params.mWidth = static_cast<std::uint32_t>(bounds.Width());

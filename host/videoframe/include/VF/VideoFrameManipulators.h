@@ -2,7 +2,7 @@
 
 // VF::VideoFrameManipulators: whole-frame pixel operations of the renderer:
 // format conversion with scaling, field-correct scaling, rectangle copies,
-// field exchange, the vertical flicker filter, pulldown field merging, and the
+// colour fills, field exchange, the vertical flicker filter, pulldown field merging, and the
 // alpha fixes made when a stream's alpha is to be ignored or inverted.
 //
 // Conventions of the whole family:
@@ -119,6 +119,14 @@ public:
     // premultiplied colour is re-associated with the new alpha, and colour
     // under alpha 0 becomes 0). Formats without alpha are left alone.
     static QRT::Result InvertAlpha(const FrameRef& ioFrame);
+
+    // Fills the whole frame with the colour 0xAARRGGBB (straight alpha,
+    // gamma-encoded 8-bit components), converted to the frame's format as
+    // IR_FillWithColor converts it: premultiplied, linearised or Y'CbCr as the
+    // format asks. Formats the image renderer fills directly are written in
+    // place; every other raster format is filled in a staging copy and
+    // converted into the frame. Input contracts: frame given and not shared.
+    static QRT::Result FillWithColor(const FrameRef& ioFrame, uint32_t inColor);
 
     // A frame whose pixels can be addressed directly in inFormat: the frame
     // itself when it offers the base-address interface (MF::IVideoFrameBaseAddress)
