@@ -66,13 +66,13 @@ public:
         FindEarlierFrames();
         if (mEarlier.empty() || mOverwrite)
             return true;
-        outError =
-            Quoted(mEarlier.begin()->second) +
-            (mEarlier.size() > 1 ? " and " + std::to_string(mEarlier.size() - 1) + " more files"
-                                 : std::string()) +
-            " of " + mPattern +
-            " exist from an earlier render; give --overwrite to replace them (the "
-            "earlier frames outside the new range are then removed)";
+        const std::string first = Quoted(mEarlier.begin()->second);
+        outError = (mEarlier.size() == 1
+                        ? first + ", a frame of " + mPattern + " from an earlier render, exists"
+                        : first + " and " + std::to_string(mEarlier.size() - 1) +
+                              " more frames of " + mPattern + " from an earlier render exist") +
+                   "; give --overwrite to replace them (the earlier frames outside the new "
+                   "range are then removed)";
         return false;
     }
 
