@@ -446,7 +446,7 @@ bool PlanRender(const RenderOptions& inOptions, const SourceFacts& inSource, uns
     else if (length)
         plan.mCount = *length - plan.mFirst;
     else
-        plan.mCount = inSource.mIsStill && !inOptions.mStart ? 1 : kDefaultEndlessFrameCount;
+        plan.mCount = inSource.mIsStill ? 1 : kDefaultEndlessFrameCount;
     if (length)
     {
         const std::string range = *length == 0   ? std::string("no frames")

@@ -48,6 +48,10 @@ TEST_F(CommandLineRunTest, PatternsKeepTheirRateAndStillOnesRenderOneFrame)
         EXPECT_EQ(run.mOut.substr(0, header.size()), header);
         EXPECT_EQ(run.mOut.size(), run.mOut.find('\n') + 1 + frames * frameBytes);
     }
+    // A start frame alone does not make a still longer.
+    const vrendertest::RunResult later =
+        Run({"source", "pattern:solid?size=8x8", "--start", "5", "--y4m"});
+    EXPECT_EQ(later.mOut.size(), later.mOut.find('\n') + 1 + frameBytes) << later.mErr;
 }
 
 TEST_F(CommandLineRunTest, PngDepthAndChannelsFollowTheFormatAndAlpha)
