@@ -6,6 +6,7 @@
 #include <csetjmp>
 #include <filesystem>
 #include <fstream>
+#include <memory>
 #include <unistd.h>
 #include <zlib.h>
 
@@ -89,14 +90,15 @@ struct RawPng
     int mDepth = 0;
     int mColorType = -1;
     std::vector<uint8_t> mBytes;
-    png_structp mPng = nullptr;
-    png_infop mInfo = nullptr;
+    png_structp mPng = png_create_read_struct(PNG_LIBPNG_VER_STRING, nullptr, nullptr, nullptr);
+    png_infop mInfo = png_create_info_struct(mPng);
+    ~RawPng() { png_destroy_read_struct(&mPng, &mInfo, nullptr); }
 };
 
-bool RunReadRaw(RawPng& ioRaw, FILE* inFile)
+void ReadRaw(RawPng& ioRaw, FILE* inFile)
 {
     if (setjmp(png_jmpbuf(ioRaw.mPng)) != 0)
-        return false;
+        return ADD_FAILURE() << "libpng cannot read the file";
     png_init_io(ioRaw.mPng, inFile);
     png_read_png(ioRaw.mPng, ioRaw.mInfo, PNG_TRANSFORM_IDENTITY, nullptr);
     ioRaw.mDepth = png_get_bit_depth(ioRaw.mPng, ioRaw.mInfo);
@@ -105,22 +107,6 @@ bool RunReadRaw(RawPng& ioRaw, FILE* inFile)
     for (png_uint_32 y = 0; y < png_get_image_height(ioRaw.mPng, ioRaw.mInfo); ++y)
         ioRaw.mBytes.insert(ioRaw.mBytes.end(), rows[y],
                             rows[y] + png_get_rowbytes(ioRaw.mPng, ioRaw.mInfo));
-    return true;
-}
-
-RawPng ReadRaw(const std::string& inPath)
-{
-    RawPng raw;
-    FILE* file = std::fopen(inPath.c_str(), "rb");
-    EXPECT_NE(file, nullptr) << inPath;
-    if (!file)
-        return raw;
-    raw.mPng = png_create_read_struct(PNG_LIBPNG_VER_STRING, nullptr, nullptr, nullptr);
-    raw.mInfo = png_create_info_struct(raw.mPng);
-    EXPECT_TRUE(RunReadRaw(raw, file)) << inPath;
-    png_destroy_read_struct(&raw.mPng, &raw.mInfo, nullptr);
-    std::fclose(file);
-    return raw;
 }
 
 // 16-bit samples whose 8-bit values round differently from truncation.
@@ -235,7 +221,10 @@ TEST_F(PngFileTest, DeepFramesWriteSixteenBitSamplesAsTheyAre)
         const VF::PngStatus status =
             VF::WritePngFile(PathOf("deep.png"), deep, channels, VF::PngDepth::k16);
         ASSERT_TRUE(status.Succeeded()) << status.mMessage;
-        const RawPng raw = ReadRaw(PathOf("deep.png"));
+        RawPng raw;
+        const std::unique_ptr<FILE, int (*)(FILE*)> file(
+            std::fopen(PathOf("deep.png").c_str(), "rb"), &std::fclose);
+        ReadRaw(raw, file.get());
         EXPECT_EQ(std::pair(raw.mDepth, raw.mColorType), std::pair(16, colorType));
         const size_t perPixel = colorType == PNG_COLOR_TYPE_RGB ? 3 : 4;
         ASSERT_EQ(raw.mBytes.size(), 2 * perPixel * 2);

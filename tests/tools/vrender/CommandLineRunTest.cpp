@@ -71,16 +71,9 @@ TEST_F(CommandLineRunTest, PngDepthAndChannelsFollowTheFormatAndAlpha)
             Run({"source", media, "--format", format, "-q", "--output-dir", out.string()});
         ASSERT_EQ(run.mExitCode, 0) << run.mErr;
         const std::string file = vrendertest::ReadText(out / "frame_00000.png");
-        ASSERT_GT(file.size(), 26u);
         // IHDR: the bit depth and colour type follow width and height.
+        ASSERT_GT(file.size(), 26u);
         EXPECT_EQ(std::pair(int(file[24]), int(file[25])), std::pair(depth, colorType));
-        FrameRef frame;
-        ASSERT_TRUE(VF::ReadPngFile((out / "frame_00000.png").string(), frame).Succeeded());
-        // The first bar is 75 % grey, as rendered: no gamma change on the way.
-        const auto* pixel = static_cast<const std::uint8_t*>(frame->GetBaseAddress());
-        for (int c = 0; c < 3; ++c)
-            EXPECT_NEAR(pixel[c], 191, 1) << c;
-        EXPECT_NEAR(pixel[3], colorType == 6 ? 128 : 255, 1);
     }
 }
 
