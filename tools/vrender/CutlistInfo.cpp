@@ -5,6 +5,7 @@
 #include "ML/RenderableNodes.h"
 #include "QRT/ImmutableString.h"
 
+#include <charconv>
 #include <cinttypes>
 #include <set>
 
@@ -18,6 +19,18 @@ namespace mt = mvxmediatypes;
 std::string Indent(int inDepth)
 {
     return std::string(static_cast<std::size_t>(2 * inDepth), ' ');
+}
+
+// A property's printed value: colours (keys ending in "Color", stored as
+// the decimal of a 32-bit ARGB word) as 0xAARRGGBB, anything else quoted.
+std::string PropertyText(std::string_view inKey, const std::string& inValue)
+{
+    std::uint32_t color = 0;
+    const char* end = inValue.data() + inValue.size();
+    const auto [ptr, error] = std::from_chars(inValue.data(), end, color);
+    if (inKey.ends_with("Color") && !inValue.empty() && error == std::errc() && ptr == end)
+        return FormatColor(color);
+    return "\"" + inValue + "\"";
 }
 
 void DescribeNode(const QRT::InterfaceRef<MF::IRenderableNode>& inNode, int inDepth,
@@ -41,7 +54,8 @@ void DescribeNode(const QRT::InterfaceRef<MF::IRenderableNode>& inNode, int inDe
     {
         ioText += pad + "  properties:\n";
         for (const auto& [key, value] : properties)
-            ioText += pad + "    " + std::string(key.ToStringView()) + " = \"" + value + "\"\n";
+            ioText += pad + "    " + std::string(key.ToStringView()) + " = " +
+                      PropertyText(key.ToStringView(), value) + "\n";
     }
 
     const std::uint32_t inputs = inNode->GetInputCount();
@@ -131,6 +145,13 @@ std::string FormatTime(mt::TickTime inTime)
         return "invalid";
     char text[48];
     std::snprintf(text, sizeof(text), "%.3f s", inTime.ToSeconds());
+    return text;
+}
+
+std::string FormatColor(std::uint32_t inColor)
+{
+    char text[16];
+    std::snprintf(text, sizeof(text), "0x%08" PRIX32, inColor);
     return text;
 }
 

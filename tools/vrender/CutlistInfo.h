@@ -6,8 +6,8 @@
 // (MF::IRenderableCutlist, MF::IRenderableNode) and answers the text: its
 // name and hash, one line per segment (times, offset, node hash), then each
 // distinct node tree once, every node with its type, render flags,
-// properties, inputs and operators, children indented under their parent.
-// Sealed cutlists are immutable, so any thread may call it.
+// properties (colours as 0xAARRGGBB, other values quoted), inputs and operators, children indented
+// under their parent. Sealed cutlists are immutable, so any thread may call it.
 
 #include "MF/RenderableCutlist.h"
 #include "QRT/InterfaceRef.h"
@@ -28,6 +28,9 @@ std::string DescribeCutlist(const MF::IRenderableCutlist& inCutlist);
 
 // "1.500 s"; "start" and "end" for kTime_Min and kTime_Max.
 std::string FormatTime(mvxmediatypes::TickTime inTime);
+
+// "0xFFFF3366": a 32-bit ARGB colour, alpha in the top byte (opaque pink).
+std::string FormatColor(std::uint32_t inColor);
 
 // "0x00000059 (Opaque, TimeInvariant, 16, NoLayerInputs)": the value, then
 // the set bits, by name where they have one, else by value.

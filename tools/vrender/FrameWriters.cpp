@@ -10,6 +10,7 @@
 #include <cmath>
 #include <cstring>
 #include <filesystem>
+#include <map>
 #include <numeric>
 #include <system_error>
 
@@ -41,19 +42,38 @@ std::string MakeParentDirectory(const std::string& inPath)
     return {};
 }
 
+std::string Quoted(const std::string& inText)
+{
+    return "'" + inText + "'";
+}
+
 class PngSequenceWriter final : public FrameWriter
 {
 public:
-    explicit PngSequenceWriter(std::string inPattern)
+    PngSequenceWriter(std::string inPattern, bool inOverwrite)
         : mPattern(std::move(inPattern))
+        , mOverwrite(inOverwrite)
     {
     }
 
-    bool Begin(const StreamInfo&, std::string& outError) override
+    bool Begin(const StreamInfo& inInfo, std::string& outError) override
     {
+        mInfo = inInfo;
         // Fails early, before any render, when the first directory cannot be made.
-        outError = MakeParentDirectory(FormatFramePath(mPattern, 0));
-        return outError.empty();
+        outError = MakeParentDirectory(FormatFramePath(mPattern, inInfo.mFirstFrame));
+        if (!outError.empty())
+            return false;
+        FindEarlierFrames();
+        if (mEarlier.empty() || mOverwrite)
+            return true;
+        const std::string first = Quoted(mEarlier.begin()->second);
+        outError = (mEarlier.size() == 1
+                        ? first + ", a frame of " + mPattern + " from an earlier render, exists"
+                        : first + " and " + std::to_string(mEarlier.size() - 1) +
+                              " more frames of " + mPattern + " from an earlier render exist") +
+                   "; give --overwrite to replace them (the earlier frames outside the new "
+                   "range are then removed)";
+        return false;
     }
 
     EncodedFrame Encode(std::int64_t inIndex, const FrameRef& inFrame) override
@@ -70,7 +90,8 @@ public:
         const bool keepAlpha = inFrame->HasAlpha() && !inFrame->IsAlphaOpaque();
         const VF::PngStatus status =
             VF::WritePngFile(encoded.mTemporaryPath, inFrame,
-                             keepAlpha ? VF::PngChannels::kRGBA : VF::PngChannels::kRGB);
+                             keepAlpha ? VF::PngChannels::kRGBA : VF::PngChannels::kRGB,
+                             VF::GetPngDepthFor(inFrame->GetPixelFormat()));
         if (!status.Succeeded())
         {
             encoded.mError = status.mMessage;
@@ -102,21 +123,80 @@ public:
         ioFrame.mTemporaryPath.clear();
     }
 
-    bool Finish(std::string&) override { return true; }
+    // Every frame of the range is written: the earlier frames outside it go.
+    bool Finish(std::string& outError) override
+    {
+        for (const auto& [frame, path] : mEarlier)
+        {
+            if (InRange(frame))
+                continue;
+            std::error_code error;
+            std::filesystem::remove(path, error);
+            if (error)
+            {
+                outError =
+                    "cannot remove the earlier frame " + Quoted(path) + ": " + error.message();
+                return false;
+            }
+        }
+        return true;
+    }
 
     std::string Describe() const override { return mPattern; }
 
 private:
+    bool InRange(std::int64_t inFrame) const
+    {
+        return inFrame >= mInfo.mFirstFrame && inFrame - mInfo.mFirstFrame < mInfo.mFrameCount;
+    }
+
+    // The existing files of the pattern, by frame number: every match in the
+    // folder when the number is in the file name, else those of the range.
+    void FindEarlierFrames()
+    {
+        mEarlier.clear();
+        const std::size_t slash = mPattern.rfind('/');
+        const std::string name = slash == std::string::npos ? mPattern : mPattern.substr(slash + 1);
+        if (CheckFramePattern(name).empty())
+        {
+            const std::filesystem::path directory =
+                std::filesystem::path(FormatFramePath(mPattern, 0)).parent_path();
+            std::error_code error;
+            for (std::filesystem::directory_iterator
+                     entry(directory.empty() ? std::filesystem::path(".") : directory, error),
+                 last;
+                 !error && entry != last; entry.increment(error))
+            {
+                const std::string file = entry->path().filename().string();
+                if (const std::optional<std::int64_t> frame = MatchFramePath(name, file))
+                    mEarlier.emplace(*frame, FormatFramePath(mPattern, *frame));
+            }
+            return;
+        }
+        for (std::int64_t frame = mInfo.mFirstFrame; InRange(frame); ++frame)
+        {
+            std::error_code error;
+            const std::string path = FormatFramePath(mPattern, frame);
+            if (std::filesystem::exists(path, error))
+                mEarlier.emplace(frame, path);
+        }
+    }
+
     const std::string mPattern;
+    const bool mOverwrite;
+    StreamInfo mInfo;
+    // Frame number to path of the files found by Begin.
+    std::map<std::int64_t, std::string> mEarlier;
 };
 
 class Y4MWriter final : public FrameWriter
 {
 public:
-    Y4MWriter(std::FILE* inFile, std::string inPath, Y4MChroma inChroma)
+    Y4MWriter(std::FILE* inFile, std::string inPath, Y4MChroma inChroma, bool inOverwrite)
         : mFile(inFile)
         , mPath(std::move(inPath))
         , mChroma(inChroma)
+        , mOverwrite(inOverwrite)
     {
     }
 
@@ -134,6 +214,12 @@ public:
             outError = MakeParentDirectory(mPath);
             if (!outError.empty())
                 return false;
+            std::error_code error;
+            if (!mOverwrite && std::filesystem::exists(mPath, error))
+            {
+                outError = Quoted(mPath) + " exists; give --overwrite to replace it";
+                return false;
+            }
             mFile = std::fopen(mPath.c_str(), "wb");
             if (!mFile)
             {
@@ -336,6 +422,7 @@ private:
     std::FILE* mFile;
     const std::string mPath;
     const Y4MChroma mChroma;
+    const bool mOverwrite;
     bool mOwnsFile = false;
     StreamInfo mInfo;
 };
@@ -372,15 +459,15 @@ std::string MakeY4MHeader(const StreamInfo& inInfo, Y4MChroma inChroma)
            (inChroma == Y4MChroma::k420 ? "420" : "444") + " XCOLORRANGE=LIMITED\n";
 }
 
-std::unique_ptr<FrameWriter> CreatePngSequenceWriter(std::string inPattern)
+std::unique_ptr<FrameWriter> CreatePngSequenceWriter(std::string inPattern, bool inOverwrite)
 {
-    return std::make_unique<PngSequenceWriter>(std::move(inPattern));
+    return std::make_unique<PngSequenceWriter>(std::move(inPattern), inOverwrite);
 }
 
 std::unique_ptr<FrameWriter> CreateY4MWriter(std::FILE* inFile, std::string inPath,
-                                             Y4MChroma inChroma)
+                                             Y4MChroma inChroma, bool inOverwrite)
 {
-    return std::make_unique<Y4MWriter>(inFile, std::move(inPath), inChroma);
+    return std::make_unique<Y4MWriter>(inFile, std::move(inPath), inChroma, inOverwrite);
 }
 
 } // namespace vrender

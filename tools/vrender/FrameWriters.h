@@ -39,6 +39,9 @@ struct StreamInfo
     mvxmediatypes::FieldType mFieldType = mvxmediatypes::kFieldType_Progressive;
     mvxmediatypes::PixelAspectRatio mPixelAspectRatio = mvxmediatypes::kPixelAspectRatio_Square;
     mvxmediatypes::RenderQuality mQuality = mvxmediatypes::kRenderQuality_Max;
+    // The frame numbers the output will hold: mFirstFrame onwards, mFrameCount of them.
+    std::int64_t mFirstFrame = 0;
+    std::int64_t mFrameCount = 0;
 };
 
 // One encoded frame, between Encode and Commit.
@@ -75,16 +78,28 @@ public:
     virtual std::string Describe() const = 0;
 };
 
-// Numbered PNG files from a printf-style pattern (vrender::CheckFramePattern).
-// Frames without alpha, or whose alpha is opaque, are written as RGB.
-std::unique_ptr<FrameWriter> CreatePngSequenceWriter(std::string inPattern);
+// Numbered PNG files from a printf-style pattern (vrender::CheckFramePattern),
+// numbered by source frame. Frames without alpha, or whose alpha is opaque,
+// are written as RGB, others as RGBA; 8-bit formats as 8-bit files, deeper
+// ones as 16-bit files.
+//
+// Files of the same pattern from an earlier render (the frame numbers of
+// the new range, and any other number when the number is in the file name)
+// make Begin fail unless inOverwrite is set, so that a folder never ends up
+// holding two renders mixed. With inOverwrite, the frames of the range are
+// replaced and, once every frame is written, Finish removes the files of the
+// pattern outside the range. Files that do not match the pattern are never
+// touched.
+std::unique_ptr<FrameWriter> CreatePngSequenceWriter(std::string inPattern,
+                                                     bool inOverwrite = false);
 
 // A Y4M stream written to inFile (not closed by the writer), or to a file
-// that the writer creates at inPath when inFile is null. Frames are
-// converted to 8-bit video-range Y'CbCr (BT.601 below 720 rows, BT.709 from
-// 720), 4:4:4 or 4:2:0 with each chroma sample the mean of its 2x2 block.
+// that the writer creates at inPath when inFile is null; an existing file
+// there makes Begin fail unless inOverwrite is set. Frames are converted to
+// 8-bit video-range Y'CbCr (BT.601 below 720 rows, BT.709 from 720), 4:4:4
+// or 4:2:0 with each chroma sample the mean of its 2x2 block.
 std::unique_ptr<FrameWriter> CreateY4MWriter(std::FILE* inFile, std::string inPath,
-                                             Y4MChroma inChroma);
+                                             Y4MChroma inChroma, bool inOverwrite = false);
 
 // The Y4M stream header line, newline included:
 // "YUV4MPEG2 W<w> H<h> F<n>:<d> I<p|t|b> A<n>:<d> C<420|444> XCOLORRANGE=LIMITED\n".

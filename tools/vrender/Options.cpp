@@ -1,5 +1,6 @@
 #include "Options.h"
 
+#include "BE/PatternSettings.h"
 #include "VF/VideoFrame.h"
 
 #include <algorithm>
@@ -16,6 +17,7 @@ namespace
 namespace mt = mvxmediatypes;
 
 constexpr char kDefaultOutputPattern[] = "out/frames/frame_%05d.png";
+constexpr std::string_view kPatternPrefix = "pattern:";
 constexpr char kDemoMedia[] = "pattern:moving?size=1280x720";
 constexpr char kDemoOutputPattern[] = "out/demo/frame_%05d.png";
 constexpr std::int64_t kDemoFrameCount = 50;
@@ -59,6 +61,19 @@ std::string RenderableFormatNames()
         if (!names.empty())
             names += ", ";
         names += mt::GetPixelFormatName(format);
+    }
+    return names;
+}
+
+// The names of a ", "-separated list.
+std::vector<std::string_view> SplitNames(std::string_view inList)
+{
+    std::vector<std::string_view> names;
+    while (!inList.empty())
+    {
+        const std::size_t comma = inList.find(", ");
+        names.push_back(inList.substr(0, comma));
+        inList = comma == std::string_view::npos ? std::string_view() : inList.substr(comma + 2);
     }
     return names;
 }
@@ -162,6 +177,8 @@ private:
             name = "--jobs";
         if (name == "-q")
             name = "--quiet";
+        if (name == "-y")
+            name = "--overwrite";
         if (name == "--output")
             name = "-o";
         if (!FirstTime(name))
@@ -190,12 +207,14 @@ private:
                 filters.mFrameBlend = true;
             return;
         }
-        if (name == "--quiet" || name == "--y4m")
+        if (name == "--quiet" || name == "--y4m" || name == "--overwrite")
         {
             if (inlineValue)
                 return Fail(std::string(name) + " takes no value");
             if (name == "--quiet")
                 options.mQuiet = true;
+            else if (name == "--overwrite")
+                options.mOverwrite = true;
             else
             {
                 SetOutput(name);
@@ -405,6 +424,14 @@ private:
     void Finish()
     {
         RenderOptions& options = mResult.mOptions;
+        // A pattern text is an argument like any other: a mistake in it is
+        // found here, before the renderer starts.
+        if (mTakesMedia && options.mMedia.starts_with(kPatternPrefix))
+        {
+            const BE::PatternParseResult pattern = BE::ParsePatternSettings(options.mMedia);
+            if (!pattern.Succeeded())
+                return Fail(pattern.mMessage);
+        }
         if (mSeen.contains("--frames") && (mSeen.contains("--start") || mSeen.contains("--count")))
             return Fail("--frames cannot be combined with --start or --count");
         if (mSeen.contains("--chroma") && options.mOutputKind == OutputKind::kPngSequence)
@@ -532,6 +559,30 @@ std::string FormatFramePath(std::string_view inPattern, std::int64_t inFrame)
     return path;
 }
 
+std::optional<std::int64_t> MatchFramePath(std::string_view inPattern, std::string_view inPath)
+{
+    // The text before and after the frame number, %% unescaped.
+    std::size_t conversion = 0;
+    while (conversion < inPattern.size() &&
+           (inPattern[conversion] != '%' || inPattern[conversion + 1] == '%'))
+        conversion += inPattern[conversion] == '%' ? 2 : 1;
+    const std::size_t end = inPattern.find('d', conversion) + 1;
+    const std::string prefix = FormatFramePath(inPattern.substr(0, conversion), 0);
+    const std::string suffix = FormatFramePath(inPattern.substr(end), 0);
+    if (inPath.size() <= prefix.size() + suffix.size() || !inPath.starts_with(prefix) ||
+        !inPath.ends_with(suffix))
+        return std::nullopt;
+    std::string_view digits =
+        inPath.substr(prefix.size(), inPath.size() - prefix.size() - suffix.size());
+    while (digits.size() > 1 && digits.front() == ' ')
+        digits.remove_prefix(1);
+    const std::optional<std::int64_t> frame = ParseCount(digits);
+    // The exact spelling (width, padding) must be the pattern's own.
+    if (!frame || FormatFramePath(inPattern, *frame) != inPath)
+        return std::nullopt;
+    return frame;
+}
+
 ParsedCommandLine ParseCommandLine(std::span<const std::string_view> inArguments)
 {
     ParsedCommandLine result;
@@ -589,50 +640,84 @@ RenderOptions MakeDemoOptions()
     options.mStart = 0;
     options.mCount = kDemoFrameCount;
     options.mOutputPath = kDemoOutputPattern;
+    // out/demo/ is the demo's own: a second demo replaces the first.
+    options.mOverwrite = true;
     return options;
 }
 
 std::string GetUsageText()
 {
-    return R"(vrender: renders video frames through the VideoRenderer module.
+    std::string text = R"(vrender: renders video frames through the VideoRenderer module.
 
 Usage:
   vrender                       render the built-in demo (a moving pattern, 50 frames
-                                at 1280x720) into out/demo/
+                                at 1280x720) into out/demo/, replacing an earlier demo
   vrender source MEDIA [options]
                                 render frames of one media source
-  vrender info                  print the built-in example cutlist
+  vrender info                  print the built-in example cutlist (colours as
+                                0xAARRGGBB)
   vrender demo [options]        the demo, with options as for source
   vrender --help                this text
 
 MEDIA is an image file (.png, .jpg), a Y4M file (.y4m), or a generated pattern:
-  pattern:KIND[?KEY=VALUE&...]  KIND bars, solid, gradient or moving;
-                                keys size=WxH, rate=R, field=progressive|upper|lower,
-                                par=N:D, alpha=none|straight|premultiplied, color=RRGGBB
+  pattern:KIND[?KEY=VALUE&...]  KIND bars, solid, gradient (still pictures) or
+                                moving (a new picture every frame); keys
+                                size=WxH, rate=R, field=progressive|upper|lower,
+                                par=N:D, alpha=none|straight|premultiplied,
+                                opacity=0..255, matte=RRGGBB, color=RRGGBB (solid),
+                                from=RRGGBB and to=RRGGBB (gradient)
   e.g. pattern:moving?size=1920x1080&rate=50
 
 Options:
   --frames A:B        frames A to B, both included
   --start N           first frame (default 0)
   --count N           number of frames (default: the whole file; 1 for a still
-                      image; 50 for a pattern)
+                      image or a still pattern; 50 for pattern:moving, which
+                      has no end)
   --size WxH          output size (default: the source's)
   --par N:D           output pixel aspect ratio (default: the source's)
-  --format NAME       pixel format to render in (default BGRA_4444_8u)
-  --field F           progressive, upper or lower (default: the source's)
+  --format NAME       pixel format to render in (default BGRA_4444_8u), one of
+)";
+    // The format names, wrapped under the option's description.
+    const std::string names = RenderableFormatNames();
+    std::string line = "                     ";
+    for (const std::string_view name : SplitNames(names))
+    {
+        if (line.size() + name.size() + 2 > 78)
+        {
+            text += line + "\n";
+            line = "                     ";
+        }
+        line += " ";
+        line += name;
+        line += ",";
+    }
+    line.back() = '\n';
+    text += line;
+    text += R"(  --field F           progressive, upper or lower (default: the source's)
   --rate R            frame rate of the frame grid and of Y4M output, e.g. 25,
-                      30000/1001, 29.97 (default: the source's; 25 for stills)
+                      30000/1001, 29.97 (default: the source's, a pattern's
+                      rate= included; 25 for still images)
   --quality Q         0 (draft) to 5 (best, the default)
   -o PATTERN          numbered PNG files, e.g. out/frame_%05d.png
-                      (default out/frames/frame_%05d.png)
+                      (default out/frames/frame_%05d.png); the number is the
+                      source frame's: --frames 10:19 writes frame_00010.png
+                      to frame_00019.png
   -o FILE.y4m         a Y4M file
   -o -, --y4m         a Y4M stream on standard output, e.g.
                       vrender source pattern:moving --y4m | ffplay -
   --output-dir DIR    PNG files DIR/frame_00000.png, ...
+  -y, --overwrite     replace PNG files of the same pattern from an earlier
+                      render and remove its frames outside the new range
+                      (without it, such files stop the render; files that do
+                      not match the pattern are never touched)
   --chroma C          Y4M chroma: 420 (default) or 444
   -j, --jobs N        frames in flight, 1 to 64 (default: twice the cores)
-  -q, --quiet         no progress bar
+  -q, --quiet         no progress bar (warnings and errors still show)
   -h, --help          this text
+
+PNG files are 8-bit for 8-bit formats and 16-bit for deeper ones (16u, 32f),
+RGBA when the frame has alpha that is not opaque, else RGB.
 
 Filters, stacked on the source in this order:
   --remove-pulldown P       remove 2:3 pulldown; P is the cadence phase of
@@ -642,14 +727,41 @@ Filters, stacked on the source in this order:
   --field-reverse           deliver the fields in the requested order
   --deinterlace             keep one field and rebuild the other
   --remove-flicker          vertical flicker filter
-  --interlace-consecutive   interlace each two consecutive frames
+  --interlace-consecutive   interlace each two consecutive frames (not for
+                            still sources: ignored with a warning)
   --scale WxH               scale to WxH with pixel-aspect correction (--par
                             also brings in the scaler)
   --speed S                 re-time by S (0.5 slow motion, -1 reverse) with
                             frame mixing, or frame blending with --frame-blend
+                            (not for still sources: ignored with a warning)
 
 Ctrl-C cancels the frames in flight and stops cleanly.
+
+Exit status:
+  0    every frame was written
+  1    a failure while rendering: unreadable media, a frame that failed, an
+       output that cannot be written or that would replace an earlier render
+  2    bad arguments (the message names the argument and the problem)
+  130  cancelled with Ctrl-C
 )";
+    return text;
+}
+
+std::vector<std::string> GetStillSourceWarnings(const RenderOptions& inOptions)
+{
+    std::vector<std::string> warnings;
+    const FilterOptions& filters = inOptions.mFilters;
+    const std::string still = " does not apply to a still source (" + Quoted(inOptions.mMedia) +
+                              " shows one picture at every time); ignored";
+    if (filters.mSpeed)
+        warnings.push_back("--speed" + still);
+    if (filters.mFrameBlend)
+        warnings.push_back("--frame-blend" + still);
+    // Pulldown removal replaces the field filters, this one included.
+    if (filters.mInterlaceConsecutive &&
+        filters.mRemovePulldown == mvxmediatypes::kPulldownCadence_None)
+        warnings.push_back("--interlace-consecutive" + still);
+    return warnings;
 }
 
 } // namespace vrender

@@ -18,6 +18,7 @@
 #include <span>
 #include <string>
 #include <string_view>
+#include <vector>
 
 namespace vrender
 {
@@ -102,6 +103,10 @@ struct RenderOptions
     // 0: the default (twice the core count, at most kMaxJobs).
     std::uint32_t mJobs = 0;
     bool mQuiet = false;
+    // --overwrite: replace PNG files of the pattern left by an earlier run and
+    // remove its frames outside the new range. Without it such files stop
+    // the render before anything is written.
+    bool mOverwrite = false;
     FilterOptions mFilters;
 };
 
@@ -119,11 +124,16 @@ struct ParsedCommandLine
 ParsedCommandLine ParseCommandLine(std::span<const std::string_view> inArguments);
 
 // The options of the built-in demo: the moving pattern at 1280x720, 50
-// frames, PNG files in out/demo/.
+// frames, PNG files in out/demo/, replacing those of an earlier demo.
 RenderOptions MakeDemoOptions();
 
 // The text of --help.
 std::string GetUsageText();
+
+// Warnings for the options that cannot apply to a still source (a still
+// image or a still pattern): "--speed does not apply to a still source
+// ('still.png'); ignored". Empty when every option applies.
+std::vector<std::string> GetStillSourceWarnings(const RenderOptions& inOptions);
 
 // Parsers of single values, shared with the tests. Each answers nothing when
 // the text is not a valid value.
@@ -136,5 +146,8 @@ std::optional<mvxmediatypes::FrameRate> ParseFrameRate(std::string_view inText);
 std::string CheckFramePattern(std::string_view inPattern);
 // The pattern with its frame number filled in (the pattern must be valid).
 std::string FormatFramePath(std::string_view inPattern, std::int64_t inFrame);
+// The frame number of inPath when inPath is what FormatFramePath makes of
+// the (valid) pattern for some frame number 0 or more; else nothing.
+std::optional<std::int64_t> MatchFramePath(std::string_view inPattern, std::string_view inPath);
 
 } // namespace vrender

@@ -43,6 +43,11 @@ std::string FormatSummary(std::int64_t inFrames, double inSeconds, const std::st
     return std::string(text) + " to " + inWhere;
 }
 
+std::string FormatCancelled(std::int64_t inFrames)
+{
+    return "cancelled after " + std::to_string(inFrames) + (inFrames == 1 ? " frame" : " frames");
+}
+
 ProgressDisplay::ProgressDisplay(std::FILE* inStream, bool inEnabled, std::int64_t inTotal)
     : mStream(inStream)
     , mEnabled(inEnabled)

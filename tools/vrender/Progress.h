@@ -24,6 +24,9 @@ std::string FormatProgressLine(std::int64_t inDone, std::int64_t inTotal, double
 // "Rendered 50 frames in 1.25 s (40.0 fps) to out/demo/frame_%05d.png".
 std::string FormatSummary(std::int64_t inFrames, double inSeconds, const std::string& inWhere);
 
+// "cancelled after 1 frame", "cancelled after 2 frames".
+std::string FormatCancelled(std::int64_t inFrames);
+
 class ProgressDisplay
 {
 public:

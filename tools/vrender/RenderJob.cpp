@@ -57,9 +57,11 @@ struct FrameResult
 // late callback never reaches freed state.
 struct SharedState
 {
-    SharedState(std::int64_t inFirst, SourceRef inSource, std::unique_ptr<FrameWriter> inWriter,
-                RenderPlan inPlan, QRT::InterfaceRef<MF::ITimeTransform> inTimeTransform)
+    SharedState(std::int64_t inFirst, BE::VideoSourceRef inMedia, SourceRef inSource,
+                std::unique_ptr<FrameWriter> inWriter, RenderPlan inPlan,
+                QRT::InterfaceRef<MF::ITimeTransform> inTimeTransform)
         : mWindow(inFirst)
+        , mMedia(std::move(inMedia))
         , mSource(std::move(inSource))
         , mWriter(std::move(inWriter))
         , mPlan(inPlan)
@@ -68,6 +70,8 @@ struct SharedState
     }
 
     OrderingWindow<FrameResult> mWindow;
+    // The media under mSource, which may know why a read failed.
+    const BE::VideoSourceRef mMedia;
     const SourceRef mSource;
     const std::unique_ptr<FrameWriter> mWriter;
     const RenderPlan mPlan;
@@ -165,7 +169,8 @@ FrameResult FinishFrame(SharedState& inState, std::int64_t inIndex, FrameRef inF
         // Success without a frame: the source could not render this time.
         if (!inFrame)
         {
-            result.mError = name + ": the source delivered no frame";
+            const std::string cause = BE::GetLastReadFailure(inState.mMedia);
+            result.mError = name + ": " + (cause.empty() ? "the source delivered no frame" : cause);
             return result;
         }
         std::string problem;
@@ -214,11 +219,12 @@ std::unique_ptr<FrameWriter> CreateWriter(const RenderOptions& inOptions,
     case OutputKind::kY4MStream:
         return CreateY4MWriter(inEnvironment.mOutput, {}, inOptions.mChroma);
     case OutputKind::kY4MFile:
-        return CreateY4MWriter(nullptr, inOptions.mOutputPath, inOptions.mChroma);
+        return CreateY4MWriter(nullptr, inOptions.mOutputPath, inOptions.mChroma,
+                               inOptions.mOverwrite);
     case OutputKind::kPngSequence:
         break;
     }
-    return CreatePngSequenceWriter(inOptions.mOutputPath);
+    return CreatePngSequenceWriter(inOptions.mOutputPath, inOptions.mOverwrite);
 }
 
 // The loop proper; see the header comment of RunRender.
@@ -413,8 +419,9 @@ bool PlanRender(const RenderOptions& inOptions, const SourceFacts& inSource, uns
     stream.mFieldType = inOptions.mFieldType.value_or(
         mt::IsInterlaced(inSource.mFieldType) ? inSource.mFieldType : mt::kFieldType_Progressive);
     stream.mQuality = static_cast<mt::RenderQuality>(inOptions.mQuality);
-    const bool stillRate = inSource.mIsStill || inSource.mFrameRate.IsZero() ||
-                           inSource.mFrameRate >= mt::kFrameRate_Video1000;
+    // Still images carry no rate of their own; a still pattern has the one it is given.
+    const bool stillRate =
+        inSource.mFrameRate.IsZero() || inSource.mFrameRate >= mt::kFrameRate_Video1000;
     stream.mFrameRate =
         inOptions.mFrameRate.value_or(stillRate ? kDefaultStillFrameRate : inSource.mFrameRate);
     if (mt::IsInterlaced(stream.mFieldType) && stream.mFrameRate.GetTicksPerFrame() < 2)
@@ -439,7 +446,7 @@ bool PlanRender(const RenderOptions& inOptions, const SourceFacts& inSource, uns
     else if (length)
         plan.mCount = *length - plan.mFirst;
     else
-        plan.mCount = inSource.mIsStill && !inOptions.mStart ? 1 : kDefaultEndlessFrameCount;
+        plan.mCount = inSource.mIsStill ? 1 : kDefaultEndlessFrameCount;
     if (length)
     {
         const std::string range = *length == 0   ? std::string("no frames")
@@ -456,6 +463,8 @@ bool PlanRender(const RenderOptions& inOptions, const SourceFacts& inSource, uns
             return false;
         }
     }
+    stream.mFirstFrame = plan.mFirst;
+    stream.mFrameCount = plan.mCount;
     const unsigned cores = std::max(inCoreCount, 1u);
     plan.mJobs = inOptions.mJobs != 0 ? inOptions.mJobs : std::min(2 * cores, kMaxJobs);
     outPlan = plan;
@@ -480,6 +489,9 @@ RenderOutcome RunRender(const RenderOptions& inOptions, const RenderEnvironment&
     RenderPlan plan;
     if (!PlanRender(inOptions, facts, mvxcore::threads::GetCPUCoreCount(), plan, outcome.mError))
         return outcome;
+    if (facts.mIsStill)
+        for (const std::string& warning : GetStillSourceWarnings(inOptions))
+            std::fprintf(inEnvironment.mProgress, "vrender: warning: %s\n", warning.c_str());
 
     // The adaptor declares what the source says of itself, so frames are
     // sampled on the source's own time line whatever the output rate.
@@ -498,8 +510,8 @@ RenderOutcome RunRender(const RenderOptions& inOptions, const RenderEnvironment&
         return outcome;
     QRT::InterfaceRef<MF::ITimeTransform> timeTransform;
     source = StackFilters(source, inOptions.mFilters, media->IsStill(), timeTransform);
-    auto state =
-        std::make_shared<SharedState>(plan.mFirst, source, std::move(writer), plan, timeTransform);
+    auto state = std::make_shared<SharedState>(plan.mFirst, media, source, std::move(writer), plan,
+                                               timeTransform);
     const ExecutorRef encoders =
         mvxcore::threads::CreateThreadPoolExecutor(mvxcore::threads::GetCPUCoreCount());
 

@@ -93,8 +93,8 @@ int RunRender(const vrender::RenderOptions& inOptions, bool inDemo)
     }
     if (outcome.mExitCode == 130)
     {
-        std::fprintf(stderr, "vrender: cancelled after %lld frames\n",
-                     static_cast<long long>(outcome.mFramesWritten));
+        std::fprintf(stderr, "vrender: %s\n",
+                     vrender::FormatCancelled(outcome.mFramesWritten).c_str());
         return 130;
     }
     if (outcome.mExitCode != 0)

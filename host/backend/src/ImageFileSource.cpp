@@ -2,8 +2,9 @@
 // and validity); the pixels are decoded on the first frame request, on
 // whichever thread asks (the prefetcher sends image sources to its image
 // executor), and the decoded frame is then kept, shared, for every later
-// request of any size or format. A failed decode is answered with its status
-// and tried again on the next request.
+// request of any size or format. A failed decode is answered with its status,
+// keeps its reason for GetLastReadFailure, and is tried again on the next
+// request.
 
 #include "BE/MediaStatus.h"
 #include "BE/VideoSources.h"
@@ -166,6 +167,12 @@ public:
     {
     }
 
+    std::string GetFailure()
+    {
+        std::lock_guard lock(mDecodeMutex);
+        return mFailure;
+    }
+
 protected:
     QRT::Result ProduceFrame(std::int64_t /*inIndex*/, PixelFormat /*inFormat*/,
                              FrameRef& outFrame) override
@@ -174,18 +181,34 @@ protected:
         if (!mDecoded)
         {
             FrameRef decoded;
-            const QRT::Result status = Decode(decoded);
+            const detail::SourceDescription& description = GetDescription();
+            QRT::Result status = kResult_MediaMalformed;
+            try
+            {
+                status = Decode(decoded, mFailure);
+            }
+            catch (const std::bad_alloc&)
+            {
+                mFailure = description.mMediaPath + ": no memory for the " +
+                           std::to_string(description.mWidth) + "x" +
+                           std::to_string(description.mHeight) + " picture";
+                return VF::kResult_OutOfFrameMemory;
+            }
             if (QRT::Failed(status))
                 return status;
-            const detail::SourceDescription& description = GetDescription();
             // A file replaced since opening must not pass for the old picture.
             const QRT::ParamRect bounds = decoded->GetBounds();
             if (static_cast<std::uint32_t>(bounds.Width()) != description.mWidth ||
                 static_cast<std::uint32_t>(bounds.Height()) != description.mHeight)
+            {
+                mFailure = description.mMediaPath + ": the picture changed size since it was "
+                                                    "opened";
                 return kResult_MediaMalformed;
+            }
             decoded->SetAlphaChannel(description.mAlpha);
             decoded->MarkShared(1);
             mDecoded = std::move(decoded);
+            mFailure.clear();
         }
         outFrame = mDecoded;
         return QRT::kResult_Success;
@@ -200,15 +223,19 @@ protected:
     }
 
 private:
-    QRT::Result Decode(FrameRef& outFrame) const
+    // Decodes the file; on failure outMessage names the file and the reason.
+    QRT::Result Decode(FrameRef& outFrame, std::string& outMessage) const
     {
         const std::string& path = GetDescription().mMediaPath;
         if (mKind == ImageKind::kPng)
-            return VF::ReadPngFile(path, outFrame).mResult;
+        {
+            VF::PngStatus status = VF::ReadPngFile(path, outFrame);
+            outMessage = std::move(status.mMessage);
+            return status.mResult;
+        }
 
         JpegJob job;
-        std::string message;
-        const QRT::Result status = ReadJpeg(path, false, job, message);
+        const QRT::Result status = ReadJpeg(path, false, job, outMessage);
         if (QRT::Failed(status))
             return status;
         FrameRef frame;
@@ -216,7 +243,11 @@ private:
             VF::CreateVideoFrame(mvxmediatypes::kPixelFormat_BGRA_4444_8u, job.mWidth, job.mHeight,
                                  mvxmediatypes::kPixelAspectRatio_Square, false, false, frame);
         if (QRT::Failed(created))
+        {
+            outMessage = path + ": no memory for the " + std::to_string(job.mWidth) + "x" +
+                         std::to_string(job.mHeight) + " picture";
             return created;
+        }
         auto* base = static_cast<std::uint8_t*>(frame->GetWritableBaseAddress());
         const std::size_t rowBytes = static_cast<std::size_t>(frame->GetRowBytes());
         const std::size_t packedRow = std::size_t{job.mWidth} * 4;
@@ -227,12 +258,21 @@ private:
     }
 
     const ImageKind mKind;
-    // Guards mDecoded; held across the decode so that one thread decodes.
+    // Guards mDecoded and mFailure; held across the decode so that one
+    // thread decodes.
     std::mutex mDecodeMutex;
     FrameRef mDecoded;
+    // The reason the latest decode failed; empty once one succeeds.
+    std::string mFailure;
 };
 
 } // namespace
+
+std::string GetLastReadFailure(const VideoSourceRef& inSource)
+{
+    auto* image = dynamic_cast<ImageFileSource*>(inSource.Get());
+    return image ? image->GetFailure() : std::string();
+}
 
 OpenStatus OpenImageFileSource(const std::string& inPath, VideoSourceRef& outSource)
 {

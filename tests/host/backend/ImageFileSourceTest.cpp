@@ -103,14 +103,26 @@ TEST_F(ImageFileSourceTest, DamagedFilesAreRefusedAtOpeningOrFailTheRead)
     ASSERT_TRUE(VF::WritePngFile(pngPath, picture).Succeeded());
     WriteBytes(pngPath, ReadBytes(pngPath).substr(0, 40));
     FrameRef frame;
-    EXPECT_TRUE(QRT::Failed(ReadFrame(OpenOrFail(pngPath), TickTime(), frame)));
+    const BE::VideoSourceRef cutPng = OpenOrFail(pngPath);
+    EXPECT_EQ(BE::GetLastReadFailure(cutPng), "") << "nothing has failed yet";
+    EXPECT_TRUE(QRT::Failed(ReadFrame(cutPng, TickTime(), frame)));
+    // The decoder's reason is kept for the message, with the file's name.
+    EXPECT_EQ(BE::GetLastReadFailure(cutPng), pngPath + ": the file ends early (truncated)");
     const std::string jpegPath = mDirectory.File("cut.jpg");
     WriteSolidJpeg(jpegPath, 64, 64, 10, 20, 30);
     const std::string jpegBytes = ReadBytes(jpegPath);
     // Cut inside the picture data: libjpeg would warn and fill in grey.
     WriteBytes(jpegPath, jpegBytes.substr(0, jpegBytes.size() - 12));
-    EXPECT_EQ(ReadFrame(OpenOrFail(jpegPath), TickTime(), frame), BE::kResult_MediaMalformed);
+    const BE::VideoSourceRef cutJpeg = OpenOrFail(jpegPath);
+    EXPECT_EQ(ReadFrame(cutJpeg, TickTime(), frame), BE::kResult_MediaMalformed);
     EXPECT_FALSE(frame);
+    const std::string reason = BE::GetLastReadFailure(cutJpeg);
+    EXPECT_EQ(reason.rfind(jpegPath + ": ", 0), 0u) << reason;
+    EXPECT_GT(reason.size(), jpegPath.size() + 2) << "libjpeg's reason follows";
+    // Repaired, the file reads and the reason is gone.
+    WriteBytes(jpegPath, jpegBytes);
+    EXPECT_EQ(ReadFrame(cutJpeg, TickTime(), frame), QRT::kResult_Success);
+    EXPECT_EQ(BE::GetLastReadFailure(cutJpeg), "");
 }
 
 } // namespace

@@ -3,11 +3,15 @@
 #include "FrameTestSupport.h"
 #include "VF/VideoFrameManipulators.h"
 
+#include <csetjmp>
 #include <filesystem>
 #include <fstream>
+#include <memory>
 #include <unistd.h>
+#include <zlib.h>
 
 #include <gtest/gtest.h>
+#include <png.h>
 
 namespace
 {
@@ -44,6 +48,70 @@ VF::PngStatus Read(const std::string& inPath, Frame& outFrame)
     EXPECT_EQ(bool(outFrame), status.Succeeded()) << status.mMessage;
     return status;
 }
+
+std::string BigEndian32(uint32_t inValue)
+{
+    return {char(inValue >> 24), char(inValue >> 16), char(inValue >> 8), char(inValue)};
+}
+
+// A one-row 16-bit PNG file of colour type inColorType, made here byte by
+// byte, so that the reader is checked against files it did not write.
+std::vector<char> MakePng16(int inColorType, uint32_t inWidth,
+                            const std::vector<uint16_t>& inSamples)
+{
+    const auto chunk = [](const std::string& inType, const std::string& inData)
+    {
+        const std::string body = inType + inData;
+        return BigEndian32(uint32_t(inData.size())) + body +
+               BigEndian32(uint32_t(
+                   crc32(0, reinterpret_cast<const Bytef*>(body.data()), uInt(body.size()))));
+    };
+    std::string raw(1, '\0');
+    for (const uint16_t sample : inSamples)
+        raw += {char(sample >> 8), char(sample)};
+    std::vector<Bytef> packed(compressBound(uLong(raw.size())));
+    uLongf packedSize = uLongf(packed.size());
+    EXPECT_EQ(compress(packed.data(), &packedSize, reinterpret_cast<const Bytef*>(raw.data()),
+                       uLong(raw.size())),
+              Z_OK);
+    const std::string file =
+        "\x89PNG\r\n\x1a\n" +
+        chunk("IHDR",
+              BigEndian32(inWidth) + BigEndian32(1) + std::string{16, char(inColorType), 0, 0, 0}) +
+        chunk("IDAT", std::string(packed.begin(), packed.begin() + long(packedSize))) +
+        chunk("IEND", "");
+    return {file.begin(), file.end()};
+}
+
+// A PNG file as stored: IHDR depth and colour type, and the rows' bytes
+// (16-bit samples most significant byte first), read without transforms.
+struct RawPng
+{
+    int mDepth = 0;
+    int mColorType = -1;
+    std::vector<uint8_t> mBytes;
+    png_structp mPng = png_create_read_struct(PNG_LIBPNG_VER_STRING, nullptr, nullptr, nullptr);
+    png_infop mInfo = png_create_info_struct(mPng);
+    ~RawPng() { png_destroy_read_struct(&mPng, &mInfo, nullptr); }
+};
+
+void ReadRaw(RawPng& ioRaw, FILE* inFile)
+{
+    if (setjmp(png_jmpbuf(ioRaw.mPng)) != 0)
+        return ADD_FAILURE() << "libpng cannot read the file";
+    png_init_io(ioRaw.mPng, inFile);
+    png_read_png(ioRaw.mPng, ioRaw.mInfo, PNG_TRANSFORM_IDENTITY, nullptr);
+    ioRaw.mDepth = png_get_bit_depth(ioRaw.mPng, ioRaw.mInfo);
+    ioRaw.mColorType = png_get_color_type(ioRaw.mPng, ioRaw.mInfo);
+    const png_bytepp rows = png_get_rows(ioRaw.mPng, ioRaw.mInfo);
+    for (png_uint_32 y = 0; y < png_get_image_height(ioRaw.mPng, ioRaw.mInfo); ++y)
+        ioRaw.mBytes.insert(ioRaw.mBytes.end(), rows[y],
+                            rows[y] + png_get_rowbytes(ioRaw.mPng, ioRaw.mInfo));
+}
+
+// 16-bit samples whose 8-bit values round differently from truncation.
+constexpr uint16_t kDeepSamples[] = {0x8000, 0x8080, 0x7FFF, 0xFFFF,
+                                     0x0180, 0x00FF, 0x1234, 0xFEDC};
 
 // Each case works in its own temporary directory.
 class PngFileTest : public ::testing::Test
@@ -94,7 +162,79 @@ TEST_F(PngFileTest, TruncatedOrCorruptedFileIsMalformedNotACrash)
         WriteBytes(cut, std::vector<char>(bytes.begin(), bytes.begin() + keep));
         const VF::PngStatus status = Read(cut, read);
         EXPECT_EQ(status.mResult, VF::kResult_PngMalformed) << keep;
-        EXPECT_EQ(status.mMessage.rfind(cut + ": ", 0), 0u) << status.mMessage;
+        EXPECT_EQ(status.mMessage, cut + ": the file ends early (truncated)");
+    }
+    // A damaged checksum of the picture data is named.
+    std::vector<char> damaged = MakePng16(0, 2, {1, 2});
+    damaged[damaged.size() - 13] ^= 1;
+    WriteBytes(PathOf("crc.png"), damaged);
+    EXPECT_EQ(Read(PathOf("crc.png"), read).mMessage, PathOf("crc.png") + ": IDAT: CRC error");
+}
+
+TEST_F(PngFileTest, SixteenBitFilesReadAsStoredRoundedToEightBits)
+{
+    // Colour type, channels, and which sample (-1: opaque) gives R, G, B, A.
+    const std::tuple<int, uint32_t, std::array<int, 4>> cases[] = {
+        {PNG_COLOR_TYPE_GRAY, 1, {0, 0, 0, -1}},
+        {PNG_COLOR_TYPE_GRAY_ALPHA, 2, {0, 0, 0, 1}},
+        {PNG_COLOR_TYPE_RGB, 3, {0, 1, 2, -1}},
+        {PNG_COLOR_TYPE_RGB_ALPHA, 4, {0, 1, 2, 3}}};
+    for (const auto& [colorType, channels, sources] : cases)
+    {
+        SCOPED_TRACE(colorType);
+        const uint32_t width = 8;
+        std::vector<uint16_t> samples;
+        for (uint32_t i = 0; i < width * channels; ++i)
+            samples.push_back(kDeepSamples[(i * 3 + i / 8) % 8]);
+        WriteBytes(PathOf("deep.png"), MakePng16(colorType, width, samples));
+        Frame read;
+        ASSERT_TRUE(Read(PathOf("deep.png"), read).Succeeded());
+        for (uint32_t x = 0; x < width; ++x)
+            for (int c = 0; c < 4; ++c)
+            {
+                const int source = sources[size_t(c)];
+                const uint32_t v = source < 0 ? 65535 : samples[x * channels + uint32_t(source)];
+                // Stored BGRA: R at byte 2, B at byte 0.
+                const int byte = c == 3 ? 3 : 2 - c;
+                EXPECT_EQ(Row(read, 0, int32_t(x))[byte], (v * 255 + 32767) / 65535)
+                    << "pixel " << x << " channel " << c;
+            }
+    }
+}
+
+TEST_F(PngFileTest, DeepFramesWriteSixteenBitSamplesAsTheyAre)
+{
+    for (const auto& [format, depth] : {std::pair{mt::kPixelFormat_BGRA_4444_8u, VF::PngDepth::k8},
+                                        {mt::kPixelFormat_VUYA_4444_8u, VF::PngDepth::k8},
+                                        {mt::kPixelFormat_BGRA_4444_16u, VF::PngDepth::k16},
+                                        {mt::kPixelFormat_BGRA_4444_16f, VF::PngDepth::k16},
+                                        {mt::kPixelFormat_BGRA_4444_32f, VF::PngDepth::k16}})
+        EXPECT_EQ(VF::GetPngDepthFor(format), depth) << mt::GetPixelFormatName(format);
+
+    const Frame deep = MakeFrame(mt::kPixelFormat_BGRA_4444_16u, 2, 1);
+    auto* samples = reinterpret_cast<uint16_t*>(Row(deep, 0));
+    std::copy(std::begin(kDeepSamples), std::end(kDeepSamples), samples);
+    for (const auto& [channels, colorType] :
+         {std::pair{VF::PngChannels::kRGBA, PNG_COLOR_TYPE_RGB_ALPHA},
+          {VF::PngChannels::kRGB, PNG_COLOR_TYPE_RGB}})
+    {
+        const VF::PngStatus status =
+            VF::WritePngFile(PathOf("deep.png"), deep, channels, VF::PngDepth::k16);
+        ASSERT_TRUE(status.Succeeded()) << status.mMessage;
+        RawPng raw;
+        const std::unique_ptr<FILE, int (*)(FILE*)> file(
+            std::fopen(PathOf("deep.png").c_str(), "rb"), &std::fclose);
+        ReadRaw(raw, file.get());
+        EXPECT_EQ(std::pair(raw.mDepth, raw.mColorType), std::pair(16, colorType));
+        const size_t perPixel = colorType == PNG_COLOR_TYPE_RGB ? 3 : 4;
+        ASSERT_EQ(raw.mBytes.size(), 2 * perPixel * 2);
+        for (size_t i = 0; i < 2 * perPixel; ++i)
+        {
+            // File order R, G, B, A; frame order B, G, R, A.
+            const size_t pixel = i / perPixel, c = i % perPixel;
+            const uint16_t expected = samples[4 * pixel + (c == 3 ? 3 : 2 - c)];
+            EXPECT_EQ(raw.mBytes[2 * i] << 8 | raw.mBytes[2 * i + 1], expected) << i;
+        }
     }
 }
 

@@ -20,7 +20,7 @@ std::string SolidTree(std::size_t inIndent, const QRT::Guid& inHash, const std::
     const std::string pad(inIndent, ' ');
     return pad + "RenderableNodeSolidColorImpl " + inHash.ToString() + "\n" + pad +
            "  flags 0x00000000\n" + pad + "  properties:\n" + pad +
-           "    SolidColorNode::Color = \"" + inColor + "\"\n" + pad + "  inputs: none\n" + pad +
+           "    SolidColorNode::Color = " + inColor + "\n" + pad + "  inputs: none\n" + pad +
            "  operators: none\n";
 }
 
@@ -34,6 +34,8 @@ TEST_F(CutlistInfoTest, TimesAndFlags)
     EXPECT_EQ(vrender::FormatRenderFlags(0x59),
               "0x00000059 (Opaque, TimeInvariant, 16, NoLayerInputs)");
     EXPECT_EQ(vrender::FormatRenderFlags(0x84), "0x00000084 (4, 128)");
+    EXPECT_EQ(vrender::FormatColor(0x80336699u), "0x80336699");
+    EXPECT_EQ(vrender::FormatColor(0x0000000Au), "0x0000000A");
 }
 
 TEST_F(CutlistInfoTest, ExampleCutlistIsPrintedSegmentsThenTrees)
@@ -57,11 +59,11 @@ TEST_F(CutlistInfoTest, ExampleCutlistIsPrintedSegmentsThenTrees)
                   "\n3 segments:\n  [0] 0.000 s to 2.000 s, offset 0.000 s, node " +
                   hashes[0].ToString() + "\n  [1] 2.000 s to 4.000 s, offset 0.000 s, node " +
                   hashes[1].ToString() + "\n  [2] 4.000 s to 6.000 s, offset 1.000 s, node " +
-                  hashes[2].ToString() + "\nNode trees:\n" + SolidTree(2, hashes[0], "4294901760") +
+                  hashes[2].ToString() + "\nNode trees:\n" + SolidTree(2, hashes[0], "0xFFFF0000") +
                   "  RenderableNodeDisabledImpl " + hashes[1].ToString() +
                   "\n    flags 0x00000000\n    properties: none\n    input 0 at 1.000 s:\n" +
-                  SolidTree(6, green->GetNodeHash(), "4278255360") + "    operators: none\n" +
-                  SolidTree(2, hashes[2], "4278190335"));
+                  SolidTree(6, green->GetNodeHash(), "0xFF00FF00") + "    operators: none\n" +
+                  SolidTree(2, hashes[2], "0xFF0000FF"));
 }
 
 TEST_F(CutlistInfoTest, ATreeUsedByTwoSegmentsIsPrintedOnceAndAnEmptyCutlistHasNone)
@@ -75,7 +77,7 @@ TEST_F(CutlistInfoTest, ATreeUsedByTwoSegmentsIsPrintedOnceAndAnEmptyCutlistHasN
     cutlist->MakeImmutable();
     const std::string text = vrender::DescribeCutlist(*cutlist);
     EXPECT_NE(text.find("2 segments:\n"), std::string::npos) << text;
-    const std::string tree = SolidTree(2, red->GetNodeHash(), "4294901760");
+    const std::string tree = SolidTree(2, red->GetNodeHash(), "0xFFFF0000");
     const std::size_t first = text.find(tree);
     ASSERT_NE(first, std::string::npos) << text;
     EXPECT_EQ(text.find(tree, first + 1), std::string::npos) << text;

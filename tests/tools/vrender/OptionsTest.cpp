@@ -35,7 +35,7 @@ auto Fields(const RenderOptions& inOptions)
                     inOptions.mJobs, inOptions.mQuiet, filters.mRemovePulldown,
                     filters.mReverseFieldDominance, filters.mFieldReverse, filters.mDeinterlace,
                     filters.mRemoveFlicker, filters.mInterlaceConsecutive, filters.mScale,
-                    filters.mSpeed, filters.mFrameBlend);
+                    filters.mSpeed, filters.mFrameBlend, inOptions.mOverwrite);
 }
 
 // The words of inText, split at spaces.
@@ -68,6 +68,8 @@ TEST_F(OptionsTest, ArgumentsBecomeTheseOptions)
         {"", [](O&) {}},
         {"--start 3 --count=7", [](O& o) { std::tie(o.mStart, o.mCount) = std::pair(3, 7); }},
         {"-j 5 -q", [](O& o) { std::tie(o.mJobs, o.mQuiet) = std::pair(5u, true); }},
+        {"--overwrite", [](O& o) { o.mOverwrite = true; }},
+        {"-y", [](O& o) { o.mOverwrite = true; }},
         {"--size 320x240", [](O& o) { std::tie(o.mWidth, o.mHeight) = std::pair(320u, 240u); }},
         {"--quality 2", [](O& o) { o.mQuality = 2; }},
         {"--format VUYA_4444_8u", [](O& o) { o.mPixelFormat = mt::kPixelFormat_VUYA_4444_8u; }},
@@ -118,8 +120,8 @@ TEST_F(OptionsTest, ArgumentsBecomeTheseOptions)
         EXPECT_EQ(Fields(parsed.mOptions), Fields(expected));
     }
     RenderOptions demo;
-    std::tie(demo.mMedia, demo.mStart, demo.mCount, demo.mOutputPath) =
-        std::tuple("pattern:moving?size=1280x720", 0, 50, "out/demo/frame_%05d.png");
+    std::tie(demo.mMedia, demo.mStart, demo.mCount, demo.mOutputPath, demo.mOverwrite) =
+        std::tuple("pattern:moving?size=1280x720", 0, 50, "out/demo/frame_%05d.png", true);
     EXPECT_EQ(Fields(Parse("").mOptions), Fields(demo));
     // Asking for help wins over a mistake elsewhere.
     EXPECT_EQ(Parse("source x.png --size bad -h").mCommand, Command::kHelp);
@@ -163,10 +165,15 @@ TEST_F(OptionsTest, RefusalsNameTheArgumentAndExitWithTwo)
         {"source m --format RGB24",
          "--format: unknown pixel format 'RGB24' (one of BGRA_4444_8u, "},
         {"source m --format Any", "--format: 'Any' cannot be rendered to (one of BGRA_4444_8u, "},
+        // A pattern text is checked with the arguments.
+        {"source pattern:nope", "pattern 'pattern:nope': unknown pattern 'nope' (expected bars,"},
+        {"source pattern:bars?size=abc", "pattern 'pattern:bars?size=abc': size 'abc' is not WxH"},
+        {"source pattern:solid?speed=2", "pattern 'pattern:solid?speed=2': unknown parameter"},
     };
     for (const auto& [args, error] : cases)
         EXPECT_THAT(Parse(args).mError, testing::StartsWith(error)) << args;
-    for (const char* args : {"render", "source m --size", "source m --chroma 444"})
+    for (const char* args :
+         {"render", "source m --size", "source m --chroma 444", "source pattern:nope"})
     {
         SCOPED_TRACE(args);
         const vrendertest::RunResult run = Run(Words(args));
@@ -203,6 +210,19 @@ TEST_F(OptionsTest, FrameRatesAndFramePatterns)
     for (const auto& [pattern, problem] : patterns)
         EXPECT_EQ(vrender::CheckFramePattern(pattern), problem) << pattern;
     EXPECT_EQ(vrender::FormatFramePath("100%%_%02d.png", 123), "100%_123.png");
+
+    // Names of the pattern's own spelling match, and only those.
+    const std::tuple<const char*, const char*, std::optional<std::int64_t>> names[] = {
+        {"f_%05d.png", "f_00012.png", 12},
+        {"f_%05d.png", "f_12.png", std::nullopt},
+        {"f_%05d.png", "f_00012.png.part", std::nullopt},
+        {"f_%05d.png", "f_-0001.png", std::nullopt},
+        {"%d.png", "07.png", std::nullopt},
+        {"%3d.png", "  7.png", 7},
+        {"100%%_%d.png", "100%_3.png", 3},
+        {"100%%_%d.png", "100%%_3.png", std::nullopt}};
+    for (const auto& [pattern, name, frame] : names)
+        EXPECT_EQ(vrender::MatchFramePath(pattern, name), frame) << pattern << " " << name;
 }
 
 } // namespace

@@ -43,6 +43,13 @@ OpenStatus OpenVideoSource(const std::string& inMedia, VideoSourceRef& outSource
 // still and image.
 OpenStatus OpenImageFileSource(const std::string& inPath, VideoSourceRef& outSource);
 
+// Why the source's latest frame read failed, naming the file and the
+// decoder's reason ("<path>: IDAT: CRC error"), for sources that keep it
+// (still images); empty when that read succeeded, none failed, or the
+// source keeps no reason. Frame requests answer only a status; this is the
+// rest of the story for a message.
+std::string GetLastReadFailure(const VideoSourceRef& inSource);
+
 // A Y4M file (8-bit 4:2:0, 4:2:2 or 4:4:4; progressive, upper or lower field
 // first). The header is parsed and an index of frame offsets is built now;
 // a truncated or malformed file is refused here. Frames are read by index

@@ -8,6 +8,7 @@
 #include "MF/IVideoFrame.h"
 #include "QRT/InterfaceRef.h"
 #include "QRT/Result.h"
+#include "mvxmediatypes/PixelFormat.h"
 
 #include <string>
 
@@ -32,22 +33,37 @@ struct PngStatus
 
 enum class PngChannels
 {
-    kRGB,  // 8-bit RGB, alpha dropped (colour as stored, not composited)
-    kRGBA, // 8-bit RGBA, straight alpha
+    kRGB,  // RGB, alpha dropped (colour as stored, not composited)
+    kRGBA, // RGBA, straight alpha
 };
 
-// Writes the frame as an 8-bit PNG file. Any frame of a raster format is
-// converted to 8-bit straight BGRA first (CopyFrame at the best quality).
+enum class PngDepth
+{
+    k8,  // 8 bits a sample
+    k16, // 16 bits a sample, for frames deeper than 8 bits
+};
+
+// The depth that keeps a frame of inFormat: 16 bits for formats of more
+// than 8 bits a sample (16u, 16f, 32f), else 8.
+PngDepth GetPngDepthFor(mvxmediatypes::PixelFormat inFormat);
+
+// Writes the frame as a PNG file of inDepth, sRGB-encoded as the frame is
+// (no gamma change). Any frame of a raster format is converted first, at the
+// best quality, to straight BGRA_4444_8u (8 bits) or BGRA_4444_16u (16 bits:
+// sample v of 0..65535 is stored as is, most significant byte first).
 // Statuses: kResult_PngWriteFailed, kResult_UnsupportedPixelFormat (the frame
 // cannot be converted), or success. Input contract: "inFrame != nullptr".
 PngStatus WritePngFile(const std::string& inPath, const QRT::InterfaceRef<MF::IVideoFrame>& inFrame,
-                       PngChannels inChannels = PngChannels::kRGBA);
+                       PngChannels inChannels = PngChannels::kRGBA,
+                       PngDepth inDepth = PngDepth::k8);
 
 // Reads a PNG file of any colour type and depth into a new frame of
 // BGRA_4444_8u, straight alpha (opaque when the file has none), square
-// pixels, progressive. On failure outFrame is emptied and the status is
-// kResult_PngCannotOpen, kResult_PngMalformed or
-// kResult_OutOfFrameMemory.
+// pixels, progressive. Samples are taken as stored, without gamma
+// conversion; a 16-bit sample v becomes (v * 255 + 32767) / 65535. On
+// failure outFrame is emptied, the status is kResult_PngCannotOpen,
+// kResult_PngMalformed or kResult_OutOfFrameMemory, and the message names
+// the file and the decoder's reason ("<path>: IDAT: CRC error").
 PngStatus ReadPngFile(const std::string& inPath, QRT::InterfaceRef<MF::IVideoFrame>& outFrame);
 
 } // namespace VF
