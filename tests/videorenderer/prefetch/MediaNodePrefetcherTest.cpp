@@ -113,24 +113,30 @@ TEST_F(MediaNodePrefetcherTest, NullKeyHandleStartsNothingAndTakesWhatTheSourceH
     }
 }
 
-// A failed queued read is the read's, not the starter's: every handle waiting
-// on its key stops waiting, without a frame, and nothing stays registered.
+// A failed queued read (or one that answers success without a frame) is the
+// read's, not the starter's: every handle waiting on its key stops waiting,
+// without a frame, and nothing stays registered.
 TEST_F(MediaNodePrefetcherTest, FailedReadEndsTheWaitOfEveryHandleOnItsKey)
 {
-    mSource->mFrameStatus = static_cast<QRT::Result>(0xA0100006u);
-    const Guid key = mSource->KeyFor(Ticks(6));
-    const auto gate = BlockVideoExecutor();
-    const auto [first, second] = StartTwo(mSource, 6);
-    EXPECT_TRUE(second->ContinueWaitingForPrefetch(0.0));
-    gate->Open();
-    Drain(mVideo);
-    for (const PrefetchRef& handle : {second, first})
+    mSource->mNewFrames = false;
+    for (const QRT::Result status : {static_cast<QRT::Result>(0xA0100006u), QRT::kResult_Success})
     {
-        EXPECT_FALSE(handle->ContinueWaitingForPrefetch(0.0));
-        EXPECT_FALSE(Taken(handle));
+        SCOPED_TRACE(status);
+        mSource->mFrameStatus = status;
+        const std::int64_t ticks = QRT::Failed(status) ? 6 : 7;
+        const auto gate = BlockVideoExecutor();
+        const auto [first, second] = StartTwo(mSource, ticks);
+        EXPECT_TRUE(second->ContinueWaitingForPrefetch(0.0));
+        gate->Open();
+        Drain(mVideo);
+        for (const PrefetchRef& handle : {second, first})
+        {
+            EXPECT_FALSE(handle->ContinueWaitingForPrefetch(0.0));
+            EXPECT_FALSE(Taken(handle));
+        }
+        EXPECT_EQ(GetMediaNodePrefetchReferenceCount(mSource->KeyFor(Ticks(ticks))), 0u);
     }
-    EXPECT_EQ(GetMediaNodePrefetchReferenceCount(key), 0u);
-    EXPECT_EQ(mSource->ReadTicks(), std::vector<std::int64_t>{6});
+    EXPECT_EQ(mSource->ReadTicks(), (std::vector<std::int64_t>{6, 7}));
 }
 
 TEST_F(MediaNodePrefetcherTest, AsyncReadIsStartedOnceTakenAndWithdrawnByTheLastCancelOrFailure)

@@ -54,7 +54,8 @@ struct SharedRead
     // True once the queued read's callback has run (after the frame, if any,
     // went into the cache).
     std::atomic<bool> mFinished{false};
-    // 0, or the negative status the queued read ended with.
+    // 0, or the negative status the queued read ended with (kResult_PrefetchIncomplete
+    // when it answered success without a frame).
     std::atomic<QRT::Result> mFailure{QRT::kResult_Success};
 
     void Finish(QRT::Result inStatus)
@@ -71,11 +72,21 @@ struct SharedRead
 
     // Queues the read on the video source prefetcher. The callback holds only
     // this shared state, never a handle, so that no handle is ever released by
-    // the prefetcher while it or this registry holds a lock.
+    // the prefetcher while it or this registry holds a lock. It runs after the
+    // cache insertion: a read that answers success but left no frame under the
+    // key has brought nothing, and ends as failed, or the handles waiting on
+    // the key would wait for it for ever.
     void Enqueue(const std::shared_ptr<SharedRead>& inSelf)
     {
-        EnqueueVideoSourcePrefetch(mTime, mSource, mRequest, mBinaryData, mColorProfile, mKey,
-                                   [inSelf](QRT::Result inStatus) { inSelf->Finish(inStatus); });
+        EnqueueVideoSourcePrefetch(
+            mTime, mSource, mRequest, mBinaryData, mColorProfile, mKey,
+            [inSelf](QRT::Result inStatus)
+            {
+                if (QRT::Succeeded(inStatus) &&
+                    !VF::SharedVideoFrameCache::RetrieveFromCache(inSelf->mKey))
+                    inStatus = kResult_PrefetchIncomplete;
+                inSelf->Finish(inStatus);
+            });
     }
 };
 
