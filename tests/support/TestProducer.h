@@ -72,10 +72,14 @@ public:
         return result;
     }
 
-    void GetFrameHash(QRT::Guid& outHash, const MF::FrameTime&,
+    void GetFrameHash(QRT::Guid& outHash, const MF::FrameTime& inTime,
                       const ML::CutlistRenderParams&) override
     {
         ++mHashCount;
+        {
+            std::lock_guard lock(mMutex);
+            mLastHashTime = inTime;
+        }
         outHash = mHash;
     }
 
@@ -83,6 +87,12 @@ public:
     {
         std::lock_guard lock(mMutex);
         return mLastParams;
+    }
+
+    MF::FrameTime LastHashTime()
+    {
+        std::lock_guard lock(mMutex);
+        return mLastHashTime;
     }
 
 private:
@@ -114,9 +124,10 @@ private:
         return QRT::kResult_Success;
     }
 
-    // Guards mLastParams.
+    // Guards mLastParams and mLastHashTime.
     std::mutex mMutex;
     ML::CutlistRenderParams mLastParams;
+    MF::FrameTime mLastHashTime;
 };
 
 } // namespace vrtest

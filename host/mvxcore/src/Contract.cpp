@@ -21,10 +21,11 @@ AssertHook sAssertHook;
 
 void DefaultAssertReport(const AssertFailure& inFailure)
 {
-    std::fprintf(stderr, "Assertion failed: %.*s (%.*s) at %.*s:%d\n",
+    std::fprintf(stderr, "Assertion failed: %.*s (%.*s) at %.*s:%d in %.*s\n",
                  static_cast<int>(inFailure.condition.size()), inFailure.condition.data(),
                  static_cast<int>(inFailure.message.size()), inFailure.message.data(),
-                 static_cast<int>(inFailure.file.size()), inFailure.file.data(), inFailure.line);
+                 static_cast<int>(inFailure.file.size()), inFailure.file.data(), inFailure.line,
+                 static_cast<int>(inFailure.function.size()), inFailure.function.data());
 }
 
 } // namespace
@@ -67,14 +68,14 @@ bool BreakAfterContractDialog(const ContractFailure& inFailure)
 }
 
 void BreakAfterAssertDialog(std::string_view inCondition, std::string_view inMessage,
-                            std::string_view inFile, int inLine)
+                            std::string_view inFile, int inLine, std::string_view inFunction)
 {
     AssertHook hook;
     {
         std::lock_guard lock(sHookMutex);
         hook = sAssertHook;
     }
-    const AssertFailure failure{inCondition, inMessage, inFile, inLine};
+    const AssertFailure failure{inCondition, inMessage, inFile, inLine, inFunction};
     if (hook)
         hook(failure);
     else

@@ -41,8 +41,8 @@ int AssertThenContinue(int inValue)
     return inValue + 1;
 }
 
-// Records every contract dialog (kind and line) and assertion report (texts
-// and line).
+// Records every contract dialog (kind and line) and assertion report (texts,
+// line and function).
 class ContractTest : public ::testing::Test
 {
 protected:
@@ -59,7 +59,8 @@ protected:
             {
                 mAsserts.push_back(std::string(inFailure.condition) + " / " +
                                    std::string(inFailure.message) + " / " +
-                                   std::to_string(inFailure.line));
+                                   std::to_string(inFailure.line) + " / " +
+                                   std::string(inFailure.function));
             });
     }
 
@@ -80,8 +81,9 @@ TEST_F(ContractTest, ViolationThrowsAContractErrorAndCallsTheDialogOnceAndAssert
     EXPECT_EQ(RequirePositive(7), 7);
     EXPECT_EQ(AssertThenContinue(3), 4);
     EXPECT_EQ(AssertThenContinue(12), 13);
-    EXPECT_EQ(mAsserts, std::vector<std::string>{"inValue < 10 / values stay below ten / " +
-                                                 std::to_string(sAssertLine)});
+    EXPECT_EQ(mAsserts,
+              std::vector<std::string>{"inValue < 10 / values stay below ten / " +
+                                       std::to_string(sAssertLine) + " / AssertThenContinue"});
     vrtest::ExpectInputContract([] { RequirePositive(-3); }, "inValue > 0");
     vrtest::ExpectOutputContract([] { ProduceEven(4); }, "result % 2 == 0");
     EXPECT_EQ(mContracts, (std::vector<std::pair<ContractKind, int>>{

@@ -63,7 +63,9 @@ protected:
             [this](const mvxcore::debug::AssertFailure& inFailure)
             {
                 std::lock_guard lock(mAssertMutex);
-                mAsserts.emplace_back(inFailure.condition);
+                mAsserts.emplace_back(std::string(inFailure.condition) + " | " +
+                                      std::string(inFailure.file) + " | " +
+                                      std::string(inFailure.function));
             });
     }
 
@@ -478,7 +480,10 @@ TEST_F(RenderFrameQueueTest, PrefetchOnlyRequestsEndWithTheirFrameOrTimeOutAfter
     EXPECT_EQ(mRecorder.Of(95).at(0).mKind, Delivery::kComplete);
     EXPECT_EQ(producer->mProduceCount.load(), 1);
     // Both hung handles are reported.
-    EXPECT_EQ(Asserts(), std::vector<std::string>(2, "prefetchCompleted || !prefetchTimeout"));
+    EXPECT_EQ(Asserts(),
+              std::vector<std::string>(2, "prefetchCompleted || !prefetchTimeout | "
+                                          "RenderFrameQueue | "
+                                          "ML::RenderFrameQueue::ProcessPrefetchRequests"));
     // The handle that asks for more time keeps its request waiting.
     EXPECT_GE(patient->mLastElapsed.load(), 15.0);
     EXPECT_EQ(Stats().mPrefetchWaiting, 1u);

@@ -201,26 +201,34 @@ TEST_F(RenderFrameRequestTest, CutlistChoiceSelectsGetterAndIsFetchedOnce)
                           "mCutlistChoice == 0 || mCutlistChoice == 1 || mCutlistChoice == 3");
 }
 
-TEST_F(RenderFrameRequestTest, CutlistKeyUsesProducerInNodeTimeAndBlackHashOutsideSegments)
+// The producer's hash is asked for the node's own time, the time the render
+// then produces at; where no producer can be had (no segment at the time, or a
+// failed lookup) the key is made from the black frame's hash.
+TEST_F(RenderFrameRequestTest, CutlistKeyUsesProducerInNodeTimeAndBlackHashWithoutProducer)
 {
     mProvider->mCutlists[0] = OneSegment(mNode, 1000, 5000, 100);
     auto settings = CutlistSettings(2);
     ML::RenderFrameRequest inside = MakeRequest(settings);
     inside.ComputeKey(true);
     EXPECT_EQ(inside.mKey, ExpectedKey(mProducer->mHash, {kBGRA}, false, 0, 0));
-    EXPECT_EQ(inside.mNodeTime, MF::FrameTime(TickTime::TicksToTime(2000 - 1000 + 100)));
+    const MF::FrameTime nodeTime(TickTime::TicksToTime(2000 - 1000 + 100));
+    EXPECT_EQ(mProducer->LastHashTime(), nodeTime);
+    EXPECT_EQ(inside.mNodeTime, nodeTime);
 
     settings.mTime = MF::FrameTime(TickTime::TicksToTime(9000)); // after the segment
-    ML::RenderFrameRequest outside = MakeRequest(settings);
-    outside.ComputeKey(true);
-    ML::CutlistRenderParams params;
-    outside.BuildRenderParams(true, params);
-    EXPECT_EQ(outside.mKey,
-              ExpectedKey(ML::CutlistRenderer::GetBlackFrameHash(params), {kBGRA}, false, 0, 0));
-
-    mProvider->mCutlists[0] = QRT::Allocated<FailingCutlist>::CreateInstance();
-    ML::RenderFrameRequest failing = MakeRequest(settings);
-    EXPECT_THROW(failing.ComputeKey(true), ML::RenderRequestException);
+    for (const bool failingLookup : {false, true})
+    {
+        SCOPED_TRACE(failingLookup ? "failed lookup" : "no segment");
+        if (failingLookup)
+            mProvider->mCutlists[0] = QRT::Allocated<FailingCutlist>::CreateInstance();
+        ML::RenderFrameRequest outside = MakeRequest(settings);
+        outside.ComputeKey(true);
+        ML::CutlistRenderParams params;
+        outside.BuildRenderParams(true, params);
+        EXPECT_EQ(outside.mKey, ExpectedKey(ML::CutlistRenderer::GetBlackFrameHash(params), {kBGRA},
+                                            false, 0, 0));
+        EXPECT_FALSE(outside.mProducer);
+    }
 }
 
 TEST_F(RenderFrameRequestTest, OnlyNormalPriorityStartsTheNodesPrefetchesOnce)

@@ -1,5 +1,6 @@
 #include "prefetch/MediaNodePrefetcher.h"
 
+#include "ML/RenderStatus.h"
 #include "PrefetchFixture.h"
 
 #include <random>
@@ -78,28 +79,64 @@ TEST_F(MediaNodePrefetcherTest, FrameCachedWhileTheReadIsQueuedWithdrawsTheRead)
     EXPECT_TRUE(mSource->ReadTicks().empty());
 }
 
-TEST_F(MediaNodePrefetcherTest, NullKeyHandlesReadForThemselvesWithoutCaching)
+// A null key starts nothing and registers nothing, so it keeps nobody waiting.
+// Asked for its frame, the handle asks the source for what it holds: a frame
+// got so is handed out, uncached, with the pending answer, and is the kept
+// frame of every later query, which answers 0.
+TEST_F(MediaNodePrefetcherTest, NullKeyHandleStartsNothingAndTakesWhatTheSourceHolds)
 {
+    mSource->mNullKeys = true;
     for (const bool holds : {true, false})
     {
-        SCOPED_TRACE(holds ? "source holds its reads" : "source keeps nothing");
-        mSource->mNullKeys = true;
-        mSource->mHoldsReadFrames = holds;
-        const std::uint64_t insertions = VF::SharedVideoFrameCache::GetStatistics().mInsertions;
-        const auto gate = BlockVideoExecutor();
+        SCOPED_TRACE(holds ? "source holds the frame" : "source holds nothing");
+        const std::int64_t ticks = holds ? 11 : 12;
+        if (holds)
+            mSource->CompleteRead(Ticks(ticks));
         const std::size_t readsBefore = mSource->ReadTicks().size();
-        const auto [first, second] = StartTwo(mSource, holds ? 11 : 12);
-        // Without a key nothing is shared: each handle queued a read of its own.
-        EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 2u);
-        EXPECT_TRUE(first->ContinueWaitingForPrefetch(0.0));
-        gate->Open();
+        const std::uint64_t insertions = VF::SharedVideoFrameCache::GetStatistics().mInsertions;
+        const PrefetchRef handle = Make(ticks);
+        EXPECT_EQ(handle->InitiatePrefetch(), QRT::kResult_Success);
+        EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 0u);
+        EXPECT_FALSE(handle->ContinueWaitingForPrefetch(0.0));
         Drain(mVideo);
-        // The handle takes what the source holds, without the cache.
-        EXPECT_FALSE(first->ContinueWaitingForPrefetch(0.0));
-        EXPECT_EQ(Taken(first) != nullptr, holds);
-        EXPECT_EQ(mSource->ReadTicks().size() - readsBefore, 2u);
+        EXPECT_EQ(mSource->ReadTicks().size(), readsBefore);
+
+        FrameRef first;
+        EXPECT_EQ(handle->GetPrefetchedFrame(first), kResult_PrefetchIncomplete);
+        EXPECT_EQ(first != nullptr, holds);
+        FrameRef again;
+        EXPECT_EQ(handle->GetPrefetchedFrame(again),
+                  holds ? QRT::kResult_Success : kResult_PrefetchIncomplete);
+        EXPECT_EQ(again.Get(), first.Get());
+        EXPECT_FALSE(handle->ContinueWaitingForPrefetch(0.0));
         EXPECT_EQ(VF::SharedVideoFrameCache::GetStatistics().mInsertions, insertions);
     }
+}
+
+// A failed queued read (or one that answers success without a frame) is the
+// read's, not the starter's: every handle waiting on its key stops waiting,
+// without a frame, and nothing stays registered.
+TEST_F(MediaNodePrefetcherTest, FailedReadEndsTheWaitOfEveryHandleOnItsKey)
+{
+    mSource->mNewFrames = false;
+    for (const QRT::Result status : {static_cast<QRT::Result>(0xA0100006u), QRT::kResult_Success})
+    {
+        SCOPED_TRACE(status);
+        mSource->mFrameStatus = status;
+        const std::int64_t ticks = QRT::Failed(status) ? 6 : 7;
+        const auto gate = BlockVideoExecutor();
+        const auto [first, second] = StartTwo(mSource, ticks);
+        EXPECT_TRUE(second->ContinueWaitingForPrefetch(0.0));
+        gate->Open();
+        Drain(mVideo);
+        for (const PrefetchRef& handle : {second, first})
+        {
+            EXPECT_FALSE(handle->ContinueWaitingForPrefetch(0.0));
+            EXPECT_FALSE(Taken(handle));
+        }
+        EXPECT_EQ(GetMediaNodePrefetchReferenceCount(mSource->KeyFor(Ticks(ticks))), 0u);
+    }
+    EXPECT_EQ(mSource->ReadTicks(), (std::vector<std::int64_t>{6, 7}));
 }
 
 TEST_F(MediaNodePrefetcherTest, AsyncReadIsStartedOnceTakenAndWithdrawnByTheLastCancelOrFailure)

@@ -85,22 +85,48 @@ TEST_F(VideoSourcePrefetcherTest, CancelCallsTheCallbackOnceAndItsTaskRunsTheNex
     EXPECT_EQ(otherLog.Get(), Statuses{0});
 }
 
-TEST_F(VideoSourcePrefetcherTest, FlushDropsQueuedJobsWithoutCallbacksAndLaterJobsAreCancelled)
+// Flush stops each executor (what is queued is destroyed unrun) and then waits
+// for what is in flight; reads enqueued afterwards are cancelled at once.
+TEST_F(VideoSourcePrefetcherTest, FlushDropsQueuedWorkWaitsForWorkInFlightAndCancelsLaterJobs)
 {
-    const auto gate = BlockVideoExecutor();
+    std::mutex eventsMutex; // guards events
+    std::vector<std::string> events;
+    const auto note = [&](const char* inEvent)
+    {
+        std::lock_guard lock(eventsMutex);
+        events.emplace_back(inEvent);
+    };
+    const auto started = std::make_shared<Gate>();
+    const auto gate = std::make_shared<Gate>();
+    ASSERT_TRUE(mVideo->Post(
+        [started, gate, note]
+        {
+            started->Open();
+            gate->Wait();
+            note("task in flight ended");
+        }));
+    started->Wait();
     Enqueue(1, mLog);
     Enqueue(2, mLog);
-    // Flush waits for the running (gate) task, so it runs on a thread of its own.
-    std::thread flusher([] { FlushVideoSourcePrefetcher(); });
-    while (GetQueuedVideoSourcePrefetchCount() != 0)
+    const auto token = std::make_shared<int>(0);
+    ASSERT_TRUE(mVideo->Post([token, note] { note("queued task ran"); }));
+    // Flush waits for the task in flight, so it runs on a thread of its own.
+    std::thread flusher(
+        [note]
+        {
+            FlushVideoSourcePrefetcher();
+            note("flush returned");
+        });
+    while (!mVideo->IsShutDown())
         std::this_thread::yield();
     gate->Open();
     flusher.join();
+    EXPECT_EQ(events, (std::vector<std::string>{"task in flight ended", "flush returned"}));
+    EXPECT_EQ(token.use_count(), 1);
     EXPECT_TRUE(mLog.Get().empty());
     EXPECT_TRUE(mSource->ReadTicks().empty());
-    EXPECT_TRUE(mVideo->IsShutDown() && mImage->IsShutDown());
+    EXPECT_TRUE(mImage->IsShutDown());
 
-    // Enqueued after the flush: cancelled at once instead of waiting forever.
     Enqueue(3, mLog);
     EXPECT_EQ(mLog.Get(), Statuses{kResult_Cancelled});
     EXPECT_EQ(GetQueuedVideoSourcePrefetchCount(), 0u);

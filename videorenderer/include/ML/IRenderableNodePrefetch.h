@@ -36,7 +36,9 @@ public:
 
     // The result query: 0 when the prefetch is over (outFrame holds the frame,
     // or is empty when the read failed or produced nothing), or the pending
-    // status QRT::kResult_NotFound (0xA00F0001) while it is still running.
+    // status QRT::kResult_NotFound (0xA00F0001) while it is still running. A
+    // handle without a frame key may hand out a frame with the pending status;
+    // it keeps that frame and answers 0 with it on the next query.
     virtual QRT::Result GetPrefetchedFrame(QRT::InterfaceRef<MF::IVideoFrame>& outFrame) = 0;
 
     // Gives up the read when no other handle shares it. Answers 0.

@@ -157,7 +157,9 @@ public:
 
     // Sets mKey ("Hash Including Render Params"): the content hash of the
     // frame mixed with the render parameters that change the picture; nil
-    // when there is nothing to hash. Resolves and keeps mProducer.
+    // when there is nothing to hash. Resolves and keeps mProducer, and moves
+    // mNodeTime into the producer's node time; a cutlist without a producer
+    // at the time (or whose lookup fails) gives the black frame's hash.
     void ComputeKey(bool inFlag);
 
     // Collects the request's prefetch handles into mActivePrefetches and

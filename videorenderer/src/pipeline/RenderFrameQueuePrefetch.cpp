@@ -100,7 +100,7 @@ void RenderFrameQueueImpl::ProcessPrefetchRequests(bool inTimedKind)
             mvxcore::debug::BreakAfterAssertDialog(
                 "prefetchCompleted || !prefetchTimeout",
                 "We should pretty much never timeout on a prefetch request.", "RenderFrameQueue",
-                __LINE__);
+                __LINE__, "ML::RenderFrameQueue::ProcessPrefetchRequests");
         if (!complete && !timedOut)
             waiting.push_back(std::move(entry));
         else if (entry.mRequest.mPrefetchOnly)

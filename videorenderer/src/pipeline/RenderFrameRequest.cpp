@@ -259,20 +259,20 @@ void RenderFrameRequest::ComputeKey(bool inFlag)
     }
     else if (cutlist)
     {
+        // The lookup answers the producer and the frame time in its node's own
+        // time; that time becomes mNodeTime, so the hash is asked for the same
+        // time the render later produces (and the cutlist renderer caches) it
+        // at. Where no producer can be had, a failed lookup included, the
+        // request stands for the black frame of its parameters.
         QRT::InterfaceRef<IRenderableNodeProducer> producer;
         MF::FrameTime localTime;
-        const QRT::Result status =
-            CutlistRenderer::GetProducerForCutlist(cutlist, params, producer, localTime);
-        // A tree that cannot be resolved for the parameters cannot be
-        // rendered either: the resolver's status is the request's failure.
-        if (QRT::Failed(status))
-            throw RenderRequestException(status);
-        if (producer)
+        if (QRT::Succeeded(
+                CutlistRenderer::GetProducerForCutlist(cutlist, params, producer, localTime)) &&
+            producer)
         {
-            producer->GetFrameHash(contentHash, localTime, params);
-            mProducer = producer;
-            // The producer works in its node's own time from now on.
             mNodeTime = localTime;
+            producer->GetFrameHash(contentHash, mNodeTime, params);
+            mProducer = producer;
         }
         if (contentHash.IsNil())
             contentHash = CutlistRenderer::GetBlackFrameHash(params);

@@ -31,10 +31,13 @@ constexpr const char* kAsyncTimeoutMessage =
 std::atomic<bool> sTimeoutAssertionSilenced{false};
 
 // One read of one frame, shared by every handle that wants that frame (equal
-// frame keys); a handle with the null key has one of its own. The read's
+// frame keys); a handle with the null key starts no read at all. The read's
 // arguments and the interface it was started through are guarded by the
 // registry lock; the outcome of a queued read is written by its completion
-// callback on an executor thread, without any lock.
+// callback on an executor thread, without any lock. A failure is the read's,
+// so it reaches every handle waiting on the key, not only the one that
+// started the read: the others would otherwise wait for a frame that no read
+// is bringing any more.
 struct SharedRead
 {
     // The arguments of the read, as the handle that started it gave them.
@@ -51,7 +54,8 @@ struct SharedRead
     // True once the queued read's callback has run (after the frame, if any,
     // went into the cache).
     std::atomic<bool> mFinished{false};
-    // 0, or the negative status the queued read ended with.
+    // 0, or the negative status the queued read ended with (kResult_PrefetchIncomplete
+    // when it answered success without a frame).
     std::atomic<QRT::Result> mFailure{QRT::kResult_Success};
 
     void Finish(QRT::Result inStatus)
@@ -68,11 +72,21 @@ struct SharedRead
 
     // Queues the read on the video source prefetcher. The callback holds only
     // this shared state, never a handle, so that no handle is ever released by
-    // the prefetcher while it or this registry holds a lock.
+    // the prefetcher while it or this registry holds a lock. It runs after the
+    // cache insertion: a read that answers success but left no frame under the
+    // key has brought nothing, and ends as failed, or the handles waiting on
+    // the key would wait for it for ever.
     void Enqueue(const std::shared_ptr<SharedRead>& inSelf)
     {
-        EnqueueVideoSourcePrefetch(mTime, mSource, mRequest, mBinaryData, mColorProfile, mKey,
-                                   [inSelf](QRT::Result inStatus) { inSelf->Finish(inStatus); });
+        EnqueueVideoSourcePrefetch(
+            mTime, mSource, mRequest, mBinaryData, mColorProfile, mKey,
+            [inSelf](QRT::Result inStatus)
+            {
+                if (QRT::Succeeded(inStatus) &&
+                    !VF::SharedVideoFrameCache::RetrieveFromCache(inSelf->mKey))
+                    inStatus = kResult_PrefetchIncomplete;
+                inSelf->Finish(inStatus);
+            });
     }
 };
 
@@ -165,27 +179,22 @@ public:
         if (mAsync && !mAsync->IsAsyncEnabled())
             mAsync.Reset();
 
+        // Without a key there is nothing to share, cache or wait for: the
+        // handle starts nothing and is not registered. Asked for its frame, it
+        // asks the source for what the source holds.
+        if (mKey.IsNil())
+            return QRT::kResult_Success;
+
         QRT::Result status = QRT::kResult_Success;
         try
         {
             PrefetchRegistry& registry = GetRegistry();
             QRT::CriticalSectionLock lock(registry.mLock, "InitiatePrefetch");
-            bool start = true;
-            if (mKey.IsNil())
-            {
-                // Without a key the read cannot be shared: this handle reads
-                // for itself.
-                mRead = MakeRead();
-            }
-            else
-            {
-                auto [entry, inserted] = registry.mKeys.try_emplace(mKey);
-                start = inserted;
-                if (inserted)
-                    entry->second.mRead = MakeRead();
-                ++entry->second.mCount;
-                mRead = entry->second.mRead;
-            }
+            auto [entry, start] = registry.mKeys.try_emplace(mKey);
+            if (start)
+                entry->second.mRead = MakeRead();
+            ++entry->second.mCount;
+            mRead = entry->second.mRead;
             mRegistered = true;
 
             if (start)
@@ -195,8 +204,7 @@ public:
                     status = mAsync->StartAsyncRead(mTime, mRequest, mBinaryData, mColorProfile);
                     if (QRT::Failed(status))
                     {
-                        if (!mKey.IsNil())
-                            ReleaseKeyLocked(registry.mKeys, mKey);
+                        ReleaseKeyLocked(registry.mKeys, mKey);
                         mRegistered = false;
                         mRead.reset();
                     }
@@ -243,10 +251,7 @@ public:
         const std::shared_ptr<SharedRead> read = mRead;
         guard.unlock();
 
-        // Read the outcome before looking for the frame: the read's callback
-        // runs after its cache insertion, so a finished read whose frame is
-        // not found below has really produced nothing this handle can take.
-        const bool finished = read && read->mFinished.load(std::memory_order_acquire);
+        const bool failed = read && QRT::Failed(read->mFailure.load());
         FrameRef frame;
         if (!key.IsNil())
             frame = VF::SharedVideoFrameCache::RetrieveFromCache(key);
@@ -265,7 +270,10 @@ public:
                 mFrame = frame;
             outFrame = mFrame;
         }
-        if (frame || finished || !mSource)
+        // A null-key handle that got a frame keeps it and still answers
+        // pending this time; the next query hands the kept frame out and
+        // answers 0.
+        if ((frame && !key.IsNil()) || failed || !mSource)
         {
             // Over for good: later queries answer the same without asking again.
             mOver = true;
@@ -282,8 +290,7 @@ public:
         {
             PrefetchRegistry& registry = GetRegistry();
             QRT::CriticalSectionLock lock(registry.mLock, "CancelPrefetch");
-            const bool last = mKey.IsNil() || ReleaseKeyLocked(registry.mKeys, mKey);
-            if (last && mRead)
+            if (ReleaseKeyLocked(registry.mKeys, mKey) && mRead)
             {
                 if (mRead->mAsync)
                 {
@@ -291,7 +298,7 @@ public:
                                                    mRead->mBinaryData, mRead->mColorProfile);
                     mRead->mAsync.Reset();
                 }
-                else if (!mKey.IsNil())
+                else
                 {
                     CancelVideoSourcePrefetch(mRead->mSource, mKey);
                 }
@@ -373,7 +380,7 @@ public:
         }
         if (switched && !sTimeoutAssertionSilenced.load())
             mvxcore::debug::BreakAfterAssertDialog("false", kAsyncTimeoutMessage, __FILE__,
-                                                   __LINE__);
+                                                   __LINE__, __func__);
         return true;
     }
 
@@ -401,8 +408,8 @@ private:
         {
             PrefetchRegistry& registry = GetRegistry();
             QRT::CriticalSectionLock lock(registry.mLock, "UnregisterPrefetch");
-            if (!mKey.IsNil() && ReleaseKeyLocked(registry.mKeys, mKey) && mRead &&
-                !mRead->mAsync && !mRead->mFinished.load(std::memory_order_acquire))
+            if (ReleaseKeyLocked(registry.mKeys, mKey) && mRead && !mRead->mAsync &&
+                !mRead->mFinished.load(std::memory_order_acquire))
                 CancelVideoSourcePrefetch(mRead->mSource, mKey);
             mRegistered = false;
         }
@@ -417,8 +424,7 @@ private:
             return;
         PrefetchRegistry& registry = GetRegistry();
         QRT::CriticalSectionLock lock(registry.mLock, "UnregisterPrefetch");
-        if (!mKey.IsNil())
-            ReleaseKeyLocked(registry.mKeys, mKey);
+        ReleaseKeyLocked(registry.mKeys, mKey);
         mRegistered = false;
         mRead.reset();
     }

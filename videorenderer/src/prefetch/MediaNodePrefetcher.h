@@ -6,7 +6,9 @@
 //
 // Handles that want the same frame (equal frame keys from the source's frame-key
 // query) share one read: a module-wide table counts the handles per key and only
-// the first one starts the read. Sources that answer the asynchronous-read
+// the first one starts the read. A handle whose key is null starts nothing and
+// is not registered: it keeps nobody waiting, and asked for its frame it asks
+// the source for what the source holds. Sources that answer the asynchronous-read
 // interface and report it enabled are asked to start, wait for and cancel the
 // read themselves; all others are read through the video source prefetcher
 // (VideoSourcePrefetcher.h). Frames travel through the shared video frame

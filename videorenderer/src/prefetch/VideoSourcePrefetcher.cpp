@@ -227,13 +227,21 @@ void FlushVideoSourcePrefetcher()
     // reference to objects whose destruction takes other prefetch locks.
     dropped.clear();
 
+    // A prefetch executor is shut down by two operations, stop then wait, made
+    // on the video executor and then on the image executor. On our executors,
+    // stop is BeginShutdown followed by DiscardPendingTasks (no queued read
+    // starts any more, and the queued tasks are destroyed unrun), and wait is
+    // WaitForRunningTasks (it returns once no read of the executor is in
+    // flight).
     for (ExecutorRef executor :
          {LoadExecutor(sVideoSourcePrefetcherQueue), LoadExecutor(sImageSourcePrefetcherQueue)})
     {
         if (!executor)
             continue;
+        // Stop.
         executor->BeginShutdown();
         executor->DiscardPendingTasks();
+        // Wait.
         executor->WaitForRunningTasks();
     }
 }

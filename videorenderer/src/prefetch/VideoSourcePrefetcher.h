@@ -64,9 +64,10 @@ void CancelVideoSourcePrefetch(const QRT::InterfaceRef<BE::Deprecated::IVideoSou
 
 // Module shutdown: destroys every queued read without calling its callback,
 // then shuts down ML::sVideoSourcePrefetcherQueue and then
-// ML::sImageSourcePrefetcherQueue (BeginShutdown, DiscardPendingTasks,
-// WaitForRunningTasks on each). The executor pointers are left as they are;
-// ML::Foundation::StartUp replaces executors that were shut down.
+// ML::sImageSourcePrefetcherQueue: neither runs a queued task any more, and
+// each is waited for until its read in flight, if any, is over. The executor
+// pointers are left as they are; ML::Foundation::StartUp replaces executors
+// that were shut down.
 void FlushVideoSourcePrefetcher();
 
 // The number of reads queued and not yet taken by a task (all sources).

@@ -18,7 +18,7 @@ void ReportTaskFailure(std::string_view inMessage) noexcept
     try
     {
         mvxcore::debug::BreakAfterAssertDialog("executor task did not throw", inMessage, __FILE__,
-                                               __LINE__);
+                                               __LINE__, __func__);
     }
     catch (...)
     {

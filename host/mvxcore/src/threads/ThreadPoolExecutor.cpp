@@ -167,7 +167,7 @@ private:
                 mvxcore::debug::BreakAfterAssertDialog(
                     "worker thread started",
                     std::string("An executor could not start a worker thread: ") + inError.what(),
-                    __FILE__, __LINE__);
+                    __FILE__, __LINE__, __func__);
                 return;
             }
         }

@@ -12,8 +12,9 @@
 // (output) and the fixed "$$$/..." messages below. The exception reaches the
 // caller; nothing is logged and swallowed.
 //
-// Non-fatal assertions (MVX_ASSERT) report through BreakAfterAssertDialog and
-// let processing continue.
+// Non-fatal assertions (MVX_ASSERT) report through BreakAfterAssertDialog, with
+// the condition, the message, the file, the line and the function that checked,
+// and let processing continue.
 //
 // Hooks may be replaced at any time from any thread; they are called on the
 // thread whose check failed.
@@ -54,6 +55,8 @@ struct AssertFailure
     std::string_view message;
     std::string_view file;
     int line;
+    // The function that checked, as its caller names it (empty when unnamed).
+    std::string_view function;
 };
 
 // The contract dialog. Answers true when the user asked to break into the
@@ -71,8 +74,9 @@ bool BreakAfterContractDialog(const ContractFailure& inFailure);
 
 // Reports a failed non-fatal assertion and returns; breaks into an attached
 // debugger only when MVX_BREAK_ON_ASSERT=1 is set in the environment.
+// inFunction names the checking function ("ML::RenderFrameQueue::ProcessPrefetchRequests").
 void BreakAfterAssertDialog(std::string_view inCondition, std::string_view inMessage,
-                            std::string_view inFile, int inLine);
+                            std::string_view inFile, int inLine, std::string_view inFunction = {});
 
 // True when a debugger is tracing this process.
 bool IsDebuggerAttached();
@@ -104,5 +108,6 @@ bool IsDebuggerAttached();
     do                                                                                             \
     {                                                                                              \
         if (!(cond)) [[unlikely]]                                                                  \
-            ::mvxcore::debug::BreakAfterAssertDialog(#cond, message, __FILE__, __LINE__);          \
+            ::mvxcore::debug::BreakAfterAssertDialog(#cond, message, __FILE__, __LINE__,           \
+                                                     __func__);                                    \
     } while (false)
