@@ -209,7 +209,7 @@ private:
             "--frames", "--start",   "--count", "--size",           "--par", "--format",
             "--field",  "--quality", "--rate",  "--jobs",           "-o",    "--output-dir",
             "--chroma", "--scale",   "--speed", "--remove-pulldown"};
-        if (!kValued.contains(name))
+        if (!kValued.contains(name) && name != "--memory")
             return Fail("unknown option " + Quoted(inArgument) + " (see vrender --help)");
         const std::optional<std::string_view> value = TakeValue(name, inlineValue);
         if (!value)
@@ -351,6 +351,12 @@ private:
                             std::to_string(kMaxJobs));
             options.mJobs = static_cast<std::uint32_t>(*jobs);
         }
+        else if (name == "--memory")
+        {
+            options.mMemoryBudget = ParseByteSize(*value);
+            if (!options.mMemoryBudget || *options.mMemoryBudget == 0)
+                return Fail(prefix + Quoted(*value) + " is not a memory size, e.g. 512M or 4G");
+        }
         else if (name == "--chroma")
         {
             if (*value == "420")
@@ -424,6 +430,19 @@ private:
 };
 
 } // namespace
+
+std::optional<std::uint64_t> ParseByteSize(std::string_view inText)
+{
+    static constexpr std::string_view kSuffixes = "KMGT";
+    const std::size_t suffix =
+        inText.empty() ? std::string_view::npos : kSuffixes.find(inText.back());
+    const std::optional<std::uint64_t> number = ParseUnsigned(
+        suffix == std::string_view::npos ? inText : inText.substr(0, inText.size() - 1));
+    const unsigned shift = suffix == std::string_view::npos ? 0 : 10 * (unsigned(suffix) + 1);
+    if (!number || *number > (UINT64_MAX >> shift))
+        return std::nullopt;
+    return *number << shift;
+}
 
 std::optional<std::int64_t> ParseCount(std::string_view inText)
 {
@@ -631,6 +650,9 @@ Options:
   --output-dir DIR    PNG files DIR/frame_00000.png, ...
   --chroma C          Y4M chroma: 420 (default) or 444
   -j, --jobs N        frames in flight, 1 to 64 (default: twice the cores)
+  --memory SIZE       memory the frames in flight may take, e.g. 512M or 4G
+                      (default: half the physical memory); fewer frames are
+                      kept in flight when they need more
   -q, --quiet         no progress bar
   -h, --help          this text
 
@@ -648,7 +670,8 @@ Filters, stacked on the source in this order:
   --speed S                 re-time by S (0.5 slow motion, -1 reverse) with
                             frame mixing, or frame blending with --frame-blend
 
-Ctrl-C cancels the frames in flight and stops cleanly.
+Ctrl-C or SIGTERM cancels the frames in flight and stops within a second,
+leaving only complete files (exit status 130 or 143).
 )";
 }
 
