@@ -1,6 +1,7 @@
 // Planning a render: what comes from the source, what the options override,
 // and the ranges that are refused.
 
+#include "MF/TimeTransform.h"
 #include "RenderJob.h"
 
 #include <gtest/gtest.h>
@@ -22,13 +23,29 @@ vrender::SourceFacts Clip()
     return facts;
 }
 
+// A machine of inCores with memory to spare.
+vrender::HostFacts Host(unsigned inCores = 1)
+{
+    return {inCores, std::uint64_t{1} << 40};
+}
+
 vrender::RenderPlan Plan(const vrender::RenderOptions& inOptions,
                          const vrender::SourceFacts& inFacts, unsigned inCores = 1)
 {
     vrender::RenderPlan plan;
     std::string error;
-    EXPECT_TRUE(vrender::PlanRender(inOptions, inFacts, inCores, plan, error)) << error;
+    EXPECT_TRUE(vrender::PlanRender(inOptions, inFacts, Host(inCores), plan, error)) << error;
     return plan;
+}
+
+// The error of a plan that must be refused.
+std::string Refusal(const vrender::RenderOptions& inOptions, const vrender::SourceFacts& inFacts,
+                    const vrender::HostFacts& inHost = Host())
+{
+    vrender::RenderPlan plan;
+    std::string error;
+    EXPECT_FALSE(vrender::PlanRender(inOptions, inFacts, inHost, plan, error));
+    return error;
 }
 
 // The first frame, count, size, aspect, field order and jobs of inPlan.
@@ -76,14 +93,14 @@ TEST_F(PlanRenderTest, OptionsOverrideTheSource)
 TEST_F(PlanRenderTest, RangesBeyondTheMediaAreRefused)
 {
     vrender::RenderOptions options;
-    vrender::RenderPlan plan;
-    std::string error;
     std::tie(options.mStart, options.mCount) = std::pair(90, 31);
-    EXPECT_FALSE(vrender::PlanRender(options, Clip(), 2, plan, error));
-    EXPECT_EQ(error, "frames 90 to 120: the media has 100 frames (0 to 99)");
+    EXPECT_EQ(Refusal(options, Clip()), "frames 90 to 120: the media has 100 frames (0 to 99)");
     std::tie(options.mStart, options.mCount) = std::pair(100, std::nullopt);
-    EXPECT_FALSE(vrender::PlanRender(options, Clip(), 2, plan, error));
-    EXPECT_EQ(error, "--start 100: the media has 100 frames (0 to 99)");
+    EXPECT_EQ(Refusal(options, Clip()), "--start 100: the media has 100 frames (0 to 99)");
+    options.mStart = 50;
+    options.mFilters.mSpeed = -2;
+    EXPECT_EQ(Refusal(options, Clip()),
+              "--start 50: the media has 50 frames (0 to 49) at speed -2");
 }
 
 TEST_F(PlanRenderTest, EndlessAndStillMedia)
@@ -106,6 +123,77 @@ TEST_F(PlanRenderTest, EndlessAndStillMedia)
     plan = Plan(options, still);
     EXPECT_EQ(std::pair(plan.mCount, plan.mStream.mFrameRate),
               std::pair(std::int64_t{12}, mt::kFrameRate_Video50));
+}
+
+// A speed plays the clip in as many frames as have media times inside it;
+// reverse speeds start at the last frame, or later in slow motion, and end
+// on the first.
+TEST_F(PlanRenderTest, SpeedsCoverTheWholeClip)
+{
+    const std::int64_t frame = mt::kFrameRate_Video25.GetTicksPerFrame();
+    const struct
+    {
+        double mSpeed;
+        std::int64_t mCount;
+        std::int64_t mStartTicks;
+    } cases[] = {{1, 100, 0},
+                 {2, 50, 0},
+                 {3, 34, 0},
+                 {0.5, 200, 0},
+                 {-1, 100, 99 * frame},
+                 {-2, 50, 99 * frame},
+                 {-0.5, 200, 99 * frame + frame / 2}};
+    for (const auto& c : cases)
+    {
+        SCOPED_TRACE(c.mSpeed);
+        vrender::RenderOptions options;
+        options.mFilters.mSpeed = c.mSpeed;
+        const vrender::RenderPlan plan = Plan(options, Clip());
+        EXPECT_EQ(std::pair(plan.mCount, plan.mMediaStart.GetTicks()),
+                  std::pair(c.mCount, c.mStartTicks));
+        const auto media = MF::CreateTimeTransform(c.mSpeed, mt::kTime_Zero, plan.mMediaStart);
+        const auto at = [&](std::int64_t inFrame)
+        { return media->Transform(mt::TickTime::FromFrame(inFrame, mt::kFrameRate_Video25)); };
+        EXPECT_GE(std::min(at(0), at(plan.mCount - 1)), mt::kTime_Zero);
+        EXPECT_LT(std::max(at(0), at(plan.mCount - 1)), Clip().mDuration);
+    }
+    // Endless media plays its default range backwards down to time zero.
+    vrender::SourceFacts pattern = Clip();
+    pattern.mDuration = mt::kTime_Max;
+    vrender::RenderOptions reverse;
+    reverse.mFilters.mSpeed = -2;
+    EXPECT_EQ(Plan(reverse, pattern).mMediaStart,
+              mt::TickTime::FromFrame(2 * (vrender::kDefaultEndlessFrameCount - 1),
+                                      mt::kFrameRate_Video25));
+}
+
+// The frames in flight are as many as fit the memory budget; a frame that
+// does not fit alone is refused.
+TEST_F(PlanRenderTest, MemoryBoundsTheFramesInFlight)
+{
+    vrender::RenderOptions options;
+    const std::uint64_t frameBytes = Plan(options, Clip()).mFrameBytes;
+    vrender::RenderOptions wide = options;
+    wide.mPixelFormat = mt::kPixelFormat_BGRA_4444_32f;
+    vrender::RenderOptions filtered = options;
+    filtered.mFilters.mDeinterlace = true;
+    EXPECT_GT(Plan(wide, Clip()).mFrameBytes, frameBytes);
+    EXPECT_GT(Plan(filtered, Clip()).mFrameBytes, frameBytes);
+    EXPECT_GE(frameBytes, std::uint64_t{640} * 360 * 4 * 2) << "a source and an output frame";
+
+    // Half the physical memory unless --memory says otherwise.
+    EXPECT_EQ(Plan(options, Clip(), 8).mJobs, 16u);
+    vrender::RenderPlan plan;
+    std::string error;
+    ASSERT_TRUE(vrender::PlanRender(options, Clip(), {8, 6 * frameBytes}, plan, error));
+    EXPECT_EQ(plan.mJobs, 3u);
+    options.mMemoryBudget = 2 * frameBytes;
+    EXPECT_EQ(Plan(options, Clip(), 8).mJobs, 2u);
+    options.mMemoryBudget = frameBytes - 1;
+    EXPECT_EQ(Refusal(options, Clip()).rfind("a 640x360 frame needs about ", 0), 0u);
+    options.mMemoryBudget.reset();
+    EXPECT_NE(Refusal(options, Clip(), {8, frameBytes}).find("(half the physical memory; --memory"),
+              std::string::npos);
 }
 
 } // namespace
