@@ -10,8 +10,9 @@
 // and flushes every stream, so that what remains on disk is complete:
 // committed frames under their final names and Y4M files that end after
 // their last committed frame (stdio writes a frame under the stream's lock,
-// which the flush waits for). Only streams on regular files are flushed: a
-// pipe whose reader stalls would hold the flush for good.
+// which the flush waits for and then keeps, so that no later frame starts).
+// Only streams on regular files are flushed: a pipe whose reader stalls
+// would hold the flush for good.
 //
 // One process-wide instance, never destroyed (a forced exit may come while
 // static objects are being torn down). All operations take one mutex.
@@ -69,7 +70,8 @@ public:
     }
 
     // Flushes the streams and removes the temporary files; no file is
-    // registered afterwards. A writer between registering a file and
+    // registered afterwards and the streams stay locked, so the caller ends
+    // the process next. A writer between registering a file and
     // creating it may still create it, so the files are removed twice, the
     // second time after the writers have had a moment to get there.
     void CleanUpForExit()
@@ -78,7 +80,10 @@ public:
             std::lock_guard lock(mMutex);
             mEnding = true;
             for (std::FILE* stream : mStreams)
-                std::fflush(stream);
+            {
+                flockfile(stream);
+                fflush_unlocked(stream);
+            }
             RemoveFilesLocked();
         }
         std::this_thread::sleep_for(kLateCreation);
