@@ -27,10 +27,12 @@
 #include <cerrno>
 #include <csignal>
 #include <cstdio>
+#include <cstdlib>
 #include <ctime>
 #include <exception>
 #include <string>
 #include <string_view>
+#include <sys/syscall.h>
 #include <thread>
 #include <unistd.h>
 #include <vector>
@@ -93,7 +95,11 @@ void ReportCancel(std::int64_t inFramesWritten)
         continue;
     vrender::PendingOutput::Get().CleanUpForExit();
     ReportCancel(sFramesWritten.load());
-    _exit(ExitCodeForSignal(signal));
+    // The system call itself, not _exit: tools that intercept _exit (the
+    // thread sanitizer) flush stdio first, which waits for good on a stream
+    // whose write is blocked on a stalled pipe.
+    syscall(SYS_exit_group, ExitCodeForSignal(signal));
+    std::abort();
 }
 
 void InstallSignalHandlers()
