@@ -1,6 +1,7 @@
 #include "FrameWriters.h"
 
 #include "Options.h"
+#include "PendingOutput.h"
 #include "VF/PngFile.h"
 #include "VF/VideoFrame.h"
 #include "VF/VideoFrameManipulators.h"
@@ -85,8 +86,14 @@ public:
         // interrupted run never leaves a half-written file under a frame's name.
         encoded.mTemporaryPath = encoded.mFinalPath + ".part";
         encoded.mError = MakeParentDirectory(encoded.mFinalPath);
+        if (encoded.mError.empty() &&
+            !PendingOutput::Get().AddTemporaryFile(encoded.mTemporaryPath))
+            encoded.mError = "the program is ending";
         if (!encoded.mError.empty())
+        {
+            encoded.mTemporaryPath.clear();
             return encoded;
+        }
         const bool keepAlpha = inFrame->HasAlpha() && !inFrame->IsAlphaOpaque();
         const VF::PngStatus status =
             VF::WritePngFile(encoded.mTemporaryPath, inFrame,
@@ -110,6 +117,7 @@ public:
             Discard(ioFrame);
             return false;
         }
+        PendingOutput::Get().RemoveTemporaryFile(ioFrame.mTemporaryPath);
         ioFrame.mTemporaryPath.clear();
         return true;
     }
@@ -120,6 +128,7 @@ public:
             return;
         std::error_code ignored;
         std::filesystem::remove(ioFrame.mTemporaryPath, ignored);
+        PendingOutput::Get().RemoveTemporaryFile(ioFrame.mTemporaryPath);
         ioFrame.mTemporaryPath.clear();
     }
 
@@ -203,7 +212,10 @@ public:
     ~Y4MWriter() override
     {
         if (mOwnsFile && mFile)
+        {
+            PendingOutput::Get().RemoveStream(mFile);
             std::fclose(mFile);
+        }
     }
 
     bool Begin(const StreamInfo& inInfo, std::string& outError) override
@@ -227,6 +239,7 @@ public:
                 return false;
             }
             mOwnsFile = true;
+            PendingOutput::Get().AddStream(mFile);
         }
         const std::string header = MakeY4MHeader(inInfo, mChroma);
         return Write(header.data(), header.size(), outError);
@@ -294,6 +307,7 @@ public:
         }
         if (mOwnsFile)
         {
+            PendingOutput::Get().RemoveStream(mFile);
             const int result = std::fclose(mFile);
             mFile = nullptr;
             if (result != 0)

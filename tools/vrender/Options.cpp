@@ -228,7 +228,7 @@ private:
             "--frames", "--start",   "--count", "--size",           "--par", "--format",
             "--field",  "--quality", "--rate",  "--jobs",           "-o",    "--output-dir",
             "--chroma", "--scale",   "--speed", "--remove-pulldown"};
-        if (!kValued.contains(name))
+        if (!kValued.contains(name) && name != "--memory")
             return Fail("unknown option " + Quoted(inArgument) + " (see vrender --help)");
         const std::optional<std::string_view> value = TakeValue(name, inlineValue);
         if (!value)
@@ -370,6 +370,12 @@ private:
                             std::to_string(kMaxJobs));
             options.mJobs = static_cast<std::uint32_t>(*jobs);
         }
+        else if (name == "--memory")
+        {
+            options.mMemoryBudget = ParseByteSize(*value);
+            if (!options.mMemoryBudget || *options.mMemoryBudget == 0)
+                return Fail(prefix + Quoted(*value) + " is not a memory size, e.g. 512M or 4G");
+        }
         else if (name == "--chroma")
         {
             if (*value == "420")
@@ -451,6 +457,19 @@ private:
 };
 
 } // namespace
+
+std::optional<std::uint64_t> ParseByteSize(std::string_view inText)
+{
+    static constexpr std::string_view kSuffixes = "KMGT";
+    const std::size_t suffix =
+        inText.empty() ? std::string_view::npos : kSuffixes.find(inText.back());
+    const std::optional<std::uint64_t> number = ParseUnsigned(
+        suffix == std::string_view::npos ? inText : inText.substr(0, inText.size() - 1));
+    const unsigned shift = suffix == std::string_view::npos ? 0 : 10 * (unsigned(suffix) + 1);
+    if (!number || *number > (UINT64_MAX >> shift))
+        return std::nullopt;
+    return *number << shift;
+}
 
 std::optional<std::int64_t> ParseCount(std::string_view inText)
 {
@@ -713,6 +732,9 @@ Options:
                       not match the pattern are never touched)
   --chroma C          Y4M chroma: 420 (default) or 444
   -j, --jobs N        frames in flight, 1 to 64 (default: twice the cores)
+  --memory SIZE       memory the frames in flight may take, e.g. 512M or 4G
+                      (default: half the physical memory); fewer frames are
+                      kept in flight when they need more
   -q, --quiet         no progress bar (warnings and errors still show)
   -h, --help          this text
 
@@ -735,14 +757,17 @@ Filters, stacked on the source in this order:
                             frame mixing, or frame blending with --frame-blend
                             (not for still sources: ignored with a warning)
 
-Ctrl-C cancels the frames in flight and stops cleanly.
+Ctrl-C or SIGTERM cancels the frames in flight and stops within a second,
+leaving only complete files.
 
 Exit status:
   0    every frame was written
-  1    a failure while rendering: unreadable media, a frame that failed, an
-       output that cannot be written or that would replace an earlier render
+  1    a failure while rendering: unreadable media (also a FIFO or device), a
+       frame that failed, a frame too large for the memory budget, an output
+       that cannot be written or that would replace an earlier render
   2    bad arguments (the message names the argument and the problem)
-  130  cancelled with Ctrl-C
+  130  cancelled with Ctrl-C (SIGINT)
+  143  cancelled with SIGTERM
 )";
     return text;
 }

@@ -102,6 +102,9 @@ struct RenderOptions
     Y4MChroma mChroma = Y4MChroma::k420;
     // 0: the default (twice the core count, at most kMaxJobs).
     std::uint32_t mJobs = 0;
+    // --memory SIZE: bytes the frames in flight may take; unset: half the
+    // physical memory.
+    std::optional<std::uint64_t> mMemoryBudget;
     bool mQuiet = false;
     // --overwrite: replace PNG files of the pattern left by an earlier run and
     // remove its frames outside the new range. Without it such files stop
@@ -139,6 +142,8 @@ std::vector<std::string> GetStillSourceWarnings(const RenderOptions& inOptions);
 // the text is not a valid value.
 std::optional<std::int64_t> ParseCount(std::string_view inText);
 std::optional<mvxmediatypes::FrameRate> ParseFrameRate(std::string_view inText);
+// Bytes, with an optional K, M, G or T suffix (powers of 1024): "512M", "4G".
+std::optional<std::uint64_t> ParseByteSize(std::string_view inText);
 
 // A printf-style frame-number pattern: exactly one %d, %Nd or %0Nd (N up to
 // 2 digits) and any number of %% escapes. Answers an empty string when the

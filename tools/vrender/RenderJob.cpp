@@ -2,6 +2,7 @@
 
 #include "BE/IMediaInfo.h"
 #include "BE/VideoSources.h"
+#include "EdgeHoldSource.h"
 #include "MF/BinaryData.h"
 #include "MF/TimeTransform.h"
 #include "ML/RenderRequestException.h"
@@ -17,8 +18,11 @@
 #include <algorithm>
 #include <chrono>
 #include <cinttypes>
+#include <cmath>
 #include <map>
 #include <memory>
+#include <new>
+#include <unistd.h>
 
 namespace vrender
 {
@@ -35,6 +39,14 @@ constexpr std::chrono::milliseconds kPollInterval(100);
 // A render in which no frame arrives for this long is stuck; it is reported
 // and abandoned rather than waited for forever.
 constexpr std::chrono::seconds kStallTimeout(120);
+// Without --memory the frames in flight may take this share of the
+// physical memory.
+constexpr std::uint64_t kDefaultMemoryDivisor = 2;
+// Bytes per output pixel of the encoders' staging and output buffers (8-bit
+// 4:4:4 staging and the packed planes or the PNG rows).
+constexpr std::uint64_t kEncoderBytesPerPixel = 8;
+// The least bytes per pixel of a source frame (8-bit BGRA).
+constexpr std::uint64_t kSourceBytesPerPixel = 4;
 
 std::string StatusText(QRT::Result inStatus)
 {
@@ -59,13 +71,14 @@ struct SharedState
 {
     SharedState(std::int64_t inFirst, BE::VideoSourceRef inMedia, SourceRef inSource,
                 std::unique_ptr<FrameWriter> inWriter, RenderPlan inPlan,
-                QRT::InterfaceRef<MF::ITimeTransform> inTimeTransform)
+                QRT::InterfaceRef<MF::ITimeTransform> inTimeTransform, std::string inMediaNote)
         : mWindow(inFirst)
         , mMedia(std::move(inMedia))
         , mSource(std::move(inSource))
         , mWriter(std::move(inWriter))
         , mPlan(inPlan)
         , mTimeTransform(std::move(inTimeTransform))
+        , mMediaNote(std::move(inMediaNote))
     {
     }
 
@@ -77,6 +90,9 @@ struct SharedState
     const RenderPlan mPlan;
     // Output time to media time (--speed); empty when frames are not re-timed.
     const QRT::InterfaceRef<MF::ITimeTransform> mTimeTransform;
+    // What opening the media noted about damage it works around (a Y4M file
+    // whose last frame is cut short); empty for sound media.
+    const std::string mMediaNote;
 };
 
 // The delivered frame in the stream's format and size: the source delivers
@@ -115,8 +131,10 @@ FrameRef ConformToStream(const FrameRef& inFrame, const RenderPlan& inPlan, std:
 
 // Stacks the frame filters of inFilters on inSource in the order a media
 // node stacks them. outTimeTransform is the output-to-media time mapping
-// when frames are re-timed, else empty.
-SourceRef StackFilters(SourceRef inSource, const FilterOptions& inFilters, bool inStill,
+// when frames are re-timed (output time zero at inMediaStart), else empty;
+// the time filters then read the media through HoldEdgeFrames.
+SourceRef StackFilters(SourceRef inSource, const FilterOptions& inFilters,
+                       const SourceFacts& inMedia, mt::TickTime inMediaStart,
                        QRT::InterfaceRef<MF::ITimeTransform>& outTimeTransform)
 {
     SourceRef source = std::move(inSource);
@@ -132,14 +150,16 @@ SourceRef StackFilters(SourceRef inSource, const FilterOptions& inFilters, bool 
             source = ML::DeinterlaceSource(source);
         if (inFilters.mRemoveFlicker)
             source = ML::RemoveFlickerFromSource(source);
-        if (inFilters.mInterlaceConsecutive && !inStill)
+        if (inFilters.mInterlaceConsecutive && !inMedia.mIsStill)
             source = ML::InterlaceConsecutiveFramesFromSource(source);
     }
     if (inFilters.mScale)
         source = ML::ScaleAndPARCorrectSource(source);
-    if (inFilters.mSpeed && !inStill)
+    if (inFilters.mSpeed && !inMedia.mIsStill)
     {
-        outTimeTransform = MF::CreateTimeTransform(*inFilters.mSpeed);
+        if (inMedia.mDuration != mt::kTime_Max && inMedia.mDuration > mt::kTime_Zero)
+            source = HoldEdgeFrames(source, inMedia.mDuration, inMedia.mFrameRate);
+        outTimeTransform = MF::CreateTimeTransform(*inFilters.mSpeed, mt::kTime_Zero, inMediaStart);
         source = inFilters.mFrameBlend
                      ? ML::TimeBlendSource(source, outTimeTransform, *inFilters.mSpeed)
                      : ML::TimeMixSource(source);
@@ -167,10 +187,16 @@ FrameResult FinishFrame(SharedState& inState, std::int64_t inIndex, FrameRef inF
     try
     {
         // Success without a frame: the source could not render this time.
+        // In media with a damaged frame, that frame is the cause.
         if (!inFrame)
         {
-            const std::string cause = BE::GetLastReadFailure(inState.mMedia);
-            result.mError = name + ": " + (cause.empty() ? "the source delivered no frame" : cause);
+            // The decoder's reason for this frame, else what opening the media
+            // noted about damage it works around.
+            std::string cause = BE::GetLastReadFailure(inState.mMedia);
+            if (cause.empty())
+                cause = inState.mMediaNote.empty() ? std::string("the source delivered no frame")
+                                                   : inState.mMediaNote;
+            result.mError = name + ": " + cause;
             return result;
         }
         std::string problem;
@@ -189,11 +215,67 @@ FrameResult FinishFrame(SharedState& inState, std::int64_t inIndex, FrameRef inF
         result.mError =
             name + ": the render failed (status " + StatusText(inException.GetStatus()) + ")";
     }
+    catch (const std::bad_alloc&)
+    {
+        result.mError = name + ": out of memory (lower --jobs or --memory)";
+    }
     catch (const std::exception& inException)
     {
         result.mError = name + ": " + inException.what();
     }
     return result;
+}
+
+// A speed as the user writes it ("-2", "0.5").
+std::string FormatSpeed(double inSpeed)
+{
+    char text[32];
+    std::snprintf(text, sizeof(text), "%g", inSpeed);
+    return text;
+}
+
+// "1.5 GiB", "512.0 MiB".
+std::string FormatBytes(std::uint64_t inBytes)
+{
+    const bool gibibytes = inBytes >= (std::uint64_t{1} << 30);
+    char text[32];
+    std::snprintf(text, sizeof(text), "%.1f %s",
+                  static_cast<double>(inBytes) / (gibibytes ? 1073741824.0 : 1048576.0),
+                  gibibytes ? "GiB" : "MiB");
+    return text;
+}
+
+// The memory one frame in flight takes at most, roughly: the source's frame
+// (two when filters read neighbouring frames), the frame in the render
+// format, and the encoder's buffers.
+std::uint64_t EstimateFrameBytes(const SourceFacts& inSource, const RenderPlan& inPlan,
+                                 bool inFiltered)
+{
+    const std::uint64_t bytesPerPixel =
+        std::max<std::uint64_t>(inPlan.mPixelFormat.GetBytesPerPixel(), kSourceBytesPerPixel);
+    const std::uint64_t sourcePixels = std::uint64_t{inSource.mWidth} * inSource.mHeight;
+    const std::uint64_t outputPixels =
+        std::uint64_t{inPlan.mStream.mWidth} * inPlan.mStream.mHeight;
+    return sourcePixels * bytesPerPixel * (inFiltered ? 2 : 1) +
+           outputPixels * (bytesPerPixel + kEncoderBytesPerPixel);
+}
+
+// The number of output frames, at inSpeed (not zero) on a grid of
+// inTicksPerFrame, whose media times fall inside [0, inDuration).
+std::int64_t CountRetimedFrames(mt::TickTime inDuration, std::int64_t inTicksPerFrame,
+                                double inSpeed)
+{
+    const auto forward = MF::CreateTimeTransform(std::fabs(inSpeed));
+    const auto mediaTime = [&](std::int64_t inFrame)
+    { return forward->Transform(mt::TickTime::TicksToTime(inFrame * inTicksPerFrame)); };
+    auto count = static_cast<std::int64_t>(
+        std::ceil(static_cast<double>(inDuration.GetTicks()) /
+                  (std::fabs(inSpeed) * static_cast<double>(inTicksPerFrame))));
+    while (count > 0 && mediaTime(count - 1) >= inDuration)
+        --count;
+    while (mediaTime(count) < inDuration)
+        ++count;
+    return count;
 }
 
 SourceFacts DescribeSource(const BE::VideoSourceRef& inSource)
@@ -279,6 +361,10 @@ public:
             mProgress.Update(mWritten);
         }
         mProgress.Clear();
+        // A cancel may have made a write fail (the pipe's reader went away
+        // with the user's Ctrl-C); the cancel is what happened.
+        if (mEnvironment.mCancel && mEnvironment.mCancel->load())
+            mCancelled = true;
 
         if (mError.empty() && !mCancelled)
         {
@@ -291,7 +377,9 @@ public:
         outcome.mSeconds = mProgress.GetElapsedSeconds();
         outcome.mWhere = mState->mWriter->Describe();
         outcome.mError = mError;
-        outcome.mExitCode = !mError.empty() ? 1 : mCancelled ? 130 : 0;
+        outcome.mExitCode = mCancelled ? 130 : !mError.empty() ? 1 : 0;
+        if (mCancelled)
+            outcome.mError.clear();
         return outcome;
     }
 
@@ -373,6 +461,8 @@ private:
         if (!writer.Commit(ioResult.mEncoded, error))
             return Fail(error);
         ++mWritten;
+        if (mEnvironment.mFramesWritten)
+            mEnvironment.mFramesWritten->store(mWritten);
     }
 
     void Fail(std::string inError)
@@ -408,8 +498,20 @@ private:
 
 } // namespace
 
-bool PlanRender(const RenderOptions& inOptions, const SourceFacts& inSource, unsigned inCoreCount,
-                RenderPlan& outPlan, std::string& outError)
+HostFacts DescribeHost()
+{
+    HostFacts host;
+    host.mCoreCount = mvxcore::threads::GetCPUCoreCount();
+    const long pages = sysconf(_SC_PHYS_PAGES);
+    const long pageSize = sysconf(_SC_PAGESIZE);
+    if (pages > 0 && pageSize > 0)
+        host.mPhysicalMemory =
+            static_cast<std::uint64_t>(pages) * static_cast<std::uint64_t>(pageSize);
+    return host;
+}
+
+bool PlanRender(const RenderOptions& inOptions, const SourceFacts& inSource,
+                const HostFacts& inHost, RenderPlan& outPlan, std::string& outError)
 {
     RenderPlan plan;
     StreamInfo& stream = plan.mStream;
@@ -431,15 +533,16 @@ bool PlanRender(const RenderOptions& inOptions, const SourceFacts& inSource, uns
     }
     plan.mPixelFormat = inOptions.mPixelFormat;
 
-    // The media's length in frames of the output grid, when it has one.
+    // The media's length in frames of the output grid, when it has one; a
+    // speed plays it in fewer or more frames.
+    const bool retimed = !inSource.mIsStill && inOptions.mFilters.mSpeed.has_value();
+    const double speed = inOptions.mFilters.mSpeed.value_or(1.0);
+    const std::int64_t ticks = stream.mFrameRate.GetTicksPerFrame();
     std::optional<std::int64_t> length;
-    if (inSource.mIsStill)
-        length.reset();
-    else if (inSource.mDuration != mt::kTime_Max && inSource.mDuration >= mt::kTime_Zero)
-    {
-        const std::int64_t ticks = stream.mFrameRate.GetTicksPerFrame();
-        length = (inSource.mDuration.GetTicks() + ticks - 1) / ticks;
-    }
+    if (!inSource.mIsStill && inSource.mDuration != mt::kTime_Max &&
+        inSource.mDuration >= mt::kTime_Zero)
+        length = retimed ? CountRetimedFrames(inSource.mDuration, ticks, speed)
+                         : (inSource.mDuration.GetTicks() + ticks - 1) / ticks;
     plan.mFirst = inOptions.mStart.value_or(0);
     if (inOptions.mCount)
         plan.mCount = *inOptions.mCount;
@@ -459,14 +562,58 @@ bool PlanRender(const RenderOptions& inOptions, const SourceFacts& inSource, uns
                                           ? "frames " + std::to_string(plan.mFirst) + " to " +
                                                 std::to_string(plan.mFirst + plan.mCount - 1)
                                           : "--start " + std::to_string(plan.mFirst);
-            outError = asked + ": the media has " + range;
+            outError = asked + ": the media has " + range +
+                       (retimed ? " at speed " + FormatSpeed(speed) : std::string());
             return false;
         }
     }
     stream.mFirstFrame = plan.mFirst;
     stream.mFrameCount = plan.mCount;
-    const unsigned cores = std::max(inCoreCount, 1u);
+    if (retimed && speed < 0)
+    {
+        // Backwards from the last media frame, or from where the forward
+        // frames would end when that is later (slow motion), so that the
+        // last output frame shows the media's first.
+        const std::int64_t last = length ? *length - 1 : plan.mFirst + plan.mCount - 1;
+        const mt::TickTime lastTime = mt::TickTime::TicksToTime(last * ticks);
+        mt::TickTime start = MF::CreateTimeTransform(-speed)->Transform(lastTime);
+        if (length)
+        {
+            const std::int64_t mediaTicks =
+                inSource.mFrameRate.IsZero() ? ticks : inSource.mFrameRate.GetTicksPerFrame();
+            start = std::max(start, mt::TickTime::TicksToTime(std::max<std::int64_t>(
+                                        inSource.mDuration.GetTicks() - mediaTicks, 0)));
+        }
+        // The backward product may round a tick below zero.
+        const mt::TickTime end =
+            MF::CreateTimeTransform(speed, mt::kTime_Zero, start)->Transform(lastTime);
+        if (end < mt::kTime_Zero)
+            start = mt::TickTime::TicksToTime(start.GetTicks() - end.GetTicks());
+        plan.mMediaStart = start;
+    }
+
+    const unsigned cores = std::max(inHost.mCoreCount, 1u);
     plan.mJobs = inOptions.mJobs != 0 ? inOptions.mJobs : std::min(2 * cores, kMaxJobs);
+    plan.mFrameBytes = EstimateFrameBytes(inSource, plan, inOptions.mFilters.Any());
+    const std::uint64_t budget =
+        inOptions.mMemoryBudget.value_or(inHost.mPhysicalMemory / kDefaultMemoryDivisor);
+    if (budget != 0)
+    {
+        const std::uint64_t fit = budget / std::max<std::uint64_t>(plan.mFrameBytes, 1);
+        if (fit == 0)
+        {
+            const bool sourceLarger = std::uint64_t{inSource.mWidth} * inSource.mHeight >
+                                      std::uint64_t{stream.mWidth} * stream.mHeight;
+            outError = "a " + std::to_string(sourceLarger ? inSource.mWidth : stream.mWidth) + "x" +
+                       std::to_string(sourceLarger ? inSource.mHeight : stream.mHeight) +
+                       " frame needs about " + FormatBytes(plan.mFrameBytes) +
+                       " in flight, more than the memory budget of " + FormatBytes(budget) +
+                       (inOptions.mMemoryBudget ? std::string(" (--memory)")
+                                                : " (half the physical memory; --memory sets it)");
+            return false;
+        }
+        plan.mJobs = static_cast<std::uint32_t>(std::min<std::uint64_t>(plan.mJobs, fit));
+    }
     outPlan = plan;
     return true;
 }
@@ -487,7 +634,7 @@ RenderOutcome RunRender(const RenderOptions& inOptions, const RenderEnvironment&
     }
     const SourceFacts facts = DescribeSource(media);
     RenderPlan plan;
-    if (!PlanRender(inOptions, facts, mvxcore::threads::GetCPUCoreCount(), plan, outcome.mError))
+    if (!PlanRender(inOptions, facts, DescribeHost(), plan, outcome.mError))
         return outcome;
     if (facts.mIsStill)
         for (const std::string& warning : GetStillSourceWarnings(inOptions))
@@ -509,9 +656,9 @@ RenderOutcome RunRender(const RenderOptions& inOptions, const RenderEnvironment&
     if (!writer->Begin(plan.mStream, outcome.mError))
         return outcome;
     QRT::InterfaceRef<MF::ITimeTransform> timeTransform;
-    source = StackFilters(source, inOptions.mFilters, media->IsStill(), timeTransform);
+    source = StackFilters(source, inOptions.mFilters, facts, plan.mMediaStart, timeTransform);
     auto state = std::make_shared<SharedState>(plan.mFirst, media, source, std::move(writer), plan,
-                                               timeTransform);
+                                               timeTransform, opened.mMessage);
     const ExecutorRef encoders =
         mvxcore::threads::CreateThreadPoolExecutor(mvxcore::threads::GetCPUCoreCount());
 

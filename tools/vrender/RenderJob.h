@@ -11,8 +11,10 @@
 // go through an OrderingWindow back into frame order and are committed by
 // the loop. A cancel request (Ctrl-C) or a failed frame cancels everything
 // in flight with ML::CancelRender, waits until every request has ended and
-// removes what was produced but not written. The module must be up
-// (ML::VideoRenderer::Initialize) for the whole call.
+// removes what was produced but not written. The frames in flight are bounded
+// by count (--jobs) and by memory (--memory): a frame that does not fit the
+// budget on its own is refused before anything is rendered. The module must
+// be up (ML::VideoRenderer::Initialize) for the whole call.
 
 #include "FrameWriters.h"
 #include "Options.h"
@@ -48,6 +50,17 @@ inline constexpr std::int64_t kDefaultEndlessFrameCount = 50;
 inline constexpr mvxmediatypes::FrameRate kDefaultStillFrameRate =
     mvxmediatypes::kFrameRate_Video25;
 
+// What vrender needs to know about the machine to plan a render.
+struct HostFacts
+{
+    unsigned mCoreCount = 1;
+    // 0 when unknown: the frames in flight are then bounded only by --memory.
+    std::uint64_t mPhysicalMemory = 0;
+};
+
+// Answers the cores and the physical memory of this machine.
+HostFacts DescribeHost();
+
 struct RenderPlan
 {
     std::int64_t mFirst = 0;
@@ -55,18 +68,28 @@ struct RenderPlan
     StreamInfo mStream;
     mvxmediatypes::PixelFormat mPixelFormat;
     std::uint32_t mJobs = 1;
+    // Re-timed output (--speed): the media time of output time zero. Zero
+    // for forward speeds; for reverse ones the time from which the frame
+    // range plays back to the media's first frame (the last frame of a clip).
+    mvxmediatypes::TickTime mMediaStart = mvxmediatypes::kTime_Zero;
+    // The memory one frame in flight takes, as estimated for the budget.
+    std::uint64_t mFrameBytes = 0;
 };
 
-// Resolves the options against the source: frame range (checked against the
-// media's length), size, pixel aspect ratio, field order, frame rate and the
-// number of frames in flight. False with outError naming the option and the
-// problem ("--frames 90:120: the media has 100 frames (0 to 99)").
-bool PlanRender(const RenderOptions& inOptions, const SourceFacts& inSource, unsigned inCoreCount,
-                RenderPlan& outPlan, std::string& outError);
+// Resolves the options against the source and the machine: frame range
+// (checked against the media's length, which a speed stretches or shrinks:
+// the output frames whose media times fall inside the media), size, pixel
+// aspect ratio, field order, frame rate, where re-timed output starts in the
+// media, and the number of frames in flight (--jobs, at most as many as fit
+// the memory budget). False with outError naming the option and the problem
+// ("--frames 90:120: the media has 100 frames (0 to 99)").
+bool PlanRender(const RenderOptions& inOptions, const SourceFacts& inSource,
+                const HostFacts& inHost, RenderPlan& outPlan, std::string& outError);
 
 struct RenderOutcome
 {
-    // 0 success, 1 failure, 130 cancelled.
+    // 0 success, 1 failure, 130 cancelled (also when the cancel made a
+    // write fail).
     int mExitCode = 0;
     // The failure, naming the file or frame and the problem; empty otherwise.
     std::string mError;
@@ -85,6 +108,9 @@ struct RenderEnvironment
     bool mShowProgress = false;
     // Set from another thread or a signal handler to cancel.
     const std::atomic<bool>* mCancel = nullptr;
+    // When set, counts the frames written as they are written, for a
+    // caller that reports on a render it cannot wait for.
+    std::atomic<std::int64_t>* mFramesWritten = nullptr;
 };
 
 RenderOutcome RunRender(const RenderOptions& inOptions, const RenderEnvironment& inEnvironment);

@@ -2,42 +2,110 @@
 // renderer up, runs the command and takes the renderer down again.
 //
 // Exit codes: 0 success, 1 a failure while rendering (unreadable media, a
-// frame that failed, an output that cannot be written), 2 bad arguments,
-// 130 cancelled with Ctrl-C.
+// frame that failed, an output that cannot be written, a frame too large for
+// the memory budget), 2 bad arguments, 130 cancelled with Ctrl-C (SIGINT),
+// 143 cancelled with SIGTERM.
+//
+// Cancelling: SIGINT and SIGTERM are blocked in every thread and taken by a
+// watcher thread of their own. The first sets the cancel flag that the
+// render loop polls, which cancels the frames in flight and removes what was
+// not written. Whatever the program is blocked in (a write to a pipe whose
+// reader stalls, a frame that takes long to render), it ends within a
+// second: when it has not ended by itself after a grace period, or at a
+// second signal, the watcher makes the output complete (PendingOutput) and
+// ends the process.
 
 #include "CutlistInfo.h"
 #include "ML/RenderExecutors.h"
 #include "ML/VideoRenderer.h"
 #include "Options.h"
+#include "PendingOutput.h"
 #include "Progress.h"
 #include "RenderJob.h"
 
 #include <atomic>
+#include <cerrno>
 #include <csignal>
 #include <cstdio>
+#include <cstdlib>
+#include <ctime>
 #include <exception>
 #include <string>
 #include <string_view>
+#include <sys/syscall.h>
+#include <thread>
 #include <unistd.h>
 #include <vector>
 
 namespace
 {
 
-// Set by the signal handler, read by the render loop.
+// Set by the signal watcher, read by the render loop.
 std::atomic<bool> sCancelRequested{false};
+// The signal that asked for the cancel; 0 before any.
+std::atomic<int> sCancelSignal{0};
+// Frames written so far, for the watcher's report.
+std::atomic<std::int64_t> sFramesWritten{0};
+// Set by whoever reports the cancel first (the program or the watcher).
+std::atomic<bool> sCancelReported{false};
 
-extern "C" void OnInterrupt(int inSignal)
+// After the first signal, the program has this long to end by itself.
+constexpr long kCancelGraceNanoseconds = 500'000'000;
+
+// 130 for SIGINT, 143 for SIGTERM: what a shell reports for a program
+// ended by that signal.
+int ExitCodeForSignal(int inSignal)
 {
+    return 128 + inSignal;
+}
+
+sigset_t CancelSignals()
+{
+    sigset_t signals;
+    sigemptyset(&signals);
+    sigaddset(&signals, SIGINT);
+    sigaddset(&signals, SIGTERM);
+    return signals;
+}
+
+void ReportCancel(std::int64_t inFramesWritten)
+{
+    if (sCancelReported.exchange(true))
+        return;
+    const std::string text = "vrender: " + vrender::FormatCancelled(inFramesWritten) + "\n";
+    // Not through stdio: a thread blocked on stderr's lock must not hold this up.
+    if (write(STDERR_FILENO, text.data(), text.size()) < 0)
+        return;
+}
+
+[[noreturn]] void WatchSignals()
+{
+    const sigset_t signals = CancelSignals();
+    int signal = 0;
+    while (sigwait(&signals, &signal) != 0)
+        continue;
+    sCancelSignal.store(signal);
     sCancelRequested.store(true);
-    // A second Ctrl-C ends the program at once.
-    std::signal(inSignal, SIG_DFL);
+    // A second signal or the end of the grace period ends the process.
+    timespec grace{0, kCancelGraceNanoseconds};
+    siginfo_t info;
+    while (sigtimedwait(&signals, &info, &grace) < 0 && errno == EINTR)
+        continue;
+    vrender::PendingOutput::Get().CleanUpForExit();
+    ReportCancel(sFramesWritten.load());
+    // The system call itself, not _exit: tools that intercept _exit (the
+    // thread sanitizer) flush stdio first, which waits for good on a stream
+    // whose write is blocked on a stalled pipe.
+    syscall(SYS_exit_group, ExitCodeForSignal(signal));
+    std::abort();
 }
 
 void InstallSignalHandlers()
 {
-    std::signal(SIGINT, OnInterrupt);
-    std::signal(SIGTERM, OnInterrupt);
+    const sigset_t signals = CancelSignals();
+    // Before any other thread starts, so that every thread inherits the mask.
+    pthread_sigmask(SIG_BLOCK, &signals, nullptr);
+    std::thread(WatchSignals).detach();
     // A reader that goes away makes writes fail with EPIPE, which is reported,
     // instead of killing the process.
     std::signal(SIGPIPE, SIG_IGN);
@@ -81,6 +149,7 @@ int RunRender(const vrender::RenderOptions& inOptions, bool inDemo)
     vrender::RenderEnvironment environment;
     environment.mShowProgress = !inOptions.mQuiet && isatty(STDERR_FILENO);
     environment.mCancel = &sCancelRequested;
+    environment.mFramesWritten = &sFramesWritten;
     if (inDemo)
         std::fprintf(stderr, "vrender: rendering the demo (%s, %lld frames)\n",
                      inOptions.mMedia.c_str(),
@@ -93,9 +162,9 @@ int RunRender(const vrender::RenderOptions& inOptions, bool inDemo)
     }
     if (outcome.mExitCode == 130)
     {
-        std::fprintf(stderr, "vrender: %s\n",
-                     vrender::FormatCancelled(outcome.mFramesWritten).c_str());
-        return 130;
+        ReportCancel(outcome.mFramesWritten);
+        const int signal = sCancelSignal.load();
+        return signal == 0 ? 130 : ExitCodeForSignal(signal);
     }
     if (outcome.mExitCode != 0)
     {

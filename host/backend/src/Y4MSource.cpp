@@ -1,10 +1,13 @@
 // Y4M video files: a text header ("YUV4MPEG2 W.. H.. F.. I.. A.. C.."),
 // then frames, each a "FRAME" line followed by the planes Y, Cb, Cr of 8-bit
 // samples. Opening parses the header and walks the file once to index the
-// offset of every frame's pixels, so a truncated or malformed file is refused
-// before anything is read from it, and a frame is later read with a single
-// positional read. Reads of different frames may run on many threads at
-// once: the descriptor is only read with pread.
+// offset of every frame's pixels, so a malformed file is refused before
+// anything is read from it, and a frame is later read with a single
+// positional read. A file whose last frame is cut short (a recording that
+// stopped, a copy that did not finish) keeps its complete frames: the cut
+// frame stays in the index and its read fails, and the open status notes it.
+// Reads of different frames may run on many threads at once: the descriptor
+// is only read with pread.
 
 #include "BE/MediaStatus.h"
 #include "BE/VideoSources.h"
@@ -15,6 +18,7 @@
 #include "VideoSourceBase.h"
 #include "mvxcore/utility/Strings.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <charconv>
 #include <fcntl.h>
@@ -211,11 +215,13 @@ class Y4MSource : public detail::VideoSourceBase
 {
 public:
     Y4MSource(detail::SourceDescription inDescription, const Y4MHeader& inHeader,
-              std::shared_ptr<FileDescriptor> inFile, std::vector<std::uint64_t> inOffsets)
+              std::shared_ptr<FileDescriptor> inFile, std::vector<std::uint64_t> inOffsets,
+              std::int64_t inCutFrame)
         : VideoSourceBase(std::move(inDescription))
         , mHeader(inHeader)
         , mFile(std::move(inFile))
         , mOffsets(std::move(inOffsets))
+        , mCutFrame(inCutFrame)
     {
     }
 
@@ -223,6 +229,8 @@ protected:
     QRT::Result ProduceFrame(std::int64_t inIndex, PixelFormat inFormat,
                              FrameRef& outFrame) override
     {
+        if (inIndex == mCutFrame)
+            return kResult_MediaMalformed;
         const std::uint64_t frameBytes = mHeader.FrameBytes();
         std::vector<std::uint8_t> samples(frameBytes);
         if (detail::ReadAt(mFile->Get(), mOffsets[static_cast<std::size_t>(inIndex)],
@@ -329,6 +337,8 @@ private:
     const std::shared_ptr<FileDescriptor> mFile;
     // The file offset of every frame's first sample.
     const std::vector<std::uint64_t> mOffsets;
+    // The index of the last frame when the file cuts it short, else -1.
+    const std::int64_t mCutFrame;
 };
 
 OpenStatus Fail(const std::string& inPath, QRT::Result inStatus, const std::string& inProblem)
@@ -341,7 +351,9 @@ OpenStatus Fail(const std::string& inPath, QRT::Result inStatus, const std::stri
 OpenStatus OpenY4MSource(const std::string& inPath, VideoSourceRef& outSource)
 {
     outSource.Reset();
-    const int descriptor = open(inPath.c_str(), O_RDONLY | O_CLOEXEC);
+    // Without O_NONBLOCK, opening a FIFO waits for a writer that may never
+    // come; the identity check below refuses everything but regular files.
+    const int descriptor = open(inPath.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK);
     if (descriptor < 0)
         return Fail(inPath, kResult_MediaCannotOpen, detail::DescribeErrno(errno));
     auto file = std::make_shared<FileDescriptor>(descriptor);
@@ -361,31 +373,46 @@ OpenStatus OpenY4MSource(const std::string& inPath, VideoSourceRef& outSource)
     if (!problem.empty())
         return Fail(inPath, status, problem);
 
-    // Index every frame, refusing a file whose last frame is cut short.
+    // Index every frame. The end of the file may cut the last frame short,
+    // in its FRAME line or in its samples; everything else is damage.
     const std::uint64_t frameBytes = header.FrameBytes();
     std::vector<std::uint64_t> offsets;
+    std::string cut;
     std::uint64_t position = line.size() + 1;
-    while (position < identity.mSize)
+    while (position < identity.mSize && cut.empty())
     {
         const std::string frameName = "frame " + std::to_string(offsets.size());
+        const std::uint64_t remaining = identity.mSize - position;
         if (!ReadLine(descriptor, position, line))
-            return Fail(inPath, kResult_MediaMalformed,
-                        frameName + " at byte " + std::to_string(position) +
-                            ": no FRAME line (file truncated or damaged)");
-        if (line.substr(0, 5) != "FRAME" || (line.size() > 5 && line[5] != ' '))
+        {
+            char start[5] = {};
+            const std::size_t count = detail::ReadAt(descriptor, position, start, sizeof(start));
+            if (remaining > kMaxLineLength || offsets.empty() ||
+                std::string_view(start, count) != std::string_view("FRAME").substr(0, count))
+                return Fail(inPath, kResult_MediaMalformed,
+                            frameName + " at byte " + std::to_string(position) +
+                                ": no FRAME line (file truncated or damaged)");
+            cut = frameName + " is truncated: 0 of " + std::to_string(frameBytes) + " bytes";
+            line.clear();
+        }
+        else if (line.substr(0, 5) != "FRAME" || (line.size() > 5 && line[5] != ' '))
             return Fail(inPath, kResult_MediaMalformed,
                         frameName + " at byte " + std::to_string(position) +
                             ": expected a FRAME line");
-        const std::uint64_t data = position + line.size() + 1;
-        if (data + frameBytes > identity.mSize)
-            return Fail(inPath, kResult_MediaMalformed,
-                        frameName + " is truncated: " + std::to_string(identity.mSize - data) +
-                            " of " + std::to_string(frameBytes) + " bytes");
+        const std::uint64_t data = std::min(position + line.size() + 1, identity.mSize);
+        if (cut.empty() && data + frameBytes > identity.mSize)
+        {
+            cut = frameName + " is truncated: " + std::to_string(identity.mSize - data) + " of " +
+                  std::to_string(frameBytes) + " bytes";
+            if (offsets.empty())
+                return Fail(inPath, kResult_MediaMalformed, cut);
+        }
         offsets.push_back(data);
         position = data + frameBytes;
     }
     if (offsets.empty())
         return Fail(inPath, kResult_MediaMalformed, "the file holds no frames");
+    const std::int64_t cutFrame = cut.empty() ? -1 : static_cast<std::int64_t>(offsets.size()) - 1;
 
     detail::SourceDescription description;
     description.mMediaPath = inPath;
@@ -410,7 +437,9 @@ OpenStatus OpenY4MSource(const std::string& inPath, VideoSourceRef& outSource)
     description.mColorProfile.mName = header.mHeight < kBT709MinimumHeight ? "BT.601" : "BT.709";
 
     outSource = QRT::Allocated<Y4MSource>::Create<Deprecated::IVideoSource>(
-        std::move(description), header, std::move(file), std::move(offsets));
+        std::move(description), header, std::move(file), std::move(offsets), cutFrame);
+    if (!cut.empty())
+        return OpenStatus{QRT::kResult_Success, inPath + ": " + cut};
     return {};
 }
 

@@ -2,6 +2,7 @@
 #include "BackendTestSupport.h"
 
 #include <cstring>
+#include <sys/stat.h>
 #include <tuple>
 
 #include <gtest/gtest.h>
@@ -164,10 +165,12 @@ TEST_F(Y4MSourceTest, DamagedFilesAreRefusedWithTheirReason)
     misspelt.replace(misspelt.find("FRAME", 30), 5, "FRAMX");
     const QRT::Result malformed = BE::kResult_MediaMalformed;
     const std::tuple<std::string, QRT::Result, std::string> cases[] = {
-        {bytes.substr(0, bytes.size() - 14), malformed, "frame 1 is truncated: 10 of 24 bytes"},
+        {bytes.substr(0, 36), malformed, "frame 0 is truncated: 8 of 24 bytes"},
         {bytes.substr(0, 25), malformed,
          "frame 0 at byte 22: no FRAME line (file truncated or damaged)"},
         {misspelt, malformed, "frame 1 at byte 52: expected a FRAME line"},
+        {bytes + "FRAXE", malformed,
+         "frame 2 at byte 82: no FRAME line (file truncated or damaged)"},
         {std::string(5000, '\x7f'), malformed,
          "no Y4M header line (no newline in the first 4096 bytes)"},
         {"RIFF1234\nFRAME\n", malformed, "not a Y4M file (no YUV4MPEG2 signature)"},
@@ -184,10 +187,22 @@ TEST_F(Y4MSourceTest, DamagedFilesAreRefusedWithTheirReason)
         EXPECT_EQ(status.mResult, result) << reason;
         EXPECT_EQ(status.mMessage, mPath + ": " + reason);
     }
-    BE::VideoSourceRef source;
-    const BE::OpenStatus status = BE::OpenVideoSource(mDirectory.File("missing.y4m"), source);
-    EXPECT_EQ(status.mResult, BE::kResult_MediaCannotOpen);
-    EXPECT_NE(status.mMessage.find("No such file or directory"), std::string::npos);
+    // Nothing but a regular file is opened: a FIFO would wait for a writer.
+    const std::string fifo = mDirectory.File("fifo.y4m");
+    ASSERT_EQ(mkfifo(fifo.c_str(), 0600), 0);
+    const std::pair<std::string, std::string> unopened[] = {
+        {mDirectory.File("missing.y4m"), "No such file or directory"},
+        {fifo, fifo + ": not a regular file (a FIFO)"},
+        {mDirectory.File(""), "not a regular file (a directory)"}};
+    for (const auto& [path, reason] : unopened)
+    {
+        BE::VideoSourceRef source;
+        const BE::OpenStatus status = BE::OpenVideoSource(path, source);
+        EXPECT_EQ(status.mResult, BE::kResult_MediaCannotOpen);
+        EXPECT_NE(status.mMessage.find(reason), std::string::npos) << status.mMessage;
+    }
+    BE::VideoSourceRef direct;
+    EXPECT_EQ(BE::OpenY4MSource(fifo, direct).mMessage, fifo + ": not a regular file");
 
     // A file cut short after opening fails the read of the lost frame only.
     const BE::VideoSourceRef cut = Write(bytes);
@@ -196,6 +211,33 @@ TEST_F(Y4MSourceTest, DamagedFilesAreRefusedWithTheirReason)
     EXPECT_EQ(ReadFrame(cut, TickTime::FromFrame(1, kFrameRate_Video25), frame),
               BE::kResult_MediaMalformed);
     EXPECT_EQ(ReadFrame(cut, TickTime(), frame), QRT::kResult_Success);
+}
+
+TEST_F(Y4MSourceTest, ALastFrameCutShortKeepsTheCompleteFrames)
+{
+    const std::string bytes = MakeY4M("YUV4MPEG2 W4 H4 F25:1", 4, 4, "RGB");
+    // Cut inside the last frame's samples, and inside its FRAME line.
+    const std::pair<std::size_t, std::string> cuts[] = {
+        {bytes.size() - 14, "frame 2 is truncated: 10 of 24 bytes"},
+        {bytes.size() - 27, "frame 2 is truncated: 0 of 24 bytes"}};
+    for (const auto& [size, reason] : cuts)
+    {
+        SCOPED_TRACE(reason);
+        BE::VideoSourceRef source;
+        const BE::OpenStatus status = Open(bytes.substr(0, size), source);
+        ASSERT_TRUE(status.Succeeded());
+        EXPECT_EQ(status.mMessage, mPath + ": " + reason);
+        EXPECT_EQ(QRT::QueryRef<BE::Deprecated::IMediaInfo>(source)->GetDuration(),
+                  TickTime::FromFrame(3, kFrameRate_Video25));
+        for (int index = 0; index < 2; ++index)
+            ExpectNear(
+                Pixel(ReadFrameOrFail(source, TickTime::FromFrame(index, kFrameRate_Video25)), 1,
+                      1),
+                Colour("RG"[index]).mBT601);
+        FrameRef frame;
+        EXPECT_EQ(ReadFrame(source, TickTime::FromFrame(2, kFrameRate_Video25), frame),
+                  BE::kResult_MediaMalformed);
+    }
 }
 
 } // namespace

@@ -6,6 +6,8 @@
 #include "VrenderTestSupport.h"
 
 #include <string>
+#include <sys/ioctl.h>
+#include <sys/stat.h>
 
 #include <gtest/gtest.h>
 
@@ -49,7 +51,144 @@ BE::VideoSourceRef OpenY4M(const fs::path& inPath)
     return source;
 }
 
+// An 8x8 4:4:4 clip of grey frames whose luma tells them apart: frame i
+// has luma 40 (i + 1). The last frame loses inCut bytes.
+fs::path WriteNumberedClip(const fs::path& inPath, int inFrames, std::size_t inCut = 0)
+{
+    std::string bytes = "YUV4MPEG2 W8 H8 F25:1 Ip A1:1 C444\n";
+    for (int i = 0; i < inFrames; ++i)
+    {
+        bytes += "FRAME\n";
+        bytes.append(64, char(40 * (i + 1)));
+        bytes.append(128, char(128));
+    }
+    std::ofstream(inPath, std::ios::binary) << bytes.substr(0, bytes.size() - inCut);
+    return inPath;
+}
+
+// The frame numbers of WriteNumberedClip in a 4:4:4 stream of such frames.
+std::vector<int> NumberFrames(const std::string& inStream)
+{
+    std::vector<int> numbers;
+    for (std::size_t at = inStream.find("FRAME\n"); at != std::string::npos;
+         at = inStream.find("FRAME\n", at + 6 + 3 * 64))
+        numbers.push_back((std::uint8_t(inStream[at + 6]) + 20) / 40 - 1);
+    return numbers;
+}
+
 using EndToEndTest = vrendertest::ScratchDirectoryTest;
+
+TEST_F(EndToEndTest, SpeedsPlayTheWholeClipAndReverseStartsAtItsEnd)
+{
+    const std::string clip = WriteNumberedClip(mDirectory / "clip.y4m", 5).string();
+    const std::pair<Args, std::vector<int>> cases[] = {{{"-1"}, {4, 3, 2, 1, 0}},
+                                                       {{"-1", "--frame-blend"}, {4, 3, 2, 1, 0}},
+                                                       {{"2"}, {0, 2, 4}},
+                                                       {{"-2"}, {4, 2, 0}},
+                                                       {{"0.5"}, {0, 0, 1, 1, 2, 2, 3, 3, 4, 4}},
+                                                       {{"-0.5"}, {4, 4, 3, 3, 2, 2, 1, 1, 0, 0}}};
+    for (const auto& [speed, expected] : cases)
+    {
+        SCOPED_TRACE(speed.front() + (speed.size() > 1 ? " " + speed.back() : ""));
+        Args args{"source", clip, "--chroma", "444", "-o", "-", "--speed"};
+        args.insert(args.end(), speed.begin(), speed.end());
+        const auto run = Run(args);
+        ASSERT_EQ(run.mExitCode, 0) << run.mErr;
+        EXPECT_EQ(NumberFrames(run.mOut), expected);
+    }
+    // Blending reaches past the clip's ends; the edge frames stand in.
+    const auto blended = Run({"source", clip, "--speed", "-2", "--frame-blend", "-o", "-"});
+    EXPECT_EQ(blended.mExitCode, 0) << blended.mErr;
+    EXPECT_EQ(blended.mErr.rfind("Rendered 3 frames", 0), 0u) << blended.mErr;
+}
+
+TEST_F(EndToEndTest, ACutLastFrameFailsAloneAndIsNamed)
+{
+    const std::string clip = WriteNumberedClip(mDirectory / "cut.y4m", 5, 10).string();
+    const auto complete = Run({"source", clip, "--frames", "0:3", "-o", "-"});
+    EXPECT_EQ(complete.mExitCode, 0) << complete.mErr;
+    const fs::path out = mDirectory / "all";
+    const auto all = Run({"source", clip, "-j", "1", "-o", (out / "f_%d.png").string()});
+    EXPECT_EQ(all.mExitCode, 1);
+    EXPECT_EQ(all.mErr, "vrender: frame 4: " + clip + ": frame 4 is truncated: 182 of 192 bytes\n");
+    for (int i = 0; i < 4; ++i)
+        EXPECT_TRUE(ReadPng(out / ("f_" + std::to_string(i) + ".png"))) << "frame " << i;
+    EXPECT_EQ(std::distance(fs::directory_iterator(out), fs::directory_iterator()), 4);
+}
+
+TEST_F(EndToEndTest, AFrameLargerThanTheMemoryBudgetIsRefusedBeforeRendering)
+{
+    const auto run =
+        Run({"source", "pattern:moving?size=32768x32768", "--memory", "1G", "-o", "-"});
+    EXPECT_EQ(run.mExitCode, 1);
+    EXPECT_EQ(run.mErr.rfind("vrender: a 32768x32768 frame needs about ", 0), 0u) << run.mErr;
+    EXPECT_NE(run.mErr.find(" more than the memory budget of 1.0 GiB (--memory)\n"),
+              std::string::npos)
+        << run.mErr;
+    EXPECT_EQ(run.mOut, "");
+    EXPECT_EQ(Run({"source", "pattern:moving", "--memory", "1Q"}).mExitCode, 2);
+}
+
+TEST_F(EndToEndTest, AFifoIsRefusedWithoutWaitingForAWriter)
+{
+    const std::string fifo = (mDirectory / "fifo.y4m").string();
+    ASSERT_EQ(mkfifo(fifo.c_str(), 0600), 0);
+    const int out = open((mDirectory / "out.txt").c_str(), O_WRONLY | O_CREAT, 0644);
+    const pid_t child = Start({"source", fifo, "-o", "-"}, out);
+    close(out);
+    EXPECT_EQ(WaitForExit(child), 1);
+    EXPECT_EQ(vrendertest::ReadText(mDirectory / "err.txt"),
+              "vrender: " + fifo + ": not a regular file (a FIFO)\n");
+}
+
+// The first SIGINT or SIGTERM ends a render wherever it waits: on a pipe
+// whose reader has stopped reading, or on frames; only complete PNG files
+// are left.
+TEST_F(EndToEndTest, ASignalEndsTheRenderWhereverItWaits)
+{
+    const std::pair<int, int> signals[] = {{SIGINT, 130}, {SIGTERM, 143}};
+    for (const auto& [signal, exitCode] : signals)
+    {
+        SCOPED_TRACE(signal);
+        int pipeEnds[2];
+        ASSERT_EQ(pipe(pipeEnds), 0);
+        const pid_t streaming =
+            Start({"source", "pattern:moving?size=1920x1080", "--count", "2000", "--y4m", "-q"},
+                  pipeEnds[1]);
+        close(pipeEnds[1]);
+        const int capacity = fcntl(pipeEnds[0], F_GETPIPE_SZ);
+        EXPECT_TRUE(Await(
+            [&]
+            {
+                int queued = 0;
+                return ioctl(pipeEnds[0], FIONREAD, &queued) == 0 && queued >= capacity;
+            }))
+            << "the pipe fills up";
+        kill(streaming, signal);
+        EXPECT_EQ(WaitForExit(streaming), exitCode) << "the stalled writer is cut short";
+        close(pipeEnds[0]);
+
+        const fs::path out = mDirectory / ("png" + std::to_string(signal));
+        const int log = open((mDirectory / "out.txt").c_str(), O_WRONLY | O_CREAT, 0644);
+        const pid_t rendering = Start({"source", "pattern:moving?size=320x180", "--count", "100000",
+                                       "-q", "-o", (out / "f_%06d.png").string()},
+                                      log);
+        close(log);
+        EXPECT_TRUE(Await([&] { return fs::exists(out / "f_000000.png"); }));
+        kill(rendering, signal);
+        EXPECT_EQ(WaitForExit(rendering), exitCode);
+        EXPECT_EQ(
+            vrendertest::ReadText(mDirectory / "err.txt").rfind("vrender: cancelled after ", 0),
+            0u);
+        for (const auto& entry : fs::directory_iterator(out))
+        {
+            ASSERT_EQ(entry.path().extension(), ".png") << entry.path();
+            const FrameRef frame = ReadPng(entry.path());
+            ASSERT_TRUE(frame) << entry.path();
+            EXPECT_EQ(frame->GetBounds().Width(), 320);
+        }
+    }
+}
 
 TEST_F(EndToEndTest, Y4MStreamHoldsTheSameFramesInOrder)
 {

@@ -22,13 +22,29 @@ vrender::SourceFacts Clip()
     return facts;
 }
 
+// A machine of inCores with memory to spare.
+vrender::HostFacts Host(unsigned inCores = 1)
+{
+    return {inCores, std::uint64_t{1} << 40};
+}
+
 vrender::RenderPlan Plan(const vrender::RenderOptions& inOptions,
                          const vrender::SourceFacts& inFacts, unsigned inCores = 1)
 {
     vrender::RenderPlan plan;
     std::string error;
-    EXPECT_TRUE(vrender::PlanRender(inOptions, inFacts, inCores, plan, error)) << error;
+    EXPECT_TRUE(vrender::PlanRender(inOptions, inFacts, Host(inCores), plan, error)) << error;
     return plan;
+}
+
+// The error of a plan that must be refused.
+std::string Refusal(const vrender::RenderOptions& inOptions, const vrender::SourceFacts& inFacts,
+                    const vrender::HostFacts& inHost = Host())
+{
+    vrender::RenderPlan plan;
+    std::string error;
+    EXPECT_FALSE(vrender::PlanRender(inOptions, inFacts, inHost, plan, error));
+    return error;
 }
 
 // The first frame, count, size, aspect, field order and jobs of inPlan.
@@ -76,14 +92,14 @@ TEST_F(PlanRenderTest, OptionsOverrideTheSource)
 TEST_F(PlanRenderTest, RangesBeyondTheMediaAreRefused)
 {
     vrender::RenderOptions options;
-    vrender::RenderPlan plan;
-    std::string error;
     std::tie(options.mStart, options.mCount) = std::pair(90, 31);
-    EXPECT_FALSE(vrender::PlanRender(options, Clip(), 2, plan, error));
-    EXPECT_EQ(error, "frames 90 to 120: the media has 100 frames (0 to 99)");
+    EXPECT_EQ(Refusal(options, Clip()), "frames 90 to 120: the media has 100 frames (0 to 99)");
     std::tie(options.mStart, options.mCount) = std::pair(100, std::nullopt);
-    EXPECT_FALSE(vrender::PlanRender(options, Clip(), 2, plan, error));
-    EXPECT_EQ(error, "--start 100: the media has 100 frames (0 to 99)");
+    EXPECT_EQ(Refusal(options, Clip()), "--start 100: the media has 100 frames (0 to 99)");
+    options.mStart = 50;
+    options.mFilters.mSpeed = -2;
+    EXPECT_EQ(Refusal(options, Clip()),
+              "--start 50: the media has 50 frames (0 to 49) at speed -2");
 }
 
 TEST_F(PlanRenderTest, EndlessAndStillMedia)
@@ -106,6 +122,42 @@ TEST_F(PlanRenderTest, EndlessAndStillMedia)
     plan = Plan(options, still);
     EXPECT_EQ(std::pair(plan.mCount, plan.mStream.mFrameRate),
               std::pair(std::int64_t{12}, mt::kFrameRate_Video50));
+}
+
+// Reverse speeds play endless media's default range back down to time zero
+// (clips: EndToEndTest checks the frames by their content).
+TEST_F(PlanRenderTest, ReverseEndlessMediaEndsAtTimeZero)
+{
+    vrender::SourceFacts pattern = Clip();
+    pattern.mDuration = mt::kTime_Max;
+    vrender::RenderOptions reverse;
+    reverse.mFilters.mSpeed = -2;
+    EXPECT_EQ(Plan(reverse, pattern).mMediaStart,
+              mt::TickTime::FromFrame(2 * (vrender::kDefaultEndlessFrameCount - 1),
+                                      mt::kFrameRate_Video25));
+}
+
+// The frames in flight are as many as fit the memory budget (half the
+// physical memory unless --memory says otherwise); a frame that does not
+// fit alone is refused.
+TEST_F(PlanRenderTest, MemoryBoundsTheFramesInFlight)
+{
+    vrender::RenderOptions options;
+    const std::uint64_t frameBytes = Plan(options, Clip()).mFrameBytes;
+    options.mPixelFormat = mt::kPixelFormat_BGRA_4444_32f;
+    EXPECT_GT(Plan(options, Clip()).mFrameBytes, frameBytes + 640 * 360 * 12);
+    options.mPixelFormat = mt::kPixelFormat_BGRA_4444_8u;
+    vrender::RenderPlan plan;
+    std::string error;
+    ASSERT_TRUE(vrender::PlanRender(options, Clip(), {8, 6 * frameBytes}, plan, error));
+    EXPECT_EQ(plan.mJobs, 3u);
+    options.mMemoryBudget = 2 * frameBytes;
+    EXPECT_EQ(Plan(options, Clip(), 8).mJobs, 2u);
+    options.mMemoryBudget = frameBytes - 1;
+    EXPECT_EQ(Refusal(options, Clip()).rfind("a 640x360 frame needs about ", 0), 0u);
+    options.mMemoryBudget.reset();
+    EXPECT_NE(Refusal(options, Clip(), {8, frameBytes}).find("(half the physical memory"),
+              std::string::npos);
 }
 
 } // namespace

@@ -6,8 +6,9 @@
 // interface on a worker thread of its own) for prefetch tests and benchmarks.
 //
 // Every function answers a status with a message ("<path or pattern>: <problem>")
-// and, on success, the source; on failure the output is empty. Every function
-// may be called from any thread.
+// and, on success, the source; on failure the output is empty. A success
+// may carry a message too: damage the source works around (a Y4M file whose
+// last frame is cut short). Every function may be called from any thread.
 
 #include "BE/IMediaInfo.h"
 #include "BE/IVideoSource.h"
@@ -32,7 +33,9 @@ struct OpenStatus
 using VideoSourceRef = QRT::InterfaceRef<Deprecated::IVideoSource>;
 
 // Opens a file by its extension (.png, .jpg, .jpeg, .y4m, any case) or a
-// "pattern:" text (BE/PatternSettings.h). Statuses: kResult_MediaCannotOpen,
+// "pattern:" text (BE/PatternSettings.h). A path that names anything but a
+// regular file (a directory, a FIFO, a device) is refused before it is
+// opened, with kResult_MediaCannotOpen. Statuses: kResult_MediaCannotOpen,
 // kResult_MediaMalformed, kResult_MediaUnsupported (also for an unknown
 // extension), kResult_BadPattern.
 OpenStatus OpenVideoSource(const std::string& inMedia, VideoSourceRef& outSource);
@@ -52,7 +55,11 @@ std::string GetLastReadFailure(const VideoSourceRef& inSource);
 
 // A Y4M file (8-bit 4:2:0, 4:2:2 or 4:4:4; progressive, upper or lower field
 // first). The header is parsed and an index of frame offsets is built now;
-// a truncated or malformed file is refused here. Frames are read by index
+// a malformed file is refused here. When the file ends inside its last
+// frame, and an earlier frame is complete, the source keeps every frame: the
+// cut one fails its reads with kResult_MediaMalformed, and the success
+// message names it ("<path>: frame 4 is truncated: 1000 of 1536 bytes").
+// A FIFO or device is refused without waiting for data. Frames are read by index
 // and delivered as BGRA_4444_8u (BT.601 below 720 rows, BT.709 from 720), or
 // VUYA_4444_8u / YUYV_422_8u when asked for.
 OpenStatus OpenY4MSource(const std::string& inPath, VideoSourceRef& outSource);
