@@ -66,29 +66,6 @@ TEST_F(SampleWeightingTest, DurationsScaleWithTheRateAndIgnoreItsSign)
             << "rate " << rate << " at " << time.GetTime().GetTicks();
 }
 
-TEST_F(SampleWeightingTest, SamplesAroundATimeAndTheLaterSamplesShare)
-{
-    // Output frame 9 of an upper-first 29.97i sequence at speed 0.5: media time
-    // (9P, 9.5P). The first field lies on upstream field 9, the second half-way
-    // between fields 9 and 10.
-    TickTime t1a, t1b, t2a, t2b;
-    MF::GetSamplesAroundTime(MF::FrameTime(Fields(9), HalfFields(19)), kFieldRate, t1a, t1b, t2a,
-                             t2b);
-    EXPECT_EQ(std::tuple(t1a, t1b, t2a, t2b),
-              std::tuple(Fields(9), Fields(9), Fields(9), Fields(10)));
-    EXPECT_EQ(MF::CalculateSampleWeight(Fields(9), t1a, t1b), 0.0f);
-    EXPECT_EQ(MF::CalculateSampleWeight(HalfFields(19), t2a, t2b), 0.5f);
-    // Negative times round down.
-    MF::GetSamplesAroundTime(MF::FrameTime(Ticks(-1), Ticks(kField - 1)), kFieldRate, t1a, t1b, t2a,
-                             t2b);
-    EXPECT_EQ(std::tuple(t1a, t1b, t2a, t2b),
-              std::tuple(Fields(-1), Fields(0), Fields(0), Fields(1)));
-    // The share of the later sample, clamped outside the pair.
-    EXPECT_EQ(MF::CalculateSampleWeight(Ticks(4 * kField + kField / 4), Fields(4), Fields(5)),
-              0.25f);
-    EXPECT_EQ(MF::CalculateSampleWeight(Fields(7), Fields(4), Fields(5)), 1.0f);
-}
-
 TEST_F(SampleWeightingTest, RangesWeighEachSampleByTheShareItCovers)
 {
     // Output frame 4 at speed 2.5: media (20P, 22.5P); each output field spans

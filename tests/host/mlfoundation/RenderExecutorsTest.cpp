@@ -13,7 +13,6 @@ namespace
 {
 
 using mvxcore::testing::CountingSignal;
-using mvxcore::testing::Tracked;
 using Executors = std::array<ML::ExecutorRef, 4>;
 
 Executors CurrentExecutors()
@@ -73,24 +72,6 @@ TEST_F(RenderExecutorsTest, StartUpCreatesFourDistinctWorkingExecutorsOnce)
     ExpectWorking(executors);
     ML::Foundation::StartUp();
     EXPECT_EQ(CurrentExecutors(), executors);
-}
-
-TEST_F(RenderExecutorsTest, ShutDownStopsAndResetsAllFourAndDropsTheirPendingTasks)
-{
-    ML::Foundation::StartUp();
-    const Executors executors = CurrentExecutors();
-    std::atomic<int> live{0};
-    std::atomic<int> ran{0};
-    for (const ML::ExecutorRef& executor : executors)
-        executor->Post([&ran, held = Tracked(live)] { ++ran; }, 60000);
-    EXPECT_EQ(live.load(), 4);
-    ML::Foundation::ShutDown();
-    EXPECT_EQ(live.load(), 0);
-    for (const ML::ExecutorRef& executor : CurrentExecutors())
-        EXPECT_FALSE(executor);
-    for (const ML::ExecutorRef& executor : executors)
-        EXPECT_TRUE(executor->IsShutDown());
-    EXPECT_EQ(ran.load(), 0);
 }
 
 } // namespace

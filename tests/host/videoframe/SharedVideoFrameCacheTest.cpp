@@ -69,19 +69,6 @@ protected:
     }
 };
 
-TEST_F(SharedVideoFrameCacheTest, MissThenHitAndInsertionMarksShared)
-{
-    EXPECT_FALSE(mCache.RetrieveFromCache(KeyFor(0)));
-    const Frame frame = MakeTagged(7);
-    mCache.InsertIntoCache(frame, KeyFor(0), VF::kCachePriority_Low);
-    EXPECT_TRUE(frame->IsShared());
-    EXPECT_EQ(mCache.RetrieveFromCache(KeyFor(0)).Get(), frame.Get());
-    // Reinsertion under the same key replaces the frame and keeps the bytes exact.
-    mCache.InsertIntoCache(MakeTagged(2), KeyFor(0), 10);
-    EXPECT_EQ(TagOf(mCache.RetrieveFromCache(KeyFor(0))), 2);
-    EXPECT_EQ(Counts(mCache), (Expected{2, 1, 2, 0, 0, kFrameBytes, 1}));
-}
-
 TEST_F(SharedVideoFrameCacheTest, EvictsPriorityZeroBeforeTenThenTheLeastRecentlyUsed)
 {
     Insert(0, VF::kCachePriority_High);

@@ -13,16 +13,6 @@ namespace
 using mvxmediatypes::TickTime;
 using RenderablePropertyValueTest = ::testing::Test;
 
-TEST_F(RenderablePropertyValueTest, DoublesHaveSixSignificantDigitsLikeADefaultStream)
-{
-    const std::pair<double, const char*> exact[] = {
-        {0.5, "0.5"},           {1.0, "1"},         {100.0, "100"},     {1234567.0, "1.23457e+06"},
-        {123456.0, "123456"},   {0.0001, "0.0001"}, {0.00001, "1e-05"}, {-2.5, "-2.5"},
-        {1.0 / 3.0, "0.333333"}};
-    for (const auto& [value, text] : exact)
-        EXPECT_EQ(ML::FormatPropertyValue(value), text);
-}
-
 TEST_F(RenderablePropertyValueTest, IntegersBooleansAndTimesArePlainDecimal)
 {
     EXPECT_EQ(ML::FormatPropertyValue(std::int32_t{-42}), "-42");
