@@ -44,28 +44,6 @@ MF::WeightedSampleList Range(TickTime inStart, TickTime inEnd, const FrameRate& 
 
 using SampleWeightingTest = ::testing::Test;
 
-TEST_F(SampleWeightingTest, DurationsScaleWithTheRateAndIgnoreItsSign)
-{
-    const MF::FrameTime fast(Fields(20), HalfFields(45));
-    const MF::FrameTime progressive(Fields(8));
-    const FrameRate oddRate = FrameRate::Create(1001);
-    const std::tuple<FrameRate, FrameRate, MF::FrameTime, double, TickTime, TickTime, TickTime>
-        cases[] = {
-            {kFieldRate, kSequenceRate, fast, 2.5, Fields(1), Ticks(29'429'400), Ticks(29'429'400)},
-            {kFieldRate, kSequenceRate, fast, -0.5, Fields(1), Ticks(5'885'880), Ticks(5'885'880)},
-            // Progressive output covers the whole frame: at 2.5, five fields.
-            {kFieldRate, kSequenceRate, progressive, 2.5, Fields(1), Fields(5), Fields(5)},
-            // An odd sequence frame gives the spare tick to the later field, also
-            // when that comes first (lower field first).
-            {kFieldRate, oddRate, MF::FrameTime(Ticks(0), Ticks(500)), 1.0, Fields(1), Ticks(500),
-             Ticks(501)},
-            {kFieldRate, oddRate, MF::FrameTime(Ticks(500), Ticks(0)), 1.0, Fields(1), Ticks(501),
-             Ticks(500)}};
-    for (const auto& [upstream, sequence, time, rate, reference, first, second] : cases)
-        EXPECT_EQ(Durations(upstream, sequence, time, rate), std::tuple(reference, first, second))
-            << "rate " << rate << " at " << time.GetTime().GetTicks();
-}
-
 TEST_F(SampleWeightingTest, RangesWeighEachSampleByTheShareItCovers)
 {
     // Output frame 4 at speed 2.5: media (20P, 22.5P); each output field spans

@@ -106,30 +106,6 @@ TEST_F(MutableCutlistTest, SealingSortsTrimsMergesAndHashesTheResultInOrder)
     }
 }
 
-TEST_F(MutableCutlistTest, EmptyNodesAreRefusedUnlessTheRangeIsEmptyAndTreesAreKeptByHash)
-{
-    CutlistRef list = NewCutlist();
-    list->AddSegment(Ticks(100), Ticks(50), Ticks(0), nullptr);
-    EXPECT_THROW(list->AddSegment(Ticks(0), Ticks(10), Ticks(0), nullptr),
-                 QRT::NullInterfaceException);
-    list->MakeImmutable();
-    EXPECT_EQ(list->GetSegmentCount(), 0u);
-    EXPECT_EQ(StillRangesOf(list),
-              MF::TickTimeRangeList{MF::TickTimeRange(mvxmediatypes::kTime_Zero, kTime_Max)});
-    NodeRef node;
-    EXPECT_EQ(Sealed({{5, 5, 0, 'A'}})->GetNodeByHash(Node('A')->GetNodeHash(), node),
-              QRT::kResult_NotFound)
-        << "an ignored empty range stores no node";
-    // Node trees are stored once per hash and the later one is kept.
-    const NodeRef twin = MakeLeaf("NodeA");
-    list = NewCutlist();
-    list->AddSegment(Ticks(0), Ticks(10), Ticks(0), Node('A'));
-    list->AddSegment(Ticks(20), Ticks(30), Ticks(0), twin);
-    list->MakeImmutable();
-    EXPECT_EQ(list->GetNodeByHash(Node('A')->GetNodeHash(), node), QRT::kResult_Success);
-    EXPECT_TRUE(node == twin);
-}
-
 TEST_F(MutableCutlistTest, LookupsByTimeHonourHalfOpenBoundariesAndMapBothFields)
 {
     const CutlistRef list =
