@@ -74,6 +74,13 @@ TEST_F(SampleWeightingTest, RangesWeighEachSampleByTheShareItCovers)
     EXPECT_TRUE(samples.empty());
 }
 
+TEST_F(SampleWeightingTest, AnOddFrameGivesTheSpareTickToTheLaterFieldAlsoWhenItComesFirst)
+{
+    EXPECT_EQ(
+        Durations(kFieldRate, FrameRate::Create(1001), MF::FrameTime(Ticks(500), Ticks(0)), 1.0),
+        std::tuple(Fields(1), Ticks(501), Ticks(500)));
+}
+
 TEST_F(SampleWeightingTest, BadArgumentsBreakContracts)
 {
     MF::WeightedSampleList samples;

@@ -4,7 +4,6 @@
 #include <cmath>
 #include <cstdint>
 #include <functional>
-#include <iterator>
 #include <limits>
 #include <tuple>
 #include <utility>
@@ -41,6 +40,10 @@ TEST_F(FrameRateTest, NamedRatesAreExactRationals)
     EXPECT_EQ(FrameRate::FromValue(0.0), kFrameRate_Zero);
     EXPECT_EQ(kFrameRate_Video25.FrameToTime(-3).GetTicks(), -3 * 28'224'000LL);
     EXPECT_EQ(kFrameRate_Video25.FrameToTime(kInt64Max), kTime_Max);
+    // Zero first, then ascending frames per second.
+    EXPECT_TRUE(kFrameRate_Zero < FrameRate::Create(kInt64Max) &&
+                FrameRate::Create(kInt64Max) < kFrameRate_Video2398 &&
+                kFrameRate_Video2398 < kFrameRate_Audio48000);
 }
 
 TEST_F(FrameRateTest, BadInputViolatesContracts)

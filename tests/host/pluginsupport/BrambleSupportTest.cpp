@@ -1,6 +1,5 @@
 #include "BrambleSupport/BrambleSupport.h"
 
-#include <string>
 #include <tuple>
 
 #include <gtest/gtest.h>

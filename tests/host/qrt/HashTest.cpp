@@ -3,7 +3,6 @@
 #include "mvxcore/config/Error.h"
 
 #include <cstring>
-#include <string>
 #include <vector>
 
 #include <gtest/gtest.h>
