@@ -5,7 +5,6 @@
 #include "TestCutlists.h"
 #include "TestFrames.h"
 #include "TestNode.h"
-#include "TestPrefetch.h"
 #include "TestProducer.h"
 #include "VF/SharedVideoFrameCache.h"
 
@@ -28,17 +27,14 @@ TickTime Ticks(std::int64_t inTicks)
     return TickTime::TicksToTime(inTicks);
 }
 
-// A node whose producer makes frames as the parameters ask, with its own
-// prefetch handle.
+// A node whose producer makes frames as the parameters ask.
 QRT::InterfaceRef<TestNode> SizedNode(std::uint32_t inSeed)
 {
     auto producer = QRT::Allocated<TestProducer>::CreateInstance();
     producer->mHash = QRT::Guid(0x0a000000u + inSeed, 0, 0, {0, 0, 0, 0, 0, 0, 0, 1});
     producer->mFormat = mvxmediatypes::kPixelFormat_Invalid;
     producer->mWidth = 0;
-    auto node = NewNode(producer);
-    node->mPrefetch = QRT::Allocated<TestPrefetch>::CreateInstance();
-    return node;
+    return NewNode(producer);
 }
 
 TestProducer& ProducerOf(const QRT::InterfaceRef<TestNode>& inNode)

@@ -3,7 +3,6 @@
 
 #include "ContractExpect.h"
 #include "ML/IMutableCutlist.h"
-#include "QRT/Exception.h"
 #include "TestNodeKinds.h"
 
 #include <tuple>
