@@ -69,8 +69,15 @@ protected:
     }
 };
 
-TEST_F(SharedVideoFrameCacheTest, EvictsPriorityZeroBeforeTenThenTheLeastRecentlyUsed)
+TEST_F(SharedVideoFrameCacheTest,
+       RefusesBadInputAndEvictsPriorityZeroBeforeTenThenTheLeastRecentlyUsed)
 {
+    // Bad input is a contract error and changes nothing.
+    EXPECT_INPUT_CONTRACT(mCache.InsertIntoCache(Frame(), KeyFor(0), 0), "inFrame != nullptr");
+    EXPECT_INPUT_CONTRACT(mCache.InsertIntoCache(MakeTagged(0), Guid(), 0), "!inKey.IsNil()");
+    EXPECT_INPUT_CONTRACT(mCache.InsertIntoCache(MakeTagged(0), KeyFor(0), -1), "inPriority >= 0");
+    EXPECT_INPUT_CONTRACT(mCache.UnregisterDependencyOnFrame(KeyFor(3)), "registered");
+    EXPECT_EQ(Counts(mCache), (Expected{0, 0, 0, 0, 0, 0, 0}));
     Insert(0, VF::kCachePriority_High);
     Insert(1, VF::kCachePriority_Low);
     Insert(2, VF::kCachePriority_High);
@@ -127,15 +134,6 @@ TEST_F(SharedVideoFrameCacheTest, DependencyPinsAFrameUntilUnregisteredAndSurviv
         EXPECT_EQ(mCache.GetDependencyCount(KeyFor(i)), 1u);
         mCache.UnregisterDependencyOnFrame(KeyFor(i));
     }
-}
-
-TEST_F(SharedVideoFrameCacheTest, BadInputIsAContractError)
-{
-    EXPECT_INPUT_CONTRACT(mCache.InsertIntoCache(Frame(), KeyFor(0), 0), "inFrame != nullptr");
-    EXPECT_INPUT_CONTRACT(mCache.InsertIntoCache(MakeTagged(0), Guid(), 0), "!inKey.IsNil()");
-    EXPECT_INPUT_CONTRACT(mCache.InsertIntoCache(MakeTagged(0), KeyFor(0), -1), "inPriority >= 0");
-    EXPECT_INPUT_CONTRACT(mCache.UnregisterDependencyOnFrame(KeyFor(3)), "registered");
-    EXPECT_EQ(Counts(mCache), (Expected{0, 0, 0, 0, 0, 0, 0}));
 }
 
 TEST_F(SharedVideoFrameCacheTest, NotificationIsCalledOutsideEveryLock)

@@ -67,7 +67,7 @@ protected:
     }
 };
 
-TEST_F(MutableCutlistTest, SealingSortsTrimsMergesAndHashesTheResultInOrder)
+TEST_F(MutableCutlistTest, SealingOnceSortsTrimsMergesAndHashesTheResultInOrder)
 {
     // The segments added, then those sealed.
     const std::pair<Segs, Segs> cases[] = {
@@ -102,7 +102,11 @@ TEST_F(MutableCutlistTest, SealingSortsTrimsMergesAndHashesTheResultInOrder)
             runs.insert(runs.end(), {BytesOf(start), BytesOf(end), BytesOf(offset),
                                      BytesOf(Node(node)->GetNodeHash())});
         EXPECT_EQ(list->GetCutlistHash(), HashOfRuns(runs));
+        EXPECT_INPUT_CONTRACT(list->AddSegment(Ticks(0), Ticks(1), Ticks(0), Node('A')),
+                              "mMutable");
+        EXPECT_INPUT_CONTRACT(list->MakeImmutable(), "mMutable");
     }
+    EXPECT_INPUT_CONTRACT(NewCutlist()->GetCutlistHash(), "!mMutable");
 }
 
 TEST_F(MutableCutlistTest, LookupsByTimeHonourHalfOpenBoundariesAndMapBothFields)
@@ -143,15 +147,6 @@ TEST_F(MutableCutlistTest, LookupsByTimeHonourHalfOpenBoundariesAndMapBothFields
     EXPECT_EQ(list->GetNodeAtTime(params, node, local), QRT::kResult_Success);
     EXPECT_TRUE(node == Node('A'));
     EXPECT_EQ(local, MF::FrameTime(Ticks(1110), Ticks(1095)));
-}
-
-TEST_F(MutableCutlistTest, ContractsGuardSealing)
-{
-    CutlistRef list = NewCutlist();
-    EXPECT_INPUT_CONTRACT(list->GetCutlistHash(), "!mMutable");
-    list->MakeImmutable();
-    EXPECT_INPUT_CONTRACT(list->AddSegment(Ticks(0), Ticks(1), Ticks(0), Node('A')), "mMutable");
-    EXPECT_INPUT_CONTRACT(list->MakeImmutable(), "mMutable");
 }
 
 TEST_F(MutableCutlistTest, GapsStillSegmentsAndNodeRangesMakeTheStillList)
