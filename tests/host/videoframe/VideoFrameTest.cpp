@@ -157,7 +157,8 @@ TEST_F(VideoFrameTest, AlphaAnalysisIsRememberedUntilAlphaChanged)
     const float pixels[8] = {0, 0, 0, 1.0f, 0.5f, 0.5f, 0.5f, 1.0f};
     std::memcpy(floats->GetWritableBaseAddress(), pixels, sizeof pixels);
     EXPECT_TRUE(floats->IsAlphaOpaque());
-    EXPECT_TRUE(MakeFrame(mt::kPixelFormat_YUYV_422_8u, 4, 2)->IsAlphaOpaque());
+    const Frame yuyv = MakeFrame(mt::kPixelFormat_YUYV_422_8u, 4, 2);
+    EXPECT_TRUE(yuyv->IsAlphaOpaque() && !yuyv->HasAlpha());
 }
 
 using CopyOnWriteTest = ::testing::Test;
