@@ -43,7 +43,8 @@ TEST_F(FrameRateTest, NamedRatesAreExactRationals)
     // Zero first, then ascending frames per second.
     EXPECT_TRUE(kFrameRate_Zero < FrameRate::Create(kInt64Max) &&
                 FrameRate::Create(kInt64Max) < kFrameRate_Video2398 &&
-                kFrameRate_Video2398 < kFrameRate_Audio48000);
+                kFrameRate_Video2398 < kFrameRate_Audio48000 &&
+                kFrameRate_Audio48000 > kFrameRate_Video2398);
 }
 
 TEST_F(FrameRateTest, BadInputViolatesContracts)

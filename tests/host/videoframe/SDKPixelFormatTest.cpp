@@ -72,6 +72,12 @@ TEST_F(OvPixTest, HandleDescribesASharedFrameReadOnlyAndHoldsItUntilDisposed)
     }
     EXPECT_FALSE(VF::GetOvPixHandFrameMapping(handle));
     EXPECT_EQ(VF::NewOvPixFromVideoFrame(Frame()), nullptr);
+    // An unshared frame is described writable.
+    const Frame writable = MakeFrame(mt::kPixelFormat_BGRA_4444_8u, 2, 2);
+    const VF::OvPix writableHandle = VF::NewOvPixFromVideoFrame(writable);
+    EXPECT_EQ(std::pair(writableHandle->mPixels, writableHandle->mReadOnly),
+              std::pair(writable->GetWritableBaseAddress(), 0));
+    EXPECT_TRUE(VF::DisposeOvPixFromVideoFrame(writableHandle));
 }
 
 } // namespace

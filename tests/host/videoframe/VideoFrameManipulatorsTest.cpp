@@ -80,6 +80,10 @@ TEST_F(VideoFrameManipulatorsTest, CatalogueFormatsMapToTheirIRFormats)
     EXPECT_FALSE(VF::GetIRFrameBuffer(*frame).IsAddressable());
     frame->MarkShared(1);
     EXPECT_INPUT_CONTRACT(VF::GetWritableIRFrameBuffer(*frame), "!inFrame.IsShared()");
+    // Without a format asked for, a frame is its own addressable frame.
+    EXPECT_EQ(VideoFrameManipulators::MakeAddressableVideoFrame(frame, mt::kPixelFormat_Any,
+                                                                mt::kRenderQuality_High),
+              frame);
 }
 
 TEST_F(VideoFrameManipulatorsTest, EightBitThroughEachStagedFormatAndBack)
@@ -115,6 +119,10 @@ TEST_F(VideoFrameManipulatorsTest, BadFramesAreContractErrorsAndSharedFramesAreN
     shared->MarkShared(1);
     EXPECT_INPUT_CONTRACT(Copy(source, shared), "!inDestination->IsShared()");
     EXPECT_INPUT_CONTRACT(VideoFrameManipulators::OpaqueAlpha(shared), "!ioFrame->IsShared()");
+    EXPECT_INPUT_CONTRACT(VideoFrameManipulators::CopyFrameWithFields(source, GreyRows({0, 0}),
+                                                                      mt::kRenderQuality_High, 3),
+                          "inFieldSelection == kFieldSelection_Frame || inFieldSelection == "
+                          "kFieldSelection_First || inFieldSelection == kFieldSelection_Second");
     EXPECT_EQ(Greys(shared, 1), (std::vector<int>{99, 99}));
 }
 
