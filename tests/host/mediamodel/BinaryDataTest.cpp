@@ -3,7 +3,6 @@
 #include "ContractExpect.h"
 
 #include <array>
-#include <string>
 #include <vector>
 
 #include <gtest/gtest.h>

@@ -44,51 +44,6 @@ MF::WeightedSampleList Range(TickTime inStart, TickTime inEnd, const FrameRate& 
 
 using SampleWeightingTest = ::testing::Test;
 
-TEST_F(SampleWeightingTest, DurationsScaleWithTheRateAndIgnoreItsSign)
-{
-    const MF::FrameTime fast(Fields(20), HalfFields(45));
-    const MF::FrameTime progressive(Fields(8));
-    const FrameRate oddRate = FrameRate::Create(1001);
-    const std::tuple<FrameRate, FrameRate, MF::FrameTime, double, TickTime, TickTime, TickTime>
-        cases[] = {
-            {kFieldRate, kSequenceRate, fast, 2.5, Fields(1), Ticks(29'429'400), Ticks(29'429'400)},
-            {kFieldRate, kSequenceRate, fast, -0.5, Fields(1), Ticks(5'885'880), Ticks(5'885'880)},
-            // Progressive output covers the whole frame: at 2.5, five fields.
-            {kFieldRate, kSequenceRate, progressive, 2.5, Fields(1), Fields(5), Fields(5)},
-            // An odd sequence frame gives the spare tick to the later field, also
-            // when that comes first (lower field first).
-            {kFieldRate, oddRate, MF::FrameTime(Ticks(0), Ticks(500)), 1.0, Fields(1), Ticks(500),
-             Ticks(501)},
-            {kFieldRate, oddRate, MF::FrameTime(Ticks(500), Ticks(0)), 1.0, Fields(1), Ticks(501),
-             Ticks(500)}};
-    for (const auto& [upstream, sequence, time, rate, reference, first, second] : cases)
-        EXPECT_EQ(Durations(upstream, sequence, time, rate), std::tuple(reference, first, second))
-            << "rate " << rate << " at " << time.GetTime().GetTicks();
-}
-
-TEST_F(SampleWeightingTest, SamplesAroundATimeAndTheLaterSamplesShare)
-{
-    // Output frame 9 of an upper-first 29.97i sequence at speed 0.5: media time
-    // (9P, 9.5P). The first field lies on upstream field 9, the second half-way
-    // between fields 9 and 10.
-    TickTime t1a, t1b, t2a, t2b;
-    MF::GetSamplesAroundTime(MF::FrameTime(Fields(9), HalfFields(19)), kFieldRate, t1a, t1b, t2a,
-                             t2b);
-    EXPECT_EQ(std::tuple(t1a, t1b, t2a, t2b),
-              std::tuple(Fields(9), Fields(9), Fields(9), Fields(10)));
-    EXPECT_EQ(MF::CalculateSampleWeight(Fields(9), t1a, t1b), 0.0f);
-    EXPECT_EQ(MF::CalculateSampleWeight(HalfFields(19), t2a, t2b), 0.5f);
-    // Negative times round down.
-    MF::GetSamplesAroundTime(MF::FrameTime(Ticks(-1), Ticks(kField - 1)), kFieldRate, t1a, t1b, t2a,
-                             t2b);
-    EXPECT_EQ(std::tuple(t1a, t1b, t2a, t2b),
-              std::tuple(Fields(-1), Fields(0), Fields(0), Fields(1)));
-    // The share of the later sample, clamped outside the pair.
-    EXPECT_EQ(MF::CalculateSampleWeight(Ticks(4 * kField + kField / 4), Fields(4), Fields(5)),
-              0.25f);
-    EXPECT_EQ(MF::CalculateSampleWeight(Fields(7), Fields(4), Fields(5)), 1.0f);
-}
-
 TEST_F(SampleWeightingTest, RangesWeighEachSampleByTheShareItCovers)
 {
     // Output frame 4 at speed 2.5: media (20P, 22.5P); each output field spans
@@ -117,6 +72,13 @@ TEST_F(SampleWeightingTest, RangesWeighEachSampleByTheShareItCovers)
     samples.clear();
     MF::NormalizeSampleWeights(samples);
     EXPECT_TRUE(samples.empty());
+}
+
+TEST_F(SampleWeightingTest, AnOddFrameGivesTheSpareTickToTheLaterFieldAlsoWhenItComesFirst)
+{
+    EXPECT_EQ(
+        Durations(kFieldRate, FrameRate::Create(1001), MF::FrameTime(Ticks(500), Ticks(0)), 1.0),
+        std::tuple(Fields(1), Ticks(501), Ticks(500)));
 }
 
 TEST_F(SampleWeightingTest, BadArgumentsBreakContracts)

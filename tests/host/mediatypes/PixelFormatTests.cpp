@@ -1,7 +1,6 @@
 #include "mvxmediatypes/PixelFormat.h"
 
 #include <set>
-#include <string>
 #include <tuple>
 #include <vector>
 

@@ -1,6 +1,5 @@
 #include "BrambleSupport/BrambleSupport.h"
 
-#include <string>
 #include <tuple>
 
 #include <gtest/gtest.h>
@@ -62,7 +61,7 @@ TEST_F(BrambleSupportTest, SessionsAreCountedAndTheLastShutdownWithdrawsEverySui
     EXPECT_EQ(BrambleSupport_ReleaseSuite(kName, 1), BRAMBLE_SUITE_OK);
 }
 
-TEST_F(BrambleSupportTest, VersionsOfOneNameShareATableAndBadArgumentsAreRefused)
+TEST_F(BrambleSupportTest, VersionsOfOneNameShareATableBadArgumentsAreRefusedAndCCallsThrough)
 {
     BrambleSupport::Initialize();
     EXPECT_EQ(BrambleSupport::RegisterSuite(kName, 2, &kTimesThreeSuite), 0);
@@ -87,11 +86,7 @@ TEST_F(BrambleSupportTest, VersionsOfOneNameShareATableAndBadArgumentsAreRefused
                                                               : name ? BRAMBLE_SUITE_NOT_ACQUIRED
                                                                      : BRAMBLE_SUITE_BAD_ARGUMENT);
     }
-}
-
-TEST_F(BrambleSupportTest, PlainCPluginCallsThroughTheBasicSuite)
-{
-    BrambleSupport::Initialize();
+    // A plain C plug-in calls through the basic suite.
     ASSERT_EQ(BrambleSupport::RegisterSuite("Arithmetic Suite", 1, &kTimesThreeSuite), 0);
     ASSERT_EQ(BrambleSupport::RegisterSuite("Arithmetic Suite", 2, &kPlusOneSuite), 0);
     for (const auto& [version, result] : {std::pair{1, 42}, {2, 15}, {3, -1}})

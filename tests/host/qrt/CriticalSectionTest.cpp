@@ -16,7 +16,7 @@ void OnOtherThread(Body inBody)
     std::thread(inBody).join();
 }
 
-TEST(CriticalSectionTest, LabelIsKeptWhileHeldAndUnlockRelockLetOthersIn)
+TEST(CriticalSectionTest, LabelIsKeptWhileHeldUnlockRelockLetOthersInAndMisuseBreaksContracts)
 {
     QRT::CriticalSection section;
     {
@@ -37,13 +37,10 @@ TEST(CriticalSectionTest, LabelIsKeptWhileHeldAndUnlockRelockLetOthersIn)
     EXPECT_STREQ(section.GetOwnerLabel(), "outer");
     OnOtherThread([&] { taken = section.TryLock(); });
     EXPECT_FALSE(taken);
-}
-
-TEST(CriticalSectionTest, RelockingOrUnlockingWithoutHoldingIsAContractViolation)
-{
-    QRT::CriticalSection section;
+    // Relocking or unlocking without holding is a contract violation.
+    lock.Unlock();
     EXPECT_INPUT_CONTRACT(section.Unlock(), "IsLockedByCurrentThread()");
-    QRT::CriticalSectionLock lock(section);
+    lock.Relock();
     EXPECT_INPUT_CONTRACT(section.Lock(), "!IsLockedByCurrentThread()");
     EXPECT_INPUT_CONTRACT(section.TryLock(), "!IsLockedByCurrentThread()");
     EXPECT_INPUT_CONTRACT(lock.Relock(), "!mLocked");

@@ -3,7 +3,6 @@
 #include "mvxcore/config/Error.h"
 
 #include <cstring>
-#include <string>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -33,27 +32,24 @@ QRT::HashValue ReferenceMix(const QRT::HashValue& inHash, const void* inData, si
     return result;
 }
 
-TEST(HashTest, RunningLengthCountsEveryMixedByteModulo2To32)
+TEST(HashTest, EveryRunFollowsTheChainingRuleAndTheRunningLengthWraps)
 {
-    QRT::HashValue hash;
-    EXPECT_TRUE(hash.IsZero());
+    QRT::HashValue wrapping;
+    EXPECT_TRUE(wrapping.IsZero());
     // An empty run still changes the value.
-    QRT::MixHash::MixInData(hash, nullptr, 0);
-    EXPECT_FALSE(hash.IsZero());
-    EXPECT_EQ(hash.GetRunningLength(), 0u);
-    QRT::MixHash::MixInValue(hash, uint64_t{7});
-    EXPECT_EQ(hash.GetRunningLength(), 8u);
-    hash.mBytes[12] = 0xFE;
-    hash.mBytes[13] = hash.mBytes[14] = hash.mBytes[15] = 0xFF;
-    QRT::MixHash::MixInString(hash, "abc");
-    EXPECT_EQ(hash.GetRunningLength(), 1u);
-    const QRT::HashValue before = hash;
-    EXPECT_THROW(QRT::MixHash::MixInData(hash, nullptr, 4), mvxcore::config::Error);
-    EXPECT_EQ(hash, before);
-}
-
-TEST(HashTest, EveryRunFollowsTheChainingRuleAndGuidsMixAsTheirBytes)
-{
+    QRT::MixHash::MixInData(wrapping, nullptr, 0);
+    EXPECT_FALSE(wrapping.IsZero());
+    EXPECT_EQ(wrapping.GetRunningLength(), 0u);
+    QRT::MixHash::MixInValue(wrapping, uint64_t{7});
+    EXPECT_EQ(wrapping.GetRunningLength(), 8u);
+    wrapping.mBytes[12] = 0xFE;
+    wrapping.mBytes[13] = wrapping.mBytes[14] = wrapping.mBytes[15] = 0xFF;
+    QRT::MixHash::MixInString(wrapping, "abc");
+    EXPECT_EQ(wrapping.GetRunningLength(), 1u);
+    const QRT::HashValue before = wrapping;
+    EXPECT_THROW(QRT::MixHash::MixInData(wrapping, nullptr, 4), mvxcore::config::Error);
+    EXPECT_EQ(wrapping, before);
+    // Every run follows the chaining rule; Guids mix as their bytes.
     QRT::HashValue expected;
     expected = ReferenceMix(expected, "ML::RenderableNodeCommonImpl", 28);
     const uint32_t quality = 5;

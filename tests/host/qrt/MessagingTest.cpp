@@ -1,5 +1,4 @@
 #include "QRT/Allocator.h"
-#include "QRT/Hash.h"
 #include "QRT/Message.h"
 #include "QRT/StationRegistry.h"
 #include "QRT/StationUtils.h"
@@ -16,7 +15,6 @@
 #include <vector>
 
 #include <gtest/gtest.h>
-#include <xxhash.h>
 
 namespace
 {
@@ -121,24 +119,6 @@ protected:
     std::vector<QRT::ImmutableString> mStations;
     int64_t mBlocksBefore = 0;
 };
-
-TEST_F(MessagingTest, MessageIDIsTheFirstWordOfTheNameHashAndCloneCopiesThePayload)
-{
-    // XXH3-128 over the zero value with the running length set to the name's
-    // size, then the name; the identifier is the low 32 bits of the digest.
-    const std::string name = "QRTTest::NumberMessage";
-    std::vector<uint8_t> input(16, 0);
-    input[12] = static_cast<uint8_t>(name.size());
-    input.insert(input.end(), name.begin(), name.end());
-    const auto expected =
-        static_cast<QRT::MessageID>(XXH3_128bits(input.data(), input.size()).low64);
-    const QRT::MessagePtr clone = Number(NumberMessage{12}).Clone();
-    EXPECT_EQ(clone->GetMessageID(), expected);
-    EXPECT_NE(QRT::MessageImpl<OtherMessage>::GetStaticMessageID(), expected);
-    EXPECT_EQ(ValueOf(*clone), 12);
-    EXPECT_EQ(clone->GetTypeName(), name);
-    EXPECT_EQ(clone->GetPayloadIf<OtherMessage>(), nullptr);
-}
 
 TEST_F(MessagingTest, RegistrationRefusesTakenAndEmptyNamesAndUnknownStationsDropMessages)
 {

@@ -7,7 +7,7 @@
 namespace
 {
 
-TEST(ParamTest, RectSizesAreEdgeDifferencesThatWrapInsteadOfOverflowing)
+TEST(ParamTest, RectSizesWrapInsteadOfOverflowingAndColoursReadAsRGBInMemory)
 {
     EXPECT_EQ(QRT::ParamRect(10, 20, 1930, 1100).Height(), 1080);
     EXPECT_FALSE(QRT::ParamRect(10, 20, 1930, 1100).IsEmpty());
@@ -18,10 +18,7 @@ TEST(ParamTest, RectSizesAreEdgeDifferencesThatWrapInsteadOfOverflowing)
     EXPECT_EQ(QRT::ParamRect(0, 0, 4, 3), QRT::ParamRect(0, 0, 4, 3));
     EXPECT_NE(QRT::ParamRect(0, 0, 4, 3), QRT::ParamRect(0, 1, 4, 3));
     EXPECT_NE(QRT::ParamRect(0, 0, 4, 3), QRT::ParamRect(0, 0, 4, 4));
-}
-
-TEST(ParamTest, ColorPacksRedInTheLowestByteSoMemoryReadsAsRGB)
-{
+    // Colours pack red in the lowest byte, so memory reads as RGB.
     const QRT::ParamColor color = QRT::ParamColor::FromRGBA(0xAB, 0xCD, 0xEF, 0x44);
     EXPECT_EQ(color.GetValue(), 0x44EFCDABu);
     EXPECT_EQ(color.Red() << 24 | color.Green() << 16 | color.Blue() << 8 | color.Alpha(),

@@ -21,16 +21,6 @@ using Expected = std::tuple<uint64_t, uint64_t, uint64_t, uint64_t, uint64_t, ui
 
 using FrameMemoryPoolTest = ::testing::Test;
 
-TEST_F(FrameMemoryPoolTest, SizeClassesRoundUpWithBoundedWaste)
-{
-    // Whole pages up to 32 KiB, then 4 KiB steps, then bounded steps.
-    const std::pair<size_t, size_t> classes[] = {{1, 4096},      {4096, 4096},
-                                                 {4097, 8192},   {32768, 32768},
-                                                 {33000, 36864}, {1920 * 4 * 1080, 8388608}};
-    for (const auto& [bytes, sizeClass] : classes)
-        EXPECT_EQ(VF::FrameMemoryPool::SizeClassFor(bytes), sizeClass) << bytes;
-}
-
 TEST_F(FrameMemoryPoolTest, CapTrimsLeastRecentlyReturnedFirstAndRefusesLargerBuffers)
 {
     VF::FrameMemoryPool pool(8192);

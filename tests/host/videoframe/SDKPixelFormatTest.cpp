@@ -40,31 +40,20 @@ TEST_F(SDKPixelFormatTest, CatalogueFormatsHaveTheirCodesBothWays)
 
 using OvPixTest = ::testing::Test;
 
-TEST_F(OvPixTest, HandleDescribesTheFramesPixelsReadOnlyWhenShared)
+TEST_F(OvPixTest, HandleDescribesASharedFrameReadOnlyAndHoldsItUntilDisposed)
 {
-    for (const bool shared : {false, true})
-    {
-        const Frame frame = MakeFrame(mt::kPixelFormat_BGRA_4444_32f, 5, 3);
-        frame->MarkShared(shared);
-        const VF::OvPix handle = VF::NewOvPixFromVideoFrame(frame);
-        ASSERT_NE(handle, nullptr);
-        EXPECT_EQ(std::tuple(handle->mLeft, handle->mTop, handle->mRight, handle->mBottom,
-                             handle->mRowBytes, handle->mPixelFormat, handle->mPixels,
-                             handle->mReadOnly),
-                  std::tuple(0, 0, 5, 3, frame->GetRowBytes(), VF::kOvPixelFormat_BGRA_4444_32f,
-                             frame->GetBaseAddress(), shared ? 1 : 0));
-        EXPECT_EQ(QRT::QueryRef<MF::IVideoFrame>(VF::GetOvPixHandFrameMapping(handle)).Get(),
-                  frame.Get());
-        EXPECT_TRUE(VF::DisposeOvPixFromVideoFrame(handle));
-    }
-}
-
-TEST_F(OvPixTest, HandleHoldsTheFrameUntilDisposed)
-{
-    Frame frame = MakeFrame(mt::kPixelFormat_BGRA_4444_8u, 2, 2);
+    Frame frame = MakeFrame(mt::kPixelFormat_BGRA_4444_32f, 5, 3);
+    frame->MarkShared(1);
     MF::IVideoFrame* const raw = frame.Get();
     const size_t liveBefore = VF::GetLiveOvPixCount();
     const VF::OvPix handle = VF::NewOvPixFromVideoFrame(frame);
+    ASSERT_NE(handle, nullptr);
+    EXPECT_EQ(std::tuple(handle->mLeft, handle->mTop, handle->mRight, handle->mBottom,
+                         handle->mRowBytes, handle->mPixelFormat, handle->mPixels,
+                         handle->mReadOnly),
+              std::tuple(0, 0, 5, 3, frame->GetRowBytes(), VF::kOvPixelFormat_BGRA_4444_32f,
+                         frame->GetBaseAddress(), 1));
+    EXPECT_EQ(QRT::QueryRef<MF::IVideoFrame>(VF::GetOvPixHandFrameMapping(handle)).Get(), raw);
     EXPECT_EQ(VF::GetLiveOvPixCount(), liveBefore + 1);
     // The handle keeps the frame alive after the caller lets go.
     frame.Reset();
@@ -83,6 +72,12 @@ TEST_F(OvPixTest, HandleHoldsTheFrameUntilDisposed)
     }
     EXPECT_FALSE(VF::GetOvPixHandFrameMapping(handle));
     EXPECT_EQ(VF::NewOvPixFromVideoFrame(Frame()), nullptr);
+    // An unshared frame is described writable.
+    const Frame writable = MakeFrame(mt::kPixelFormat_BGRA_4444_8u, 2, 2);
+    const VF::OvPix writableHandle = VF::NewOvPixFromVideoFrame(writable);
+    EXPECT_EQ(std::pair(writableHandle->mPixels, writableHandle->mReadOnly),
+              std::pair(writable->GetWritableBaseAddress(), 0));
+    EXPECT_TRUE(VF::DisposeOvPixFromVideoFrame(writableHandle));
 }
 
 } // namespace

@@ -69,21 +69,15 @@ protected:
     }
 };
 
-TEST_F(SharedVideoFrameCacheTest, MissThenHitAndInsertionMarksShared)
+TEST_F(SharedVideoFrameCacheTest,
+       RefusesBadInputAndEvictsPriorityZeroBeforeTenThenTheLeastRecentlyUsed)
 {
-    EXPECT_FALSE(mCache.RetrieveFromCache(KeyFor(0)));
-    const Frame frame = MakeTagged(7);
-    mCache.InsertIntoCache(frame, KeyFor(0), VF::kCachePriority_Low);
-    EXPECT_TRUE(frame->IsShared());
-    EXPECT_EQ(mCache.RetrieveFromCache(KeyFor(0)).Get(), frame.Get());
-    // Reinsertion under the same key replaces the frame and keeps the bytes exact.
-    mCache.InsertIntoCache(MakeTagged(2), KeyFor(0), 10);
-    EXPECT_EQ(TagOf(mCache.RetrieveFromCache(KeyFor(0))), 2);
-    EXPECT_EQ(Counts(mCache), (Expected{2, 1, 2, 0, 0, kFrameBytes, 1}));
-}
-
-TEST_F(SharedVideoFrameCacheTest, EvictsPriorityZeroBeforeTenThenTheLeastRecentlyUsed)
-{
+    // Bad input is a contract error and changes nothing.
+    EXPECT_INPUT_CONTRACT(mCache.InsertIntoCache(Frame(), KeyFor(0), 0), "inFrame != nullptr");
+    EXPECT_INPUT_CONTRACT(mCache.InsertIntoCache(MakeTagged(0), Guid(), 0), "!inKey.IsNil()");
+    EXPECT_INPUT_CONTRACT(mCache.InsertIntoCache(MakeTagged(0), KeyFor(0), -1), "inPriority >= 0");
+    EXPECT_INPUT_CONTRACT(mCache.UnregisterDependencyOnFrame(KeyFor(3)), "registered");
+    EXPECT_EQ(Counts(mCache), (Expected{0, 0, 0, 0, 0, 0, 0}));
     Insert(0, VF::kCachePriority_High);
     Insert(1, VF::kCachePriority_Low);
     Insert(2, VF::kCachePriority_High);
@@ -140,15 +134,6 @@ TEST_F(SharedVideoFrameCacheTest, DependencyPinsAFrameUntilUnregisteredAndSurviv
         EXPECT_EQ(mCache.GetDependencyCount(KeyFor(i)), 1u);
         mCache.UnregisterDependencyOnFrame(KeyFor(i));
     }
-}
-
-TEST_F(SharedVideoFrameCacheTest, BadInputIsAContractError)
-{
-    EXPECT_INPUT_CONTRACT(mCache.InsertIntoCache(Frame(), KeyFor(0), 0), "inFrame != nullptr");
-    EXPECT_INPUT_CONTRACT(mCache.InsertIntoCache(MakeTagged(0), Guid(), 0), "!inKey.IsNil()");
-    EXPECT_INPUT_CONTRACT(mCache.InsertIntoCache(MakeTagged(0), KeyFor(0), -1), "inPriority >= 0");
-    EXPECT_INPUT_CONTRACT(mCache.UnregisterDependencyOnFrame(KeyFor(3)), "registered");
-    EXPECT_EQ(Counts(mCache), (Expected{0, 0, 0, 0, 0, 0, 0}));
 }
 
 TEST_F(SharedVideoFrameCacheTest, NotificationIsCalledOutsideEveryLock)

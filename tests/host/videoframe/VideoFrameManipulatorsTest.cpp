@@ -75,18 +75,15 @@ TEST_F(VideoFrameManipulatorsTest, CatalogueFormatsMapToTheirIRFormats)
         {mt::kPixelFormat_YUYV_422_8u, 0x200u}};
     for (const auto& [format, ir] : mapped)
         EXPECT_EQ(VF::BEPixelFormatToIRPixelFormat(format), ir) << mt::GetPixelFormatName(format);
-    EXPECT_EQ(VF::BEPixelFormatToIRPixelFormat(mt::kPixelFormat_YUYV_422_8u_Fields),
-              VF::kIR_PixelFormat_Invalid);
-    // The buffer of plane 0.
-    const Frame frame = MakeFrame(kBGRA32f, 5, 3);
-    const VF::IRFrameBuffer buffer = VF::GetIRFrameBuffer(*frame);
-    EXPECT_EQ(
-        std::tuple(buffer.mBase, buffer.mRowBytes, buffer.mFormat, buffer.mWidth, buffer.mHeight),
-        std::tuple(frame->GetBaseAddress(), 128, kIR_PixelFormat_BGRA_32f, 5, 3));
+    // Formats without an IR layout are not addressable; a shared frame has no writable buffer.
+    const Frame frame = MakeFrame(mt::kPixelFormat_BGRA_4444_16u, 5, 3);
+    EXPECT_FALSE(VF::GetIRFrameBuffer(*frame).IsAddressable());
     frame->MarkShared(1);
     EXPECT_INPUT_CONTRACT(VF::GetWritableIRFrameBuffer(*frame), "!inFrame.IsShared()");
-    EXPECT_FALSE(
-        VF::GetIRFrameBuffer(*MakeFrame(mt::kPixelFormat_BGRA_4444_16u, 5, 3)).IsAddressable());
+    // Without a format asked for, a frame is its own addressable frame.
+    EXPECT_EQ(VideoFrameManipulators::MakeAddressableVideoFrame(frame, mt::kPixelFormat_Any,
+                                                                mt::kRenderQuality_High),
+              frame);
 }
 
 TEST_F(VideoFrameManipulatorsTest, EightBitThroughEachStagedFormatAndBack)
@@ -113,24 +110,6 @@ TEST_F(VideoFrameManipulatorsTest, EightBitThroughEachStagedFormatAndBack)
     }
 }
 
-TEST_F(VideoFrameManipulatorsTest, FieldsStoredApartAreReorderedExactly)
-{
-    const Frame interleaved = MakeFrame(mt::kPixelFormat_YUYV_422_8u, 4, 5);
-    for (int32_t y = 0; y < 5; ++y)
-        std::memset(Row(interleaved, y), 20 + 10 * y, 8);
-    const Frame apart = MakeFrame(mt::kPixelFormat_YUYV_422_8u_Fields, 4, 5);
-    const Frame back = MakeFrame(mt::kPixelFormat_YUYV_422_8u, 4, 5);
-    ASSERT_EQ(Copy(interleaved, apart, mt::kRenderQuality_Draft), QRT::kResult_Success);
-    ASSERT_EQ(Copy(apart, back, mt::kRenderQuality_Draft), QRT::kResult_Success);
-    // Memory rows: picture rows 0, 2, 4, then 1, 3.
-    const int expected[5] = {20, 40, 60, 30, 50};
-    for (int32_t y = 0; y < 5; ++y)
-    {
-        EXPECT_EQ(Row(apart, y)[7], expected[y]) << y;
-        EXPECT_EQ(std::memcmp(Row(back, y), Row(interleaved, y), 8), 0) << y;
-    }
-}
-
 TEST_F(VideoFrameManipulatorsTest, BadFramesAreContractErrorsAndSharedFramesAreNeverWritten)
 {
     const Frame source = GreyRows({10, 20}), shared = GreyRows({99, 99});
@@ -140,39 +119,11 @@ TEST_F(VideoFrameManipulatorsTest, BadFramesAreContractErrorsAndSharedFramesAreN
     shared->MarkShared(1);
     EXPECT_INPUT_CONTRACT(Copy(source, shared), "!inDestination->IsShared()");
     EXPECT_INPUT_CONTRACT(VideoFrameManipulators::OpaqueAlpha(shared), "!ioFrame->IsShared()");
-    EXPECT_EQ(Greys(shared, 1), (std::vector<int>{99, 99}));
-}
-
-TEST_F(VideoFrameManipulatorsTest, FieldSelectionPicksRowsByFieldOrderAndScaling)
-{
-    // Rows 0, 2, 4, 6 hold 10..40, rows 1, 3, 5, 7 hold 110..140; halved to 4 rows.
-    const Frame source = GreyRows({10, 110, 20, 120, 30, 130, 40, 140});
-    const mt::FieldType upper = mt::kFieldType_UpperFirst, lower = mt::kFieldType_LowerFirst,
-                        progressive = mt::kFieldType_Progressive;
-    const std::tuple<mt::FieldType, mt::FieldType, int32_t, std::vector<int>> cases[] = {
-        // Interlaced to interlaced keeps each field's rows apart; as a whole frame it mixes them.
-        {upper, upper, VF::kFieldSelection_First, {15, 115, 35, 135}},
-        {upper, upper, VF::kFieldSelection_Frame, {60, 70, 80, 90}},
-        // A progressive destination takes the selected field in time: lower first starts with
-        // rows 1, 3, 5, 7.
-        {lower, progressive, VF::kFieldSelection_First, {110, 120, 130, 140}},
-        {lower, progressive, VF::kFieldSelection_Second, {10, 20, 30, 40}},
-        {upper, progressive, VF::kFieldSelection_First, {10, 20, 30, 40}},
-    };
-    const Frame destination = MakeFrame(kBGRA8, 2, 4);
-    for (const auto& [from, to, selection, expected] : cases)
-    {
-        source->SetFieldType(from);
-        destination->SetFieldType(to);
-        ASSERT_EQ(VideoFrameManipulators::CopyFrameWithFields(source, destination,
-                                                              mt::kRenderQuality_High, selection),
-                  QRT::kResult_Success);
-        EXPECT_EQ(Greys(destination, 1), expected) << from << " " << selection;
-    }
-    EXPECT_INPUT_CONTRACT(VideoFrameManipulators::CopyFrameWithFields(source, destination,
+    EXPECT_INPUT_CONTRACT(VideoFrameManipulators::CopyFrameWithFields(source, GreyRows({0, 0}),
                                                                       mt::kRenderQuality_High, 3),
                           "inFieldSelection == kFieldSelection_Frame || inFieldSelection == "
                           "kFieldSelection_First || inFieldSelection == kFieldSelection_Second");
+    EXPECT_EQ(Greys(shared, 1), (std::vector<int>{99, 99}));
 }
 
 TEST_F(VideoFrameManipulatorsTest, SwapFieldsExchangesPictureRowPairs)
@@ -215,21 +166,6 @@ TEST_F(VideoFrameManipulatorsTest, VerticalConvolveWeightsOneTwoOne)
     EXPECT_INPUT_CONTRACT(
         VideoFrameManipulators::VerticalConvolve(source, MakeFrame(kBGRA32f, 2, 4)),
         "inSource->GetPixelFormat() == inDestination->GetPixelFormat()");
-}
-
-TEST_F(VideoFrameManipulatorsTest, MergePulldownTakesTheMissingFieldByHeight)
-{
-    const Frame current = GreyRows(std::vector<uint8_t>(6, 1));
-    const Frame previous = GreyRows(std::vector<uint8_t>(6, 2));
-    ASSERT_EQ(VideoFrameManipulators::MergePulldownFrames(current, previous), QRT::kResult_Success);
-    EXPECT_EQ(Greys(current, 1), (std::vector<int>{2, 1, 2, 1, 2, 1}));
-    // Above 576 rows the second field comes from the previous frame.
-    const Frame tallCurrent = GreyRows(std::vector<uint8_t>(578, 1), 1);
-    const Frame tallPrevious = GreyRows(std::vector<uint8_t>(578, 2), 1);
-    ASSERT_EQ(VideoFrameManipulators::MergePulldownFrames(tallCurrent, tallPrevious),
-              QRT::kResult_Success);
-    const std::vector<int> rows = Greys(tallCurrent, 0);
-    EXPECT_EQ((std::array{rows[0], rows[1], rows[576], rows[577]}), (std::array{1, 2, 1, 2}));
 }
 
 TEST_F(VideoFrameManipulatorsTest, CopyRectScalesIntoTheRectangleKeepsTheRestAndCanCopyAlphaAlone)
@@ -285,26 +221,6 @@ TEST_F(VideoFrameManipulatorsTest, OpaqueAndInvertAlphaChangeOnlyAlpha)
     const Frame yuyv = MakeFrame(mt::kPixelFormat_YUYV_422_8u, 2, 1);
     ASSERT_EQ(VideoFrameManipulators::InvertAlpha(yuyv), QRT::kResult_Success);
     EXPECT_EQ(Row(yuyv, 0)[3], 0);
-}
-
-TEST_F(VideoFrameManipulatorsTest, AddressableFrameIsTheFrameItselfOrACopy)
-{
-    const Frame frame = GreyRows({51, 102});
-    frame->SetFieldType(mt::kFieldType_LowerFirst);
-    auto addressable = [](const Frame& inFrame, mt::PixelFormat inFormat)
-    {
-        return VideoFrameManipulators::MakeAddressableVideoFrame(inFrame, inFormat,
-                                                                 mt::kRenderQuality_High);
-    };
-    EXPECT_EQ(addressable(frame, kBGRA8).Get(), frame.Get());
-    EXPECT_EQ(addressable(frame, mt::kPixelFormat_Any).Get(), frame.Get());
-    // Another format: a converted copy with the frame's attributes.
-    const Frame floats = addressable(frame, kBGRA32f);
-    ASSERT_TRUE(floats);
-    EXPECT_EQ(
-        std::tuple(floats.Get() != frame.Get(), floats->GetPixelFormat(), floats->GetFieldType()),
-        std::tuple(true, kBGRA32f, mt::kFieldType_LowerFirst));
-    EXPECT_NEAR(PixelF(floats, 1, 1)[1], 0.4f, 1e-6f);
 }
 
 } // namespace

@@ -5,7 +5,6 @@
 #include "TestCutlists.h"
 #include "TestFrames.h"
 #include "TestNode.h"
-#include "TestPrefetch.h"
 #include "TestProducer.h"
 #include "VF/SharedVideoFrameCache.h"
 
@@ -28,17 +27,14 @@ TickTime Ticks(std::int64_t inTicks)
     return TickTime::TicksToTime(inTicks);
 }
 
-// A node whose producer makes frames as the parameters ask, with its own
-// prefetch handle.
+// A node whose producer makes frames as the parameters ask.
 QRT::InterfaceRef<TestNode> SizedNode(std::uint32_t inSeed)
 {
     auto producer = QRT::Allocated<TestProducer>::CreateInstance();
     producer->mHash = QRT::Guid(0x0a000000u + inSeed, 0, 0, {0, 0, 0, 0, 0, 0, 0, 1});
     producer->mFormat = mvxmediatypes::kPixelFormat_Invalid;
     producer->mWidth = 0;
-    auto node = NewNode(producer);
-    node->mPrefetch = QRT::Allocated<TestPrefetch>::CreateInstance();
-    return node;
+    return NewNode(producer);
 }
 
 TestProducer& ProducerOf(const QRT::InterfaceRef<TestNode>& inNode)
@@ -114,25 +110,6 @@ protected:
     ML::CutlistRenderParams mParams = MakeParams(8, 4);
     FrameRef mFrame;
 };
-
-TEST_F(RenderableCutlistSourceTest, CreationFetchesMainAndAlternateAndEmptyOnesThrow)
-{
-    EXPECT_THROW(ML::CreateRenderableCutlistSource({}, mvxmediatypes::kFrameRate_Video25, mName),
-                 QRT::NullInterfaceException);
-    const auto source = BareSource();
-    const auto calls = mBare->Calls();
-    ASSERT_EQ(calls.size(), 2u);
-    for (int i = 0; i < 2; ++i)
-        EXPECT_EQ(std::tuple(calls[i].mWhich, calls[i].mName, calls[i].mFlag),
-                  std::tuple(i, "Timeline A", true));
-    // Without a description the sequence counts as progressive.
-    mvxmediatypes::FrameRate fieldRate;
-    source->GetFieldRate(fieldRate);
-    EXPECT_EQ(fieldRate, mvxmediatypes::kFrameRate_Video25);
-    // The provider answered no cutlists.
-    EXPECT_THROW(source->RenderFrame(MF::FrameTime(Ticks(0)), mParams, mFrame),
-                 QRT::NullInterfaceException);
-}
 
 TEST_F(RenderableCutlistSourceTest, ConformedTimeAndFieldRateFollowTheFieldType)
 {
@@ -222,36 +199,6 @@ TEST_F(RenderableCutlistSourceTest, RenderSizeFollowsFieldTypeAndQuality)
                              mvxmediatypes::kFrameRate_Video25, time));
         EXPECT_EQ(mFrame->GetBounds().Height(), static_cast<std::int32_t>(testCase.mHeightSeen));
     }
-}
-
-TEST_F(RenderableCutlistSourceTest, ChoiceBitPicksTheAlternateCutlistForRenderingAndPrefetching)
-{
-    const auto source = Source(kP);
-    const MF::FrameTime time(Ticks(2 * kFrameTicks));
-    ML::RenderableNodePrefetchList prefetches;
-    // Only bit 0 of the choice counts; the third cutlist is never used.
-    for (const auto& [choice, node] : {std::pair{0u, 0}, std::pair{3u, 1}, std::pair{2u, 0}})
-    {
-        SCOPED_TRACE(choice);
-        mParams.mCutlistChoiceBit = choice;
-        const int before = ProducerOf(mNodes[node]).mProduceCount.load();
-        source->RenderFrame(time, mParams, mFrame);
-        EXPECT_EQ(ProducerOf(mNodes[node]).mProduceCount.load(), before + 1);
-        source->CollectPrefetches(time, mParams, prefetches);
-        EXPECT_EQ(prefetches.back(), mNodes[node]->mPrefetch);
-    }
-    EXPECT_EQ(ProducerOf(mNodes[2]).mProduceCount.load(), 0);
-    EXPECT_EQ(prefetches.size(), 3u);
-}
-
-TEST_F(RenderableCutlistSourceTest, PrefetchesCoverBothFieldsOfTheRequestedFrame)
-{
-    ML::RenderableNodePrefetchList prefetches;
-    Source(kL)->CollectPrefetches(
-        MF::FrameTime(Ticks(kFrameTicks + kFieldTicks), Ticks(kFrameTicks)), mParams, prefetches);
-    const auto ranges = mNodes[0]->PrefetchRanges();
-    ASSERT_EQ(ranges.size(), 1u);
-    EXPECT_EQ(ranges[0], MF::TickTimeRange(Ticks(kFrameTicks), Ticks(kFrameTicks + kFieldTicks)));
 }
 
 TEST_F(RenderableCutlistSourceTest, FailedLookupOrProducerIsThrownAndCollectsNothing)

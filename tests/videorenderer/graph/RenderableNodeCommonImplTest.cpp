@@ -66,30 +66,6 @@ TEST_F(RenderableNodeCommonImplTest, InputsAndOperatorsAreHashedInOrderAndReadBa
     EXPECT_EQ(clip->GetOperator(2, got), QRT::kResult_NotFound);
 }
 
-TEST_F(RenderableNodeCommonImplTest, PropertyLookupPrefersHashedAndEmptyValueRemoves)
-{
-    auto node = MakeMutable<TestNode>("Leaf", 0u);
-    node->SetProperty(kKeyA, "unhashed", false);
-    node->SetProperty(kKeyA, "hashed", true);
-    node->SetTypedProperty(kKeyB, Ticks(-705600000), false);
-    node->SetTypedProperty(kKeyC, 0.1 + 0.2, true);
-    node->SetProperty(kKeyLong, "gone", true);
-    node->SetProperty(kKeyLong, "", true);
-
-    MF::RenderablePropertyValue value = "untouched";
-    EXPECT_EQ(node->GetProperty(kKeyLong, value), QRT::kResult_NotFound);
-    EXPECT_EQ(node->GetProperty(kKeyA, value), QRT::kResult_Success);
-    EXPECT_EQ(value, "hashed");
-    MF::RenderablePropertyMap all{{kKeyLong, "stale"}};
-    node->GetProperties(all);
-    EXPECT_EQ(
-        all, (MF::RenderablePropertyMap{{kKeyA, "hashed"}, {kKeyB, "-705600000"}, {kKeyC, "0.3"}}));
-    // Removing the hashed value uncovers the unhashed one.
-    node->SetProperty(kKeyA, "", true);
-    EXPECT_EQ(node->GetProperty(kKeyA, value), QRT::kResult_Success);
-    EXPECT_EQ(value, "unhashed");
-}
-
 TEST_F(RenderableNodeCommonImplTest, SealedNodesRefuseWritesAndMutableNodesRefuseReads)
 {
     auto node = MakeMutable<TestNode>("Leaf", 0u);

@@ -240,7 +240,7 @@ TEST_F(RenderableVideoSourceTest, SixteenBitPremultipliedIsMadeStraightThroughSt
     EXPECT_TRUE(AllPixelsAre(Converted(frame), Pixel{0, 0, 255, 128}));
 }
 
-TEST_F(RenderableVideoSourceTest, StraightDeclarationRelabelsAndOpaqueFormatsAreLeftAlone)
+TEST_F(RenderableVideoSourceTest, StraightDeclarationRelabelsACopyAndLeavesTheDeliveredFrame)
 {
     FrameRef delivered = MakeFilledFrame(4, 2, Pixel{0x10, 0x20, 0x40, 0x80});
     delivered->SetAlphaChannel(mt::kAlphaChannel_Premultiplied);
@@ -249,16 +249,6 @@ TEST_F(RenderableVideoSourceTest, StraightDeclarationRelabelsAndOpaqueFormatsAre
     EXPECT_EQ(frame->GetAlphaChannel(), mt::kAlphaChannel_Straight);
     EXPECT_TRUE(AllPixelsAre(frame, Pixel{0x10, 0x20, 0x40, 0x80}));
     EXPECT_EQ(delivered->GetAlphaChannel(), mt::kAlphaChannel_Premultiplied);
-
-    const auto yuyv = mt::kPixelFormat_YUYV_422_8u;
-    const FrameRef opaque =
-        VF::CreateVideoFrame(yuyv, 4, 2, mt::kPixelAspectRatio_Square, true, false);
-    const Declaration declaration{.mAlphaKind = mt::kAlphaChannel_Premultiplied,
-                                  .mIgnoreAlpha = true};
-    EXPECT_EQ(
-        Render(*Make(Handing(opaque), declaration), MF::FrameTime(), MakeParams(4, 2, 5, yuyv))
-            .Get(),
-        opaque.Get());
 }
 
 TEST_F(RenderableVideoSourceTest, PixelAspectRatioIsAdjustedForNonUniformDelivery)
