@@ -724,7 +724,7 @@ Options:
                       to frame_00019.png
   -o FILE.y4m         a Y4M file
   -o -, --y4m         a Y4M stream on standard output, e.g.
-                      vrender source pattern:moving --y4m | ffplay -
+                      vrender source pattern:moving --y4m > out.y4m
   --output-dir DIR    PNG files DIR/frame_00000.png, ...
   -y, --overwrite     replace PNG files of the same pattern from an earlier
                       render and remove its frames outside the new range
