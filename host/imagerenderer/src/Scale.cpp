@@ -162,11 +162,13 @@ bool ScaleConvertBGRA(const void* inSrc, std::int32_t inSrcRowBytes, IR_PixelFor
     const auto a = carve(carver);
 
     // Horizontal taps, trimmed to the most any position really uses.
+    // Padding positions repeat the last real columns with weight 0, so that the columns
+    // never decrease along the row.
     std::int32_t hTaps = 1;
+    std::int32_t first = 0;
+    std::int32_t count = 1;
     for (std::size_t x = 0; x < pad; ++x)
     {
-        std::int32_t first = 0;
-        std::int32_t count = 1;
         if (x < static_cast<std::size_t>(inDstWidth))
             ScaleTapsAt(inSrcWidth, inDstWidth, inQuality, static_cast<std::int32_t>(x), first,
                         count, a.tapWeights);
@@ -175,7 +177,7 @@ bool ScaleConvertBGRA(const void* inSrc, std::int32_t inSrcRowBytes, IR_PixelFor
         hTaps = std::max(hTaps, count);
         for (std::int32_t t = 0; t < hMax; ++t)
         {
-            a.columns[t * pad + x] = t < count ? first + t : first;
+            a.columns[t * pad + x] = std::min(first + t, first + count - 1);
             a.weights[t * pad + x] = a.tapWeights[t];
         }
     }
@@ -186,7 +188,8 @@ bool ScaleConvertBGRA(const void* inSrc, std::int32_t inSrcRowBytes, IR_PixelFor
 
     const View src = MakeView(inSrc, inSrcRowBytes, s, inSrcHeight);
     const View dst = MakeView(outDst, inDstRowBytes, d, inDstHeight);
-    const Simd::RowTaps rowTaps{a.columns, a.weights, hTaps, static_cast<std::int32_t>(pad)};
+    const Simd::RowTaps rowTaps{a.columns, a.weights, hTaps, static_cast<std::int32_t>(pad),
+                                inSrcWidth};
     const bool premultiply = s.alpha == Alpha::kStraight;
     const auto filtered = [&](std::int32_t inRow) -> const float*
     {

@@ -59,26 +59,57 @@ HWY_INLINE void StorePlanes(DF inD, const Channels& inC, float* outPlanes, std::
     hn::Store(inC.a, inD, outPlanes + 3 * inStride + inX);
 }
 
+// 8-bit rows. The source pixels of one vector of output positions mostly lie within a few
+// vectors of the row: those are loaded whole and each tap picks its pixels from them with
+// lane permutations; where they do not (strong reductions, the row's end) the pixels are
+// gathered.
 void Horizontal8(const std::uint8_t* inRow, const RowTaps& inTaps, bool inPremultiply,
                  float* outPlanes)
 {
+    constexpr std::size_t kMaxSpan = 4;
     const DF df;
     const DI di;
     const DU du;
     const auto* pixels = reinterpret_cast<const std::uint32_t*>(inRow);
     const auto stride = static_cast<std::size_t>(inTaps.stride);
+    const std::size_t n = hn::Lanes(df);
+    const auto width = static_cast<std::size_t>(inTaps.sourceWidth);
     const auto mask = hn::Set(du, 0xFFu);
+    const auto laneMask = hn::Set(di, static_cast<std::int32_t>(n - 1));
     // Premultiplied sums carry alpha * 255: one division by 255 per output sample.
     const VF colourScale = hn::Set(df, inPremultiply ? 1.0f / 255.0f : 1.0f);
     auto channel = [&](auto inBits) HWY_ATTR
     { return hn::ConvertTo(df, hn::BitCast(di, hn::And(inBits, mask))); };
-    for (std::size_t x = 0; x < stride; x += hn::Lanes(df))
+    for (std::size_t x = 0; x < stride; x += n)
     {
+        const auto c0 = static_cast<std::size_t>(inTaps.columns[x]);
+        const std::size_t last = (inTaps.taps - 1) * stride + x + n - 1;
+        const std::size_t span = (static_cast<std::size_t>(inTaps.columns[last]) - c0) / n + 1;
+        const bool permute = span <= kMaxSpan && c0 + span * n <= width;
+        hn::Vec<DU> block[kMaxSpan];
+        for (std::size_t k = 0; permute && k < span; ++k)
+            block[k] = hn::LoadU(du, pixels + c0 + k * n);
         Channels acc = ZeroChannels(df);
         for (std::int32_t t = 0; t < inTaps.taps; ++t)
         {
             const std::size_t at = static_cast<std::size_t>(t) * stride + x;
-            const auto p = hn::GatherIndex(du, pixels, hn::Load(di, inTaps.columns + at));
+            const auto columns = hn::Load(di, inTaps.columns + at);
+            hn::Vec<DU> p;
+            if (permute)
+            {
+                const auto rel = hn::Sub(columns, hn::Set(di, static_cast<std::int32_t>(c0)));
+                const auto lanes = hn::IndicesFromVec(du, hn::And(rel, laneMask));
+                p = hn::TableLookupLanes(block[0], lanes);
+                for (std::size_t k = 1; k < span; ++k)
+                    p = hn::IfThenElse(
+                        hn::RebindMask(
+                            du, hn::Gt(rel, hn::Set(di, static_cast<std::int32_t>(k * n) - 1))),
+                        hn::TableLookupLanes(block[k], lanes), p);
+            }
+            else
+            {
+                p = hn::GatherIndex(du, pixels, columns);
+            }
             const Channels sample{channel(p), channel(hn::ShiftRight<8>(p)),
                                   channel(hn::ShiftRight<16>(p)),
                                   hn::ConvertTo(df, hn::BitCast(di, hn::ShiftRight<24>(p)))};

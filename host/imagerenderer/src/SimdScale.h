@@ -18,8 +18,9 @@ namespace IR::Simd
 // of floats of any target).
 inline constexpr std::int32_t kScaleLanePad = 64;
 
-// Horizontal taps of one row, table-driven: output position x sums inTaps samples, tap t
-// at source pixel inColumns[t * inStride + x] with weight inWeights[t * inStride + x].
+// Horizontal taps of one row, table-driven: output position x sums taps samples, tap t at
+// source pixel columns[t * stride + x] with weight weights[t * stride + x]. Columns never
+// decrease with x, and for one x they are smallest at tap 0 and largest at the last tap.
 struct RowTaps
 {
     const std::int32_t* columns = nullptr;
@@ -27,6 +28,8 @@ struct RowTaps
     std::int32_t taps = 0;
     // Positions per tap (the padded output width).
     std::int32_t stride = 0;
+    // Pixels of the source row.
+    std::int32_t sourceWidth = 0;
 };
 
 // One row of 8-bit B, G, R, A pixels (inRow 4-byte aligned) into four planes at
