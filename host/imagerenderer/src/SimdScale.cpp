@@ -77,7 +77,7 @@ void Horizontal8(const std::uint8_t* inRow, const RowTaps& inTaps, bool inPremul
     const auto mask = hn::Set(du, 0xFFu);
     const auto laneMask = hn::Set(di, static_cast<std::int32_t>(n - 1));
     // Premultiplied sums carry alpha * 255: one division by 255 per output sample.
-    const VF colourScale = hn::Set(df, inPremultiply ? 1.0f / 255.0f : 1.0f);
+    const VF colourScale = hn::Set(df, 1.0f / 255.0f);
     auto channel = [&](auto inBits) HWY_ATTR
     { return hn::ConvertTo(df, hn::BitCast(di, hn::And(inBits, mask))); };
     for (std::size_t x = 0; x < stride; x += n)
@@ -87,8 +87,16 @@ void Horizontal8(const std::uint8_t* inRow, const RowTaps& inTaps, bool inPremul
         const std::size_t span = (static_cast<std::size_t>(inTaps.columns[last]) - c0) / n + 1;
         const bool permute = span <= kMaxSpan && c0 + span * n <= width;
         hn::Vec<DU> block[kMaxSpan];
+        // Opaque pixels need no premultiplying.
+        auto opaque = hn::Set(du, 0xFF000000u);
         for (std::size_t k = 0; permute && k < span; ++k)
+        {
             block[k] = hn::LoadU(du, pixels + c0 + k * n);
+            opaque = hn::And(opaque, block[k]);
+        }
+        const bool premultiply =
+            inPremultiply &&
+            !(permute && hn::AllTrue(du, hn::Eq(opaque, hn::Set(du, 0xFF000000u))));
         Channels acc = ZeroChannels(df);
         for (std::int32_t t = 0; t < inTaps.taps; ++t)
         {
@@ -113,11 +121,14 @@ void Horizontal8(const std::uint8_t* inRow, const RowTaps& inTaps, bool inPremul
             const Channels sample{channel(p), channel(hn::ShiftRight<8>(p)),
                                   channel(hn::ShiftRight<16>(p)),
                                   hn::ConvertTo(df, hn::BitCast(di, hn::ShiftRight<24>(p)))};
-            AddSample(hn::Load(df, inTaps.weights + at), sample, inPremultiply, acc);
+            AddSample(hn::Load(df, inTaps.weights + at), sample, premultiply, acc);
         }
-        acc.b = hn::Mul(acc.b, colourScale);
-        acc.g = hn::Mul(acc.g, colourScale);
-        acc.r = hn::Mul(acc.r, colourScale);
+        if (premultiply)
+        {
+            acc.b = hn::Mul(acc.b, colourScale);
+            acc.g = hn::Mul(acc.g, colourScale);
+            acc.r = hn::Mul(acc.r, colourScale);
+        }
         StorePlanes(df, acc, outPlanes, stride, x);
     }
 }
