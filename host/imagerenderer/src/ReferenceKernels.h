@@ -49,8 +49,8 @@ void Motion8(const std::uint8_t* inSrc, std::int32_t inSrcRowBytes, std::int32_t
              bool inHasLowerFrame);
 
 // BGRA buffers of one transfer (8-bit or float, straight or premultiplied, any origin)
-// scaled onto the whole destination: bilinear, or area averaging at quality 5 where the
-// picture shrinks, summing premultiplied values (ReferenceScale.cpp).
+// scaled onto the whole destination: nearest below quality 3, bilinear, or area averaging
+// at quality 5 where the picture shrinks, summing premultiplied values (ReferenceScale.cpp).
 void ScaleConvert(const void* inSrc, std::int32_t inSrcRowBytes, IR_PixelFormat inSrcFormat,
                   std::int32_t inSrcWidth, std::int32_t inSrcHeight, void* outDst,
                   std::int32_t inDstRowBytes, IR_PixelFormat inDstFormat, std::int32_t inDstWidth,

@@ -33,6 +33,11 @@ std::vector<Tap> TapsOf(std::int32_t inSrc, std::int32_t inDst, std::int32_t inQ
             taps.emplace_back(s, (std::min(hi, s + 1.0) - std::max(lo, double(s))) / scale);
         return taps;
     }
+    if (inQuality < 3)
+    {
+        taps.emplace_back(std::min<std::int32_t>(inSrc - 1, std::floor((inI + 0.5) * scale)), 1.0);
+        return taps;
+    }
     // Bilinear between the two source samples around the output sample's centre.
     const double pos = std::clamp((inI + 0.5) * scale - 0.5, 0.0, inSrc - 1.0);
     const auto below = static_cast<std::int32_t>(std::floor(pos));

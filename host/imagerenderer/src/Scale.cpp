@@ -114,8 +114,7 @@ bool ScaleConvertBGRA(const void* inSrc, std::int32_t inSrcRowBytes, IR_PixelFor
     FormatInfo s;
     FormatInfo d;
     if (!DescribeFormat(inSrcFormat, s) || !DescribeFormat(inDstFormat, d) ||
-        s.layout != Layout::kBGRA || d.layout != Layout::kBGRA || s.linear != d.linear ||
-        inQuality < kBilinearQuality)
+        s.layout != Layout::kBGRA || d.layout != Layout::kBGRA || s.linear != d.linear)
         return false;
     const std::int32_t hMax = MaxScaleTaps(inSrcWidth, inDstWidth, inQuality);
     const std::int32_t vMax = MaxScaleTaps(inSrcHeight, inDstHeight, inQuality);

@@ -34,8 +34,8 @@ Taps MakeTaps(std::int32_t inSrc, std::int32_t inDst, std::int32_t inQuality);
 
 // The fast path of IR_ScaleConvert for checked arguments with different sizes: BGRA
 // source and destination (8-bit or float, straight or premultiplied, any origin) of one
-// transfer, bilinear or area sampling. Filters in premultiplied float: straight sources are
-// premultiplied per sample as the horizontal pass reads them, straight destinations
+// transfer, any sampling (nearest is a filter of one tap). Filters in premultiplied float: straight
+// sources are premultiplied per sample as the horizontal pass reads them, straight destinations
 // un-premultiplied per pixel as the vertical pass writes them (skipped for vectors of
 // opaque pixels); there are no whole-frame association passes. 8-bit results are within
 // one code value of exact arithmetic. Answers false, having written nothing, for any

@@ -208,8 +208,11 @@ HWY_INLINE Channels MixColumns(DF inD, const ColumnTaps& inTaps, std::size_t inX
     VF colourScale = scale;
     if (inTaps.unpremultiply)
     {
+        // Weights summing to 1 in float may leave opaque alpha a rounding below the unit:
+        // alphas within a millionth of it count as opaque (dividing by them would change
+        // colour by less than that).
         const VF unit = hn::Set(inD, inTaps.unit);
-        const auto opaque = hn::Ge(acc.a, unit);
+        const auto opaque = hn::Ge(acc.a, hn::Set(inD, inTaps.unit * (1.0f - 1e-6f)));
         if (!hn::AllTrue(inD, opaque))
         {
             const auto some = hn::Gt(acc.a, hn::Zero(inD));

@@ -50,7 +50,7 @@ std::vector<ScaleCase> ScaleCases()
     std::vector<ScaleCase> cases;
     for (const auto& [src, dst] : formats)
         for (const auto& [sw, sh, dw, dh] : sizes)
-            for (std::int32_t quality : {4, 5})
+            for (std::int32_t quality : {0, 4, 5})
                 for (bool opaque : {true, false})
                     cases.push_back({src, dst, sw, sh, dw, dh, quality, opaque});
     for (std::int32_t dw = 1; dw <= 66; ++dw)
