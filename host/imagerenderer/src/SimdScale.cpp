@@ -277,6 +277,82 @@ void Vertical32f(const ColumnTaps& inTaps, float* outRow, std::int32_t inCount)
     }
 }
 
+#if HWY_TARGET == HWY_SCALAR
+bool Halve8(const std::uint8_t* inTop, const std::uint8_t* inBottom, std::uint8_t* outDst,
+            std::int32_t inCount, bool inOpaqueOnly)
+{
+    for (std::int32_t i = 0; i < inCount; ++i)
+    {
+        const std::uint8_t* t = inTop + 8 * i;
+        const std::uint8_t* b = inBottom + 8 * i;
+        if (inOpaqueOnly && (t[3] & t[7] & b[3] & b[7]) != 255)
+            return false;
+        for (int c = 0; c < 4; ++c)
+            outDst[4 * i + c] =
+                static_cast<std::uint8_t>((t[c] + t[c + 4] + b[c] + b[c + 4] + 2) >> 2);
+    }
+    return true;
+}
+#else
+// Even and odd pixels of both rows split by ConcatEven / ConcatOdd; the bytes of each pixel
+// summed in two 16-bit lanes per pixel (B and R, G and A), which cannot overflow.
+bool Halve8(const std::uint8_t* inTop, const std::uint8_t* inBottom, std::uint8_t* outDst,
+            std::int32_t inCount, bool inOpaqueOnly)
+{
+    const DU du;
+    const hn::Repartition<std::uint8_t, DU> d8;
+    const std::size_t n = hn::Lanes(du);
+    const auto lowBytes = hn::Set(du, 0x00FF00FFu);
+    const auto two = hn::Set(du, 0x00020002u);
+    const auto alpha = hn::Set(du, 0xFF000000u);
+    auto body = [&](const std::uint8_t* inT, const std::uint8_t* inB, std::uint8_t* outD) HWY_ATTR
+    {
+        const auto t0 = hn::BitCast(du, hn::LoadU(d8, inT));
+        const auto t1 = hn::BitCast(du, hn::LoadU(d8, inT + 4 * n));
+        const auto b0 = hn::BitCast(du, hn::LoadU(d8, inB));
+        const auto b1 = hn::BitCast(du, hn::LoadU(d8, inB + 4 * n));
+        if (inOpaqueOnly &&
+            !hn::AllTrue(du,
+                         hn::Eq(hn::And(hn::And(hn::And(t0, t1), hn::And(b0, b1)), alpha), alpha)))
+            return false;
+        const auto te = hn::ConcatEven(du, t1, t0);
+        const auto to = hn::ConcatOdd(du, t1, t0);
+        const auto be = hn::ConcatEven(du, b1, b0);
+        const auto bo = hn::ConcatOdd(du, b1, b0);
+        auto mean = [&](auto inA, auto inB2, auto inC, auto inD) HWY_ATTR
+        {
+            const auto sum = hn::Add(hn::Add(hn::And(inA, lowBytes), hn::And(inB2, lowBytes)),
+                                     hn::Add(hn::And(inC, lowBytes), hn::And(inD, lowBytes)));
+            return hn::And(hn::ShiftRight<2>(hn::Add(sum, two)), lowBytes);
+        };
+        const auto lo = mean(te, to, be, bo);
+        const auto hi = mean(hn::ShiftRight<8>(te), hn::ShiftRight<8>(to), hn::ShiftRight<8>(be),
+                             hn::ShiftRight<8>(bo));
+        hn::StoreU(hn::BitCast(d8, hn::Or(lo, hn::ShiftLeft<8>(hi))), d8, outD);
+        return true;
+    };
+    const auto count = static_cast<std::size_t>(inCount);
+    std::size_t i = 0;
+    for (; i + n <= count; i += n)
+        if (!body(inTop + 8 * i, inBottom + 8 * i, outDst + 4 * i))
+            return false;
+    if (i == count)
+        return true;
+    // The last partial vector through stack copies, padded with opaque pixels.
+    alignas(64) std::uint8_t top[2 * HWY_MAX_BYTES];
+    alignas(64) std::uint8_t bottom[2 * HWY_MAX_BYTES];
+    alignas(64) std::uint8_t out[HWY_MAX_BYTES];
+    std::memset(top, 255, sizeof(top));
+    std::memset(bottom, 255, sizeof(bottom));
+    std::memcpy(top, inTop + 8 * i, 8 * (count - i));
+    std::memcpy(bottom, inBottom + 8 * i, 8 * (count - i));
+    if (!body(top, bottom, out))
+        return false;
+    std::memcpy(outDst + 4 * i, out, 4 * (count - i));
+    return true;
+}
+#endif
+
 } // namespace IR::Simd::HWY_NAMESPACE
 HWY_AFTER_NAMESPACE();
 
@@ -288,6 +364,13 @@ HWY_EXPORT(Horizontal8);
 HWY_EXPORT(Horizontal32f);
 HWY_EXPORT(Vertical8);
 HWY_EXPORT(Vertical32f);
+HWY_EXPORT(Halve8);
+
+bool HalveRows8(const std::uint8_t* inTop, const std::uint8_t* inBottom, std::uint8_t* outDst,
+                std::int32_t inCount, bool inOpaqueOnly)
+{
+    return HWY_DYNAMIC_DISPATCH(Halve8)(inTop, inBottom, outDst, inCount, inOpaqueOnly);
+}
 
 void ScaleRowHorizontal8(const std::uint8_t* inRow, const RowTaps& inTaps, bool inPremultiply,
                          float* outPlanes)

@@ -64,4 +64,12 @@ void ScaleRowVertical8(const ColumnTaps& inTaps, std::uint8_t* outRow, std::int3
 // Float destination (4-byte aligned).
 void ScaleRowVertical32f(const ColumnTaps& inTaps, float* outRow, std::int32_t inCount);
 
+// Exact halving of 8-bit rows in both directions: output pixel i is, per byte, the rounded
+// mean (sum + 2) / 4 of pixels 2i and 2i + 1 of inTop and of inBottom (each holding
+// 2 * inCount pixels), which is what bilinear and area sampling give at exactly half size.
+// With inOpaqueOnly it stops at the first vector of source pixels with an alpha below 255
+// and answers false, the row then partly written; else it answers true.
+bool HalveRows8(const std::uint8_t* inTop, const std::uint8_t* inBottom, std::uint8_t* outDst,
+                std::int32_t inCount, bool inOpaqueOnly);
+
 } // namespace IR::Simd

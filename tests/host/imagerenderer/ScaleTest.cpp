@@ -19,14 +19,20 @@ struct ScaleCase
     IR_PixelFormat dst;
     std::int32_t srcW, srcH, dstW, dstH;
     std::int32_t quality;
-    bool opaque;
+    // Alpha noise, all opaque, or all opaque but for one transparent pixel near the end.
+    enum Alpha
+    {
+        kNoise,
+        kOpaque,
+        kOneHole
+    } alpha;
 };
 
 void PrintTo(const ScaleCase& inCase, std::ostream* outStream)
 {
     *outStream << std::hex << inCase.src << " -> " << inCase.dst << std::dec << " " << inCase.srcW
                << "x" << inCase.srcH << " -> " << inCase.dstW << "x" << inCase.dstH << " quality "
-               << inCase.quality << (inCase.opaque ? " opaque" : " alpha");
+               << inCase.quality << " alpha " << inCase.alpha;
 }
 
 std::vector<ScaleCase> ScaleCases()
@@ -51,10 +57,13 @@ std::vector<ScaleCase> ScaleCases()
     for (const auto& [src, dst] : formats)
         for (const auto& [sw, sh, dw, dh] : sizes)
             for (std::int32_t quality : {0, 4, 5})
-                for (bool opaque : {true, false})
-                    cases.push_back({src, dst, sw, sh, dw, dh, quality, opaque});
+                for (auto alpha : {ScaleCase::kNoise, ScaleCase::kOpaque, ScaleCase::kOneHole})
+                    cases.push_back({src, dst, sw, sh, dw, dh, quality, alpha});
     for (std::int32_t dw = 1; dw <= 66; ++dw)
-        cases.push_back({kBGRA8, kBGRA8, 70, 4, dw, 3, 5, false});
+    {
+        cases.push_back({kBGRA8, kBGRA8, 70, 4, dw, 3, 5, ScaleCase::kNoise});
+        cases.push_back({kBGRA8, kBGRA8, 2 * dw, 4, dw, 2, 4, ScaleCase::kOneHole});
+    }
     return cases;
 }
 
@@ -70,11 +79,17 @@ void CheckAgainstReference(const ScaleCase& c)
     Image src(c.src, c.srcW, c.srcH, c.dstW % 4), got(c.dst, c.dstW, c.dstH, c.srcW % 3);
     Image expected(c.dst, c.dstW, c.dstH);
     src.Randomise(random);
-    for (std::int32_t i = 0; c.opaque && i < c.srcW * c.srcH; ++i)
+    for (std::int32_t i = 0; c.alpha != ScaleCase::kNoise && i < c.srcW * c.srcH; ++i)
         if (src.IsFloat())
             src.SetF(i % c.srcW, i / c.srcW, {0.2f, 0.5f, src.GetF(i % c.srcW, 0)[2], 1.0f});
         else
             src.Set(i % c.srcW, i / c.srcW, {src.Get(i % c.srcW, i / c.srcW)[0], 7, 250, 255});
+    // The hole carries colour only where the format is straight (premultiplied colour <= alpha).
+    const std::uint8_t hue = (c.src & kIR_FormatBit_StraightAlpha) ? 90 : 0;
+    if (c.alpha == ScaleCase::kOneHole && src.IsFloat())
+        src.SetF(std::max(0, c.srcW - 2), c.srcH - 1, {hue / 255.0f, 0.0f, 0.0f, 0.0f});
+    else if (c.alpha == ScaleCase::kOneHole)
+        src.Set(std::max(0, c.srcW - 2), c.srcH - 1, {hue, 0, 0, 0});
     std::memset(got.Data(), 0xA5, std::size_t(got.RowBytes()) * c.dstH);
     ASSERT_EQ(IR_ScaleConvert(src.Data(), src.RowBytes(), c.src, c.srcW, c.srcH, got.Data(),
                               got.RowBytes(), c.dst, c.dstW, c.dstH, c.quality),
