@@ -166,16 +166,41 @@ BENCHMARK_CAPTURE(BM_Convert, BGRA_8u_To_32f_Linear, kIR_PixelFormat_BGRA_8u,
                   kIR_PixelFormat_BGRP_32f_Linear)
     ->Unit(benchmark::kMillisecond);
 
-void BM_ScaleConvert(benchmark::State& ioState, std::int32_t inQuality)
+// 1080p scaled to inW x inH in one format; inOpaque sets every 8-bit alpha to 255 (video
+// frames), else alphas are noise and straight colour is premultiplied and divided again.
+void BM_ScaleConvert(benchmark::State& ioState, IR_PixelFormat inFormat, std::int32_t inW,
+                     std::int32_t inH, std::int32_t inQuality, bool inOpaque)
 {
-    Frame src(kIR_PixelFormat_BGRA_8u), dst(kIR_PixelFormat_BGRA_8u, kW / 2, kH / 2);
+    Frame src(inFormat), dst(inFormat, inW, inH);
+    if (inOpaque && !(inFormat & kIR_FormatBit_Float))
+        for (std::size_t i = 3; i < src.Bytes(); i += 4)
+            src.Data()[i] = 255;
     for (auto _ : ioState)
         benchmark::DoNotOptimize(IR_ScaleConvert(src.Data(), src.RowBytes(), src.Format(), kW, kH,
-                                                 dst.Data(), dst.RowBytes(), dst.Format(), kW / 2,
-                                                 kH / 2, inQuality));
+                                                 dst.Data(), dst.RowBytes(), dst.Format(), inW, inH,
+                                                 inQuality));
 }
-BENCHMARK_CAPTURE(BM_ScaleConvert, To540_Nearest, 0)->Unit(benchmark::kMillisecond);
-BENCHMARK_CAPTURE(BM_ScaleConvert, To540_Bilinear, 4)->Unit(benchmark::kMillisecond);
-BENCHMARK_CAPTURE(BM_ScaleConvert, To540_Area, 5)->Unit(benchmark::kMillisecond);
+constexpr IR_PixelFormat k8u = kIR_PixelFormat_BGRA_8u;
+constexpr IR_PixelFormat k32f = kIR_PixelFormat_BGRA_32f;
+BENCHMARK_CAPTURE(BM_ScaleConvert, To540_Nearest_8u, k8u, 960, 540, 0, true)
+    ->Unit(benchmark::kMillisecond);
+BENCHMARK_CAPTURE(BM_ScaleConvert, To540_Bilinear_8u, k8u, 960, 540, 4, true)
+    ->Unit(benchmark::kMillisecond);
+BENCHMARK_CAPTURE(BM_ScaleConvert, To540_Area_8u, k8u, 960, 540, 5, true)
+    ->Unit(benchmark::kMillisecond);
+BENCHMARK_CAPTURE(BM_ScaleConvert, To540_Area_8u_Alpha, k8u, 960, 540, 5, false)
+    ->Unit(benchmark::kMillisecond);
+BENCHMARK_CAPTURE(BM_ScaleConvert, To810_Bilinear_8u, k8u, 1440, 810, 4, true)
+    ->Unit(benchmark::kMillisecond);
+BENCHMARK_CAPTURE(BM_ScaleConvert, To810_Area_8u, k8u, 1440, 810, 5, true)
+    ->Unit(benchmark::kMillisecond);
+BENCHMARK_CAPTURE(BM_ScaleConvert, To540_Bilinear_32f, k32f, 960, 540, 4, false)
+    ->Unit(benchmark::kMillisecond);
+BENCHMARK_CAPTURE(BM_ScaleConvert, To540_Area_32f, k32f, 960, 540, 5, false)
+    ->Unit(benchmark::kMillisecond);
+BENCHMARK_CAPTURE(BM_ScaleConvert, To810_Bilinear_32f, k32f, 1440, 810, 4, false)
+    ->Unit(benchmark::kMillisecond);
+BENCHMARK_CAPTURE(BM_ScaleConvert, To810_Area_32f, k32f, 1440, 810, 5, false)
+    ->Unit(benchmark::kMillisecond);
 
 } // namespace

@@ -5,6 +5,7 @@
 #include "Blend.h"
 #include "Checks.h"
 #include "Kernels.h"
+#include "Scale.h"
 #include "YUV.h"
 
 #include <algorithm>
@@ -419,66 +420,6 @@ std::int32_t IR_ConvertYUV420Planes(const std::uint8_t* inY, std::int32_t inYRow
 // ---------------------------------------------------------------------------
 // Scaling
 
-namespace
-{
-
-// Filter taps of one output position: source indices [first, first + count) with weights.
-struct Taps
-{
-    std::vector<std::int32_t> first;
-    std::vector<std::int32_t> count;
-    std::vector<float> weights; // maxCount per output position
-    std::int32_t maxCount = 1;
-};
-
-Taps MakeTaps(std::int32_t inSrc, std::int32_t inDst, std::int32_t inQuality)
-{
-    Taps taps;
-    const double scale = static_cast<double>(inSrc) / inDst;
-    const bool area = inQuality >= IR::kBestQuality && scale > 1.0;
-    const bool bilinear = inQuality >= IR::kBilinearQuality;
-    taps.maxCount = area ? static_cast<std::int32_t>(std::ceil(scale)) + 1 : (bilinear ? 2 : 1);
-    taps.first.resize(inDst);
-    taps.count.resize(inDst);
-    taps.weights.assign(static_cast<std::size_t>(inDst) * taps.maxCount, 0.0f);
-    for (std::int32_t i = 0; i < inDst; ++i)
-    {
-        float* w = &taps.weights[static_cast<std::size_t>(i) * taps.maxCount];
-        if (area)
-        {
-            // Box filter: each source pixel weighs by its overlap with the output pixel.
-            const double lo = i * scale;
-            const double hi = (i + 1) * scale;
-            const auto first = static_cast<std::int32_t>(std::floor(lo));
-            const auto last = std::min(inSrc - 1, static_cast<std::int32_t>(std::ceil(hi)) - 1);
-            taps.first[i] = first;
-            taps.count[i] = last - first + 1;
-            for (std::int32_t s = first; s <= last; ++s)
-                w[s - first] = static_cast<float>(
-                    (std::min<double>(hi, s + 1) - std::max<double>(lo, s)) / scale);
-        }
-        else if (bilinear)
-        {
-            const double pos = std::clamp((i + 0.5) * scale - 0.5, 0.0, inSrc - 1.0);
-            const auto first = std::min(static_cast<std::int32_t>(pos), std::max(0, inSrc - 2));
-            const float f = static_cast<float>(pos - first);
-            taps.first[i] = first;
-            taps.count[i] = inSrc > 1 ? 2 : 1;
-            w[0] = inSrc > 1 ? 1.0f - f : 1.0f;
-            w[1] = inSrc > 1 ? f : 0.0f;
-        }
-        else
-        {
-            taps.first[i] = std::min(inSrc - 1, static_cast<std::int32_t>((i + 0.5) * scale));
-            taps.count[i] = 1;
-            w[0] = 1.0f;
-        }
-    }
-    return taps;
-}
-
-} // namespace
-
 std::int32_t IR_ScaleConvert(const void* inSrc, std::int32_t inSrcRowBytes,
                              IR_PixelFormat inSrcFormat, std::int32_t inSrcWidth,
                              std::int32_t inSrcHeight, void* outDst, std::int32_t inDstRowBytes,
@@ -500,8 +441,13 @@ std::int32_t IR_ScaleConvert(const void* inSrc, std::int32_t inSrcRowBytes,
     if (inSrcWidth == inDstWidth && inSrcHeight == inDstHeight)
         return IR_Convert(inSrc, inSrcRowBytes, inSrcFormat, outDst, inDstRowBytes, inDstFormat,
                           inDstWidth, inDstHeight, inQuality);
-    const Taps hTaps = MakeTaps(inSrcWidth, inDstWidth, inQuality);
-    const Taps vTaps = MakeTaps(inSrcHeight, inDstHeight, inQuality);
+    std::int32_t status = kIR_NoError;
+    if (IR::ScaleConvertBGRA(inSrc, inSrcRowBytes, inSrcFormat, inSrcWidth, inSrcHeight, outDst,
+                             inDstRowBytes, inDstFormat, inDstWidth, inDstHeight, inQuality,
+                             status))
+        return status;
+    const IR::Taps hTaps = IR::MakeTaps(inSrcWidth, inDstWidth, inQuality);
+    const IR::Taps vTaps = IR::MakeTaps(inSrcHeight, inDstHeight, inQuality);
     // Ring of horizontally filtered source rows; vertical taps only move forward.
     const std::int32_t ringSize = vTaps.maxCount + 1;
     const std::size_t srcFloats = static_cast<std::size_t>(inSrcWidth) * 4;

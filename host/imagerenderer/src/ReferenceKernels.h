@@ -48,6 +48,14 @@ void Motion8(const std::uint8_t* inSrc, std::int32_t inSrcRowBytes, std::int32_t
              const IR_AffineMatrix& inMatrix, double inOpacity, std::int32_t inQuality,
              bool inHasLowerFrame);
 
+// BGRA buffers of one transfer (8-bit or float, straight or premultiplied, any origin)
+// scaled onto the whole destination: nearest below quality 3, bilinear, or area averaging
+// at quality 5 where the picture shrinks, summing premultiplied values (ReferenceScale.cpp).
+void ScaleConvert(const void* inSrc, std::int32_t inSrcRowBytes, IR_PixelFormat inSrcFormat,
+                  std::int32_t inSrcWidth, std::int32_t inSrcHeight, void* outDst,
+                  std::int32_t inDstRowBytes, IR_PixelFormat inDstFormat, std::int32_t inDstWidth,
+                  std::int32_t inDstHeight, std::int32_t inQuality);
+
 // One blend of straight colours with alphas, the textbook way (with divisions):
 // outputs premultiplied colour and alpha.
 void BlendPixel(std::uint32_t inMode, const double inSrc[4], const double inDst[4],

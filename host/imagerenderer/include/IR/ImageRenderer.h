@@ -279,7 +279,8 @@ std::int32_t IR_ConvertYUV420Planes(const std::uint8_t* inY, std::int32_t inYRow
 
 // Scales the whole source onto the whole destination and converts the format.
 // Nearest below quality 3, bilinear at 3 and 4, area averaging at 5 (bilinear
-// where it enlarges). Scaling works on premultiplied values.
+// where it enlarges). Scaling works on premultiplied values; 8-bit results are within one
+// code value of exact arithmetic.
 std::int32_t IR_ScaleConvert(const void* inSrc, std::int32_t inSrcRowBytes,
                              IR_PixelFormat inSrcFormat, std::int32_t inSrcWidth,
                              std::int32_t inSrcHeight, void* outDst, std::int32_t inDstRowBytes,
