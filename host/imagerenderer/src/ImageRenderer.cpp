@@ -5,6 +5,7 @@
 #include "Blend.h"
 #include "Checks.h"
 #include "Kernels.h"
+#include "SimdAccumulate.h"
 #include "YUV.h"
 
 #include <algorithm>
@@ -220,6 +221,9 @@ std::int32_t IR_Accumulate(const void* const* inSrcs, const std::int32_t* inSrcR
         return kIR_NoError;
     const std::int32_t values = inWidth * 4;
     const bool viaLinear = inQuality >= IR::kBestQuality && !info.linear;
+    if (viaLinear && !info.isFloat)
+        return IR::AccumulateLinear8(inSrcs, inSrcRowBytes, inWeights, inCount, outDst,
+                                     inDstRowBytes, info, inWidth, inHeight);
     IR::ScratchBlock rows(static_cast<std::size_t>(values) * 8);
     if (!rows.Valid())
         return kIR_OutOfMemory;
