@@ -5,15 +5,13 @@
 // promoted, linearised and added into one float vector per block; the last partial
 // block goes through stack copies, so the tail gets the arithmetic of the body.
 //
-// The transfer both ways without per-lane table reads where it can (gathers are slow
-// on some processors):
-// - encoded to linear light: the linear segment, else a degree-7 polynomial (within
-//   0.01 of a code value once encoded again);
-// - linear light in 0..1 to encoded: 4096 cells over 0..1, each a packed pair (value at
-//   the cell's start in 1/256 code units, low half; its rise over the cell, high
-//   half), read at 20-bit resolution and interpolated in integers. The encoder's curve
-//   bends least where its cells are steepest (the linear segment), so the
-//   interpolation stays within 0.01 of a code value.
+// The transfer both ways is computed, with no table reads (gathers are slow on some
+// processors):
+// - encoded to linear light: the linear segment, else a degree-7 polynomial in the
+//   encoded value (within 0.01 of a code value once encoded again);
+// - linear light to encoded: the linear segment, else a degree-6 polynomial in the
+//   fourth root of the linear value (two square roots), within 0.001 of a code value.
+// Both are Chebyshev fits on the curved part of the transfer.
 
 #undef HWY_TARGET_INCLUDE
 #define HWY_TARGET_INCLUDE "SimdAccumulate.cpp"
@@ -27,55 +25,40 @@
 #include <hwy/foreach_target.h> // IWYU pragma: keep
 #include <hwy/highway.h>
 
-#ifndef IR_SIMD_ACCUMULATE_TABLES
-#define IR_SIMD_ACCUMULATE_TABLES
+#ifndef IR_SIMD_ACCUMULATE_CURVES
+#define IR_SIMD_ACCUMULATE_CURVES
 namespace IR::Simd
 {
 namespace
 {
 
-constexpr int kCells = 4096;
-// Linear light is read as round-down(v * 2^20): 12 bits of cell, 8 bits inside it.
-constexpr float kEncodeScale = 1048576.0f;
-
-// Encoded 0..1 to linear light above the linear segment: a degree-7 polynomial in
-// t = (x - kCurveMid) * kCurveScale, Chebyshev-fitted on 0.04045..1; its error is at
-// most 0.01 of a code value once encoded again.
-constexpr float kLinearSegment = 0.04045f;
-constexpr float kCurveScale = static_cast<float>(2.0 / (1.0 - 0.04045));
-constexpr float kCurveMid = static_cast<float>((1.0 + 0.04045) / 2.0);
-constexpr float kCurve[8] = {2.332421190e-01f,  4.668906385e-01f,  2.725536918e-01f,
-                             3.033641574e-02f,  -3.610066338e-03f, 9.099971649e-04f,
-                             -6.184238452e-04f, 2.964146868e-04f};
-
-struct AccumulateTables
+// A polynomial in t = (x - mid) * scale, coefficients from the constant term up.
+template <int kTerms>
+struct Curve
 {
-    std::int32_t linearToEncoded[kCells + 1];
-
-    AccumulateTables()
-    {
-        const auto toEncoded = [](double inL)
-        { return inL <= 0.0031308 ? inL * 12.92 : 1.055 * std::pow(inL, 1.0 / 2.4) - 0.055; };
-        const auto fixedAt = [&](int inCell)
-        { return std::lround(toEncoded(std::min(1.0, inCell / double(kCells))) * 255.0 * 256.0); };
-        for (int i = 0; i <= kCells; ++i)
-        {
-            const long start = fixedAt(i);
-            const long rise = i < kCells ? fixedAt(i + 1) - start : 0;
-            linearToEncoded[i] = static_cast<std::int32_t>(start | (rise << 16));
-        }
-    }
+    float mid;
+    float scale;
+    float terms[kTerms];
 };
 
-const AccumulateTables& Tables()
-{
-    static const AccumulateTables sTables;
-    return sTables;
-}
+constexpr float kDecodeLinearEnd = 0.04045f;
+constexpr float kEncodeLinearEnd = 0.0031308f;
+// Encoded x in 0.04045..1 to linear light.
+constexpr Curve<8> kDecode = {static_cast<float>((1.0 + 0.04045) / 2.0),
+                              static_cast<float>(2.0 / (1.0 - 0.04045)),
+                              {2.332421190e-01f, 4.668906385e-01f, 2.725536918e-01f,
+                               3.033641574e-02f, -3.610066338e-03f, 9.099971649e-04f,
+                               -6.184238452e-04f, 2.964146868e-04f}};
+// The fourth root q of linear light in 0.0031308..1 to the encoded value.
+constexpr double kQuarterStart = 0.2365450320046059;
+constexpr Curve<7> kEncode = {static_cast<float>((1.0 + kQuarterStart) / 2.0),
+                              static_cast<float>(2.0 / (1.0 - kQuarterStart)),
+                              {4.183899443e-01f, 4.871176182e-01f, 1.002556593e-01f,
+                               -6.812332791e-03f, 1.387697313e-03f, -5.287540371e-04f,
+                               1.910060662e-04f}};
 
 } // namespace
 } // namespace IR::Simd
-
 #endif
 
 HWY_BEFORE_NAMESPACE();
@@ -86,35 +69,36 @@ namespace hn = hwy::HWY_NAMESPACE;
 
 #if HWY_TARGET == HWY_SCALAR
 // The one-lane fallback (processors without SSSE3) cannot hold a pixel in a vector:
-// plain loops with the same curve, table and arithmetic.
+// plain loops with the same curves and arithmetic.
 inline float Clamp01(float inV)
 {
     return std::min(std::max(inV, 0.0f), 1.0f);
 }
 
-inline std::int32_t EncodeFixed(float inLinear, const std::int32_t* inTable)
+template <int kTerms>
+float Evaluate(const Curve<kTerms>& inCurve, float inX)
 {
-    const auto q = static_cast<std::int32_t>(inLinear * kEncodeScale);
-    const std::int32_t packed = inTable[q >> 8];
-    return ((packed & 0xFFFF) << 8) + (packed >> 16) * (q & 0xFF);
+    const float t = (inX - inCurve.mid) * inCurve.scale;
+    float p = inCurve.terms[kTerms - 1];
+    for (int k = kTerms - 2; k >= 0; --k)
+        p = p * t + inCurve.terms[k];
+    return p;
 }
 
 inline float ToLinear(float inX)
 {
-    if (inX <= kLinearSegment)
-        return inX / 12.92f;
-    const float t = (inX - kCurveMid) * kCurveScale;
-    float p = kCurve[7];
-    for (int k = 6; k >= 0; --k)
-        p = p * t + kCurve[k];
-    return p;
+    return inX <= kDecodeLinearEnd ? inX * (1.0f / 12.92f) : Evaluate(kDecode, inX);
+}
+
+inline float ToEncoded(float inL)
+{
+    return inL <= kEncodeLinearEnd ? inL * 12.92f : Evaluate(kEncode, std::sqrt(std::sqrt(inL)));
 }
 
 template <bool kPremultiplied>
 void AccumulateLinear(const std::uint8_t* const* inRows, const float* inWeights,
                       std::int32_t inSources, std::uint8_t* outDst, std::int32_t inPixels)
 {
-    const AccumulateTables& t = Tables();
     for (std::int32_t x = 0; x < 4 * inPixels; x += 4)
     {
         float sum[4] = {0.0f, 0.0f, 0.0f, 0.0f};
@@ -135,52 +119,48 @@ void AccumulateLinear(const std::uint8_t* const* inRows, const float* inWeights,
         const float a = Clamp01(sum[3]);
         for (int c = 0; c < 3; ++c)
         {
-            if (!kPremultiplied)
-            {
-                const std::int32_t fixed = EncodeFixed(Clamp01(sum[c]), t.linearToEncoded);
-                outDst[x + c] = static_cast<std::uint8_t>((fixed + 32768) >> 16);
-                continue;
-            }
-            const float straight = a > 0.0f ? Clamp01(sum[c] / a) : 0.0f;
-            const float codes = float(EncodeFixed(straight, t.linearToEncoded)) / 65536.0f;
-            outDst[x + c] = static_cast<std::uint8_t>(std::min(255.0f, codes * a + 0.5f));
+            const float straight =
+                !kPremultiplied ? Clamp01(sum[c]) : (a > 0.0f ? Clamp01(sum[c] / a) : 0.0f);
+            const float scale = !kPremultiplied ? 255.0f : 255.0f * a;
+            outDst[x + c] = static_cast<std::uint8_t>(ToEncoded(straight) * scale + 0.5f);
         }
         outDst[x + 3] = static_cast<std::uint8_t>(a * 255.0f + 0.5f);
     }
 }
 #else
-
 using DF = hn::ScalableTag<float>;
 using DI = hn::RebindToSigned<DF>;
 using D8 = hn::Rebind<std::uint8_t, DI>;
 using VF = hn::Vec<DF>;
 using VI = hn::Vec<DI>;
 
-// Encoded values in 1/65536 code units of linear values already clamped to 0..1.
-HWY_INLINE VI EncodeFixed(DF inDf, VF inLinear, const std::int32_t* inTable)
-{
-    const DI di;
-    const VI q = hn::ConvertTo(di, hn::Mul(inLinear, hn::Set(inDf, kEncodeScale)));
-    const VI packed = hn::GatherIndex(di, inTable, hn::ShiftRight<8>(q));
-    const VI start = hn::And(packed, hn::Set(di, 0xFFFF));
-    const VI rise = hn::ShiftRight<16>(packed);
-    return hn::Add(hn::ShiftLeft<8>(start), hn::Mul(rise, hn::And(q, hn::Set(di, 0xFF))));
-}
-
 HWY_INLINE VF Clamp01(DF inDf, VF inV)
 {
     return hn::Min(hn::Max(inV, hn::Zero(inDf)), hn::Set(inDf, 1.0f));
 }
 
-// Encoded values in 0..1 to linear light.
+template <int kTerms>
+HWY_INLINE VF Evaluate(DF inDf, const Curve<kTerms>& inCurve, VF inX)
+{
+    const VF t = hn::Mul(hn::Sub(inX, hn::Set(inDf, inCurve.mid)), hn::Set(inDf, inCurve.scale));
+    VF p = hn::Set(inDf, inCurve.terms[kTerms - 1]);
+    for (int k = kTerms - 2; k >= 0; --k)
+        p = hn::MulAdd(p, t, hn::Set(inDf, inCurve.terms[k]));
+    return p;
+}
+
+// Encoded values in 0..1 to linear light, and back.
 HWY_INLINE VF ToLinear(DF inDf, VF inX)
 {
-    const VF t = hn::Mul(hn::Sub(inX, hn::Set(inDf, kCurveMid)), hn::Set(inDf, kCurveScale));
-    VF p = hn::Set(inDf, kCurve[7]);
-    for (int k = 6; k >= 0; --k)
-        p = hn::MulAdd(p, t, hn::Set(inDf, kCurve[k]));
-    return hn::IfThenElse(hn::Le(inX, hn::Set(inDf, kLinearSegment)),
-                          hn::Mul(inX, hn::Set(inDf, 1.0f / 12.92f)), p);
+    return hn::IfThenElse(hn::Le(inX, hn::Set(inDf, kDecodeLinearEnd)),
+                          hn::Mul(inX, hn::Set(inDf, 1.0f / 12.92f)), Evaluate(inDf, kDecode, inX));
+}
+
+HWY_INLINE VF ToEncoded(DF inDf, VF inL)
+{
+    return hn::IfThenElse(hn::Le(inL, hn::Set(inDf, kEncodeLinearEnd)),
+                          hn::Mul(inL, hn::Set(inDf, 12.92f)),
+                          Evaluate(inDf, kEncode, hn::Sqrt(hn::Sqrt(inL))));
 }
 
 // Byte codes as linear light; alpha lanes as code / 255.
@@ -202,28 +182,22 @@ HWY_INLINE VF Linearize(DF inDf, VI inCodes, hn::Mask<DF> inAlphaLane)
 
 // The sum back to byte codes (alpha clamped to 0..1, colour encoded).
 template <bool kPremultiplied>
-HWY_INLINE VI Encode(DF inDf, VF inSum, hn::Mask<DF> inAlphaLane, const AccumulateTables& inT)
+HWY_INLINE VI Encode(DF inDf, VF inSum, hn::Mask<DF> inAlphaLane)
 {
     const DI di;
-    const VF half = hn::Set(inDf, 0.5f);
     const VF alpha = Clamp01(inDf, hn::Broadcast<3>(inSum));
-    const VI alphaCode = hn::ConvertTo(di, hn::MulAdd(alpha, hn::Set(inDf, 255.0f), half));
-    VI colourCode;
-    if constexpr (!kPremultiplied)
-    {
-        const VI fixed = EncodeFixed(inDf, Clamp01(inDf, inSum), inT.linearToEncoded);
-        colourCode = hn::ShiftRight<16>(hn::Add(fixed, hn::Set(di, 32768)));
-    }
-    else
+    VF straight = Clamp01(inDf, inSum);
+    VF scale = hn::Set(inDf, 255.0f);
+    if constexpr (kPremultiplied)
     {
         const auto visible = hn::Gt(alpha, hn::Zero(inDf));
         const VF safe = hn::IfThenElse(visible, alpha, hn::Set(inDf, 1.0f));
-        const VF straight = hn::IfThenElseZero(visible, Clamp01(inDf, hn::Div(inSum, safe)));
-        const VI fixed = EncodeFixed(inDf, straight, inT.linearToEncoded);
-        const VF codes = hn::Mul(hn::ConvertTo(inDf, fixed), hn::Set(inDf, 1.0f / 65536.0f));
-        colourCode = hn::ConvertTo(di, hn::MulAdd(codes, alpha, half));
+        straight = hn::IfThenElseZero(visible, Clamp01(inDf, hn::Div(inSum, safe)));
+        scale = hn::Mul(scale, alpha);
     }
-    return hn::IfThenElse(hn::RebindMask(di, inAlphaLane), alphaCode, colourCode);
+    const VF value = hn::IfThenElse(inAlphaLane, hn::Mul(alpha, hn::Set(inDf, 255.0f)),
+                                    hn::Mul(ToEncoded(inDf, straight), scale));
+    return hn::ConvertTo(di, hn::Add(value, hn::Set(inDf, 0.5f)));
 }
 
 template <bool kPremultiplied>
@@ -233,7 +207,6 @@ void AccumulateLinear(const std::uint8_t* const* inRows, const float* inWeights,
     const DF df;
     const DI di;
     const D8 d8;
-    const AccumulateTables& tables = Tables();
     const std::size_t n = hn::Lanes(df);
     const auto alphaLane =
         hn::RebindMask(df, hn::Eq(hn::And(hn::Iota(di, 0), hn::Set(di, 3)), hn::Set(di, 3)));
@@ -256,7 +229,7 @@ void AccumulateLinear(const std::uint8_t* const* inRows, const float* inWeights,
             sum = hn::MulAdd(hn::Set(df, inWeights[s]),
                              Linearize<kPremultiplied>(df, codes, alphaLane), sum);
         }
-        const auto out = hn::DemoteTo(d8, Encode<kPremultiplied>(df, sum, alphaLane, tables));
+        const auto out = hn::DemoteTo(d8, Encode<kPremultiplied>(df, sum, alphaLane));
         if (inTail == 0)
         {
             hn::StoreU(out, d8, outDst + inAt);
@@ -271,7 +244,6 @@ void AccumulateLinear(const std::uint8_t* const* inRows, const float* inWeights,
     if (i < bytes)
         block(i, bytes - i);
 }
-
 #endif
 
 void AccumulateLinearStraight(const std::uint8_t* const* inRows, const float* inWeights,
