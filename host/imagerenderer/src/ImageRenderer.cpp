@@ -6,6 +6,7 @@
 #include "Checks.h"
 #include "Kernels.h"
 #include "SimdAccumulate.h"
+#include "SimdDeinterlace.h"
 #include "YUV.h"
 
 #include <algorithm>
@@ -571,16 +572,11 @@ void AverageRows(const std::uint8_t* inA, const std::uint8_t* inB, std::uint8_t*
                  std::size_t inBytes, bool inFloat)
 {
     if (inFloat)
-    {
-        const auto* a = reinterpret_cast<const float*>(inA);
-        const auto* b = reinterpret_cast<const float*>(inB);
-        auto* d = reinterpret_cast<float*>(outDst);
-        for (std::size_t i = 0; i < inBytes / 4; ++i)
-            d[i] = 0.5f * (a[i] + b[i]);
-        return;
-    }
-    for (std::size_t i = 0; i < inBytes; ++i)
-        outDst[i] = static_cast<std::uint8_t>((inA[i] + inB[i] + 1) >> 1);
+        IR::Simd::AverageRowsF(reinterpret_cast<const float*>(inA),
+                               reinterpret_cast<const float*>(inB),
+                               reinterpret_cast<float*>(outDst), inBytes / 4);
+    else
+        IR::Simd::AverageRows8(inA, inB, outDst, inBytes);
 }
 
 } // namespace

@@ -1,6 +1,7 @@
-// Linear-light accumulation (quality 5) against the double-precision reference: every
-// 8-bit format it takes, widths covering every vector tail, misaligned padded rows, one
-// to three sources, weights that sum to one and weights that do not.
+// Re-timing and field kernels. Linear-light accumulation (quality 5) against the
+// double-precision reference: every 8-bit format it takes, widths covering every vector
+// tail, misaligned padded rows, one to three sources, weights that sum to one and
+// weights that do not.
 
 #include "ImageTestSupport.h"
 #include "ReferenceKernels.h"
@@ -121,4 +122,76 @@ TEST(AccumulateLinearValues, MixesInLinearLightAndRoundTripsEveryCode)
     }
 }
 
+// Deinterlacing against means computed here, byte by byte or float by float: every
+// interleaved layout, widths covering every vector tail, either field kept, in place
+// and by quarter-height field copy.
+class DeinterlaceKernelTest : public ::testing::TestWithParam<IR_PixelFormat>
+{
+};
+
+TEST_P(DeinterlaceKernelTest, RebuildsRowsAsTheMeanOfTheKeptRowsAroundThem)
+{
+    const IR_PixelFormat format = GetParam();
+    const bool isFloat = (format & kIR_FormatBit_Float) != 0;
+    std::mt19937 random(format);
+    std::uniform_int_distribution<int> byte(0, 255);
+    // Component k of row y of an image, as a double; and the mean the kernels must give.
+    const auto at = [&](const Image& inImage, std::int32_t inY, std::size_t inK)
+    {
+        if (!isFloat)
+            return static_cast<double>(inImage.Row(inY)[inK]);
+        float f;
+        std::memcpy(&f, inImage.Row(inY) + 4 * inK, 4);
+        return double{f};
+    };
+    const auto mean = [&](double inA, double inB) {
+        return isFloat ? double{0.5f * (float(inA) + float(inB))} : std::floor((inA + inB + 1) / 2);
+    };
+    for (std::int32_t width = 1; width <= 67; width += (width < 20 ? 1 : 11))
+        for (bool keepSecond : {false, true})
+        {
+            SCOPED_TRACE(testing::Message() << "width " << width << " second " << keepSecond);
+            const std::int32_t height = 7;
+            Image source(format, width, height, width % 3);
+            const auto bytes = static_cast<std::size_t>(IR_MinimumRowBytes(format, width));
+            for (std::int32_t y = 0; y < height; ++y)
+                for (std::size_t i = 0; i < bytes; ++i)
+                    source.Row(y)[i] = static_cast<std::uint8_t>(byte(random));
+            if (isFloat) // finite values in 0..1
+                for (std::int32_t y = 0; y < height; ++y)
+                    for (std::int32_t x = 0; x < width; ++x)
+                        source.SetF(x, y, {byte(random) / 255.0f, 0.25f, 0.5f, 1.0f});
+            Image frame = Copy(source, 1);
+            ASSERT_EQ(IR_Deinterlace(frame.Data(), frame.RowBytes(), format, width, height,
+                                     keepSecond, 5),
+                      kIR_NoError);
+            const std::size_t values = isFloat ? bytes / 4 : bytes;
+            for (std::int32_t y = 0; y < height; ++y)
+                for (std::size_t k = 0; k < values; ++k)
+                {
+                    const bool kept = (y % 2 == 1) == keepSecond;
+                    const bool inside = y > 0 && y + 1 < height;
+                    const double expected = kept ? at(source, y, k)
+                                            : inside
+                                                ? mean(at(source, y - 1, k), at(source, y + 1, k))
+                                                : at(source, y > 0 ? y - 1 : y + 1, k);
+                    ASSERT_EQ(at(frame, y, k), expected) << "row " << y << " value " << k;
+                }
+            // Quarter height: each row the mean of two consecutive rows of the kept field.
+            Image quarter(format, width, 1, 2);
+            Image tall(format, width, 4, 0);
+            for (std::int32_t y = 0; y < 4; ++y)
+                std::memcpy(tall.Row(y), source.Row(y), bytes);
+            ASSERT_EQ(IR_DeinterlaceCopy(tall.Data(), tall.RowBytes(), 4, quarter.Data(),
+                                         quarter.RowBytes(), 1, format, width, keepSecond, 5),
+                      kIR_NoError);
+            const std::int32_t field = keepSecond ? 1 : 0;
+            for (std::size_t k = 0; k < values; ++k)
+                ASSERT_EQ(at(quarter, 0, k), mean(at(tall, field, k), at(tall, field + 2, k)));
+        }
+}
+
+INSTANTIATE_TEST_SUITE_P(Layouts, DeinterlaceKernelTest,
+                         ::testing::Values(kBGRA8, kBGRP32f, kIR_PixelFormat_VUYA_4444_8u,
+                                           kIR_PixelFormat_YUYV_422_8u));
 } // namespace
