@@ -166,6 +166,14 @@ std::int32_t IR_CrossDissolve(const void* inSrcA, std::int32_t inSrcARowBytes, c
     const View a = IR::MakeView(inSrcA, inSrcARowBytes, info, inHeight);
     const View b = IR::MakeView(inSrcB, inSrcBRowBytes, info, inHeight);
     const View d = IR::MakeView(outDst, inDstRowBytes, info, inHeight);
+    if (inQuality >= IR::kBestQuality && !info.linear && !info.isFloat)
+    {
+        const void* sources[2] = {inSrcA, inSrcB};
+        const std::int32_t rowBytes[2] = {inSrcARowBytes, inSrcBRowBytes};
+        const double weights[2] = {1.0 - static_cast<double>(inWeight), inWeight};
+        return IR::AccumulateLinear8(sources, rowBytes, weights, 2, outDst, inDstRowBytes, info,
+                                     inWidth, inHeight);
+    }
     if (inQuality >= IR::kBestQuality && !info.linear)
     {
         IR::ScratchBlock rows(static_cast<std::size_t>(inWidth) * 32);

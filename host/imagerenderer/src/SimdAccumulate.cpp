@@ -1,9 +1,9 @@
 // Fused linear-light accumulation of 8-bit BGRA rows (SimdAccumulate.h).
 //
-// Lanes are the bytes of the row as they lie (B, G, R, A, B, ...), one 32-bit lane
-// per byte, so a pixel is four lanes and fills one 128-bit block. Every source is
-// promoted, linearised and added into one float vector per block; the last partial
-// block goes through stack copies, so the tail gets the arithmetic of the body.
+// Pixels are split into one float vector per channel (a block of as many pixels as a
+// vector has float lanes), so the transfer runs on colour only. Every source is split,
+// linearised and added into the four channel sums of the block; the last partial block
+// goes through stack copies, so the tail gets the arithmetic of the body.
 //
 // The transfer both ways is computed, with no table reads (gathers are slow on some
 // processors):
@@ -132,7 +132,6 @@ using DF = hn::ScalableTag<float>;
 using DI = hn::RebindToSigned<DF>;
 using D8 = hn::Rebind<std::uint8_t, DI>;
 using VF = hn::Vec<DF>;
-using VI = hn::Vec<DI>;
 
 HWY_INLINE VF Clamp01(DF inDf, VF inV)
 {
@@ -163,41 +162,24 @@ HWY_INLINE VF ToEncoded(DF inDf, VF inL)
                           Evaluate(inDf, kEncode, hn::Sqrt(hn::Sqrt(inL))));
 }
 
-// Byte codes as linear light; alpha lanes as code / 255.
-template <bool kPremultiplied>
-HWY_INLINE VF Linearize(DF inDf, VI inCodes, hn::Mask<DF> inAlphaLane)
+// Byte codes as values in 0..1.
+HWY_INLINE VF Unit(DF inDf, hn::Vec<D8> inCodes)
 {
-    const VF a = hn::Mul(hn::ConvertTo(inDf, inCodes), hn::Set(inDf, 1.0f / 255.0f));
-    if constexpr (!kPremultiplied)
-        return hn::IfThenElse(inAlphaLane, a, ToLinear(inDf, a));
-    else
-    {
-        const VF alpha = hn::Broadcast<3>(a);
-        const auto visible = hn::Gt(alpha, hn::Zero(inDf));
-        const VF safe = hn::IfThenElse(visible, alpha, hn::Set(inDf, 1.0f));
-        const VF straight = hn::IfThenElseZero(visible, Clamp01(inDf, hn::Div(a, safe)));
-        return hn::IfThenElse(inAlphaLane, alpha, hn::Mul(ToLinear(inDf, straight), alpha));
-    }
+    return hn::Mul(hn::ConvertTo(inDf, hn::PromoteTo(DI(), inCodes)), hn::Set(inDf, 1.0f / 255.0f));
 }
 
-// The sum back to byte codes (alpha clamped to 0..1, colour encoded).
-template <bool kPremultiplied>
-HWY_INLINE VI Encode(DF inDf, VF inSum, hn::Mask<DF> inAlphaLane)
+// 1 / alpha where alpha is above zero, else 0 (colour of a transparent pixel counts as 0).
+HWY_INLINE VF Reciprocal(DF inDf, VF inAlpha)
 {
-    const DI di;
-    const VF alpha = Clamp01(inDf, hn::Broadcast<3>(inSum));
-    VF straight = Clamp01(inDf, inSum);
-    VF scale = hn::Set(inDf, 255.0f);
-    if constexpr (kPremultiplied)
-    {
-        const auto visible = hn::Gt(alpha, hn::Zero(inDf));
-        const VF safe = hn::IfThenElse(visible, alpha, hn::Set(inDf, 1.0f));
-        straight = hn::IfThenElseZero(visible, Clamp01(inDf, hn::Div(inSum, safe)));
-        scale = hn::Mul(scale, alpha);
-    }
-    const VF value = hn::IfThenElse(inAlphaLane, hn::Mul(alpha, hn::Set(inDf, 255.0f)),
-                                    hn::Mul(ToEncoded(inDf, straight), scale));
-    return hn::ConvertTo(di, hn::Add(value, hn::Set(inDf, 0.5f)));
+    const auto visible = hn::Gt(inAlpha, hn::Zero(inDf));
+    return hn::IfThenElseZero(
+        visible,
+        hn::Div(hn::Set(inDf, 1.0f), hn::IfThenElse(visible, inAlpha, hn::Set(inDf, 1.0f))));
+}
+
+HWY_INLINE hn::Vec<D8> ToCodes(DF inDf, VF inValue)
+{
+    return hn::DemoteTo(D8(), hn::ConvertTo(DI(), hn::Add(inValue, hn::Set(inDf, 0.5f))));
 }
 
 template <bool kPremultiplied>
@@ -205,44 +187,68 @@ void AccumulateLinear(const std::uint8_t* const* inRows, const float* inWeights,
                       std::int32_t inSources, std::uint8_t* outDst, std::int32_t inPixels)
 {
     const DF df;
-    const DI di;
     const D8 d8;
     const std::size_t n = hn::Lanes(df);
-    const auto alphaLane =
-        hn::RebindMask(df, hn::Eq(hn::And(hn::Iota(di, 0), hn::Set(di, 3)), hn::Set(di, 3)));
-    const std::size_t bytes = 4 * static_cast<std::size_t>(inPixels);
-    // One block of n bytes at offset inAt; inTail bytes (< n) when it is the last partial one.
-    const auto block = [&](std::size_t inAt, std::size_t inTail)
+    const auto pixels = static_cast<std::size_t>(inPixels);
+    // n pixels from pixel inX; inTail pixels (< n) when it is the last partial block.
+    const auto block = [&](std::size_t inX, std::size_t inTail)
     {
-        VF sum = hn::Zero(df);
-        alignas(64) std::uint8_t part[HWY_MAX_BYTES];
+        VF sum[4] = {hn::Zero(df), hn::Zero(df), hn::Zero(df), hn::Zero(df)};
+        alignas(64) std::uint8_t part[4 * HWY_MAX_BYTES / sizeof(float)];
         for (std::int32_t s = 0; s < inSources; ++s)
         {
-            const std::uint8_t* from = inRows[s] + inAt;
+            const std::uint8_t* from = inRows[s] + 4 * inX;
             if (inTail != 0)
             {
                 std::memset(part, 0, sizeof part);
-                std::memcpy(part, from, inTail);
+                std::memcpy(part, from, 4 * inTail);
                 from = part;
             }
-            const VI codes = hn::PromoteTo(di, hn::LoadU(d8, from));
-            sum = hn::MulAdd(hn::Set(df, inWeights[s]),
-                             Linearize<kPremultiplied>(df, codes, alphaLane), sum);
+            hn::Vec<D8> channels[4];
+            hn::LoadInterleaved4(d8, from, channels[0], channels[1], channels[2], channels[3]);
+            const VF w = hn::Set(df, inWeights[s]);
+            const VF alpha = Unit(df, channels[3]);
+            VF toStraight = hn::Set(df, 1.0f);
+            if constexpr (kPremultiplied)
+                toStraight = Reciprocal(df, alpha);
+            for (int c = 0; c < 3; ++c)
+            {
+                VF linear;
+                if constexpr (kPremultiplied)
+                    linear = hn::Mul(
+                        ToLinear(df, Clamp01(df, hn::Mul(Unit(df, channels[c]), toStraight))),
+                        alpha);
+                else
+                    linear = ToLinear(df, Unit(df, channels[c]));
+                sum[c] = hn::MulAdd(w, linear, sum[c]);
+            }
+            sum[3] = hn::MulAdd(w, alpha, sum[3]);
         }
-        const auto out = hn::DemoteTo(d8, Encode<kPremultiplied>(df, sum, alphaLane));
-        if (inTail == 0)
+        const VF alpha = Clamp01(df, sum[3]);
+        VF scale = hn::Set(df, 255.0f);
+        VF toStraight = hn::Set(df, 1.0f);
+        if constexpr (kPremultiplied)
         {
-            hn::StoreU(out, d8, outDst + inAt);
-            return;
+            scale = hn::Mul(scale, alpha);
+            toStraight = Reciprocal(df, alpha);
         }
-        hn::StoreU(out, d8, part);
-        std::memcpy(outDst + inAt, part, inTail);
+        hn::Vec<D8> codes[3];
+        for (int c = 0; c < 3; ++c)
+        {
+            const VF straight = Clamp01(df, hn::Mul(sum[c], toStraight));
+            codes[c] = ToCodes(df, hn::Mul(ToEncoded(df, straight), scale));
+        }
+        const hn::Vec<D8> alphaCodes = ToCodes(df, hn::Mul(alpha, hn::Set(df, 255.0f)));
+        std::uint8_t* to = inTail == 0 ? outDst + 4 * inX : part;
+        hn::StoreInterleaved4(codes[0], codes[1], codes[2], alphaCodes, d8, to);
+        if (inTail != 0)
+            std::memcpy(outDst + 4 * inX, part, 4 * inTail);
     };
-    std::size_t i = 0;
-    for (; i + n <= bytes; i += n)
-        block(i, 0);
-    if (i < bytes)
-        block(i, bytes - i);
+    std::size_t x = 0;
+    for (; x + n <= pixels; x += n)
+        block(x, 0);
+    if (x < pixels)
+        block(x, pixels - x);
 }
 #endif
 

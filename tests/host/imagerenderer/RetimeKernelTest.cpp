@@ -20,10 +20,15 @@ struct WeightCase
 };
 
 const WeightCase kWeightCases[] = {
-    {"Halves", {0.5, 0.5}},   {"Thirds", {0.2, 0.5, 0.3}},
-    {"Single", {1.0}},        {"SingleAmongZeros", {0.0, 1.0, 0.0}},
-    {"AllZero", {0.0, 0.0}},  {"AboveOne", {0.8, 0.7}},
-    {"BelowOne", {0.3, 0.2}}, {"Negative", {1.4, -0.4}},
+    {"Halves", {0.5, 0.5}},
+    {"Quarter", {0.75, 0.25}},
+    {"Thirds", {0.2, 0.5, 0.3}},
+    {"Single", {1.0}},
+    {"SingleAmongZeros", {0.0, 1.0, 0.0}},
+    {"AllZero", {0.0, 0.0}},
+    {"AboveOne", {0.8, 0.7}},
+    {"BelowOne", {0.3, 0.2}},
+    {"Negative", {1.4, -0.4}},
     {"ScaledSingle", {0.6}},
 };
 
@@ -72,6 +77,17 @@ TEST_P(AccumulateLinearTest, MatchesReferenceAtEveryTailLength)
         for (std::int32_t y = 0; y < 3; ++y)
             for (std::int32_t i = 0; i < Image::kPadding; ++i)
                 ASSERT_EQ(got.Row(y)[used + static_cast<std::size_t>(i)], 0xA5);
+        // A pair of weights 1 - w and w in 0..1 is also a dissolve, mixed the same way.
+        const std::vector<double>& w = weightCase.weights;
+        if (count == 2 && w[1] >= 0.0 && w[1] <= 1.0 && w[0] + w[1] == 1.0)
+        {
+            Image dissolved(format, width, 3, 1);
+            ASSERT_EQ(IR_CrossDissolve(bases[0], rowBytes[0], bases[1], rowBytes[1],
+                                       dissolved.Data(), dissolved.RowBytes(), format, width, 3,
+                                       static_cast<float>(w[1]), 5),
+                      kIR_NoError);
+            EXPECT_LE(MaxDifference(dissolved, expected), 1);
+        }
     }
 }
 
