@@ -32,9 +32,7 @@ const WeightCase kWeightCases[] = {
     {"ScaledSingle", {0.6}},
 };
 
-class AccumulateLinearTest : public ::testing::TestWithParam<std::tuple<IR_PixelFormat, WeightCase>>
-{
-};
+using AccumulateLinearTest = ::testing::TestWithParam<std::tuple<IR_PixelFormat, WeightCase>>;
 
 TEST_P(AccumulateLinearTest, MatchesReferenceAtEveryTailLength)
 {
@@ -51,16 +49,12 @@ TEST_P(AccumulateLinearTest, MatchesReferenceAtEveryTailLength)
         std::vector<std::int32_t> rowBytes;
         for (std::int32_t i = 0; i < count; ++i)
         {
-            sources.emplace_back(format, width, 3, (width + i) % 4);
-            sources.back().Randomise(random);
-            // Extremes and a transparent pixel in every source.
-            sources.back().Set(0, 0, {0, 0, 0, 0});
-            sources.back().Set(width - 1, 2, {255, 255, 255, 255});
-            sources.back().Set(width / 2, 1, {1, 10, 12, 255});
-        }
-        for (const Image& source : sources)
-        {
-            bases.push_back(source.Data());
+            Image& source = sources.emplace_back(format, width, 3, (width + i) % 4);
+            source.Randomise(random);
+            source.Set(0, 0, {0, 0, 0, 0}); // a transparent pixel and the extremes
+            source.Set(width - 1, 2, {255, 255, 255, 255});
+            source.Set(width / 2, 1, {1, 10, 12, 255});
+            bases.push_back(source.Data()); // moving an image keeps its storage
             rowBytes.push_back(source.RowBytes());
         }
         Image got(format, width, 3, 3), expected(format, width, 3);
@@ -74,35 +68,24 @@ TEST_P(AccumulateLinearTest, MatchesReferenceAtEveryTailLength)
                                          count, expected.Data(), expected.RowBytes(), premultiplied,
                                          width, 3);
         EXPECT_LE(MaxDifference(got, expected), 1);
-        for (std::int32_t y = 0; y < 3; ++y)
-            for (std::int32_t i = 0; i < Image::kPadding; ++i)
-                ASSERT_EQ(got.Row(y)[used + static_cast<std::size_t>(i)], 0xA5);
+        for (std::int32_t i = 0; i < 3 * Image::kPadding; ++i) // nothing written past the rows
+            ASSERT_EQ(got.Row(i / Image::kPadding)[used + std::size_t(i % Image::kPadding)], 0xA5);
         // A pair of weights 1 - w and w in 0..1 is also a dissolve, mixed the same way.
         const std::vector<double>& w = weightCase.weights;
-        if (count == 2 && w[1] >= 0.0 && w[1] <= 1.0 && w[0] + w[1] == 1.0)
-        {
-            Image dissolved(format, width, 3, 1);
-            ASSERT_EQ(IR_CrossDissolve(bases[0], rowBytes[0], bases[1], rowBytes[1],
-                                       dissolved.Data(), dissolved.RowBytes(), format, width, 3,
-                                       static_cast<float>(w[1]), 5),
-                      kIR_NoError);
-            EXPECT_LE(MaxDifference(dissolved, expected), 1);
-        }
+        if (count != 2 || w[1] < 0.0 || w[0] < 0.0 || w[0] + w[1] != 1.0)
+            continue;
+        ASSERT_EQ(IR_CrossDissolve(bases[0], rowBytes[0], bases[1], rowBytes[1], got.Data(),
+                                   got.RowBytes(), format, width, 3, float(w[1]), 5),
+                  kIR_NoError);
+        EXPECT_LE(MaxDifference(got, expected), 1);
     }
 }
 
-INSTANTIATE_TEST_SUITE_P(
-    Formats, AccumulateLinearTest,
-    ::testing::Combine(::testing::Values(kBGRA8, kBGRP8, kBGRA8 | kIR_FormatBit_BottomLeft,
-                                         kBGRP8 | kIR_FormatBit_BottomLeft),
-                       ::testing::ValuesIn(kWeightCases)),
-    [](const auto& inInfo)
-    {
-        const IR_PixelFormat format = std::get<0>(inInfo.param);
-        return std::string((format & kIR_FormatBit_PremultipliedAlpha) ? "BGRP" : "BGRA") +
-               ((format & kIR_FormatBit_BottomLeft) ? "BottomLeft" : "") +
-               std::get<1>(inInfo.param).name;
-    });
+INSTANTIATE_TEST_SUITE_P(Formats, AccumulateLinearTest,
+                         ::testing::Combine(::testing::Values(kBGRA8, kBGRP8,
+                                                              kBGRA8 | kIR_FormatBit_BottomLeft,
+                                                              kBGRP8 | kIR_FormatBit_BottomLeft),
+                                            ::testing::ValuesIn(kWeightCases)));
 
 // A half-way mix in linear light is brighter than the mix of the codes, and the transfer
 // there and back leaves every code where it was, whatever the association.
@@ -111,27 +94,23 @@ TEST(AccumulateLinearValues, MixesInLinearLightAndRoundTripsEveryCode)
     for (IR_PixelFormat format : {kBGRA8, kBGRP8})
     {
         SCOPED_TRACE(format);
-        Image black(format, 256, 1), white(format, 256, 1), codes(format, 256, 1);
+        Image codes(format, 256, 1), white = One(format, {255, 255, 255, 255}),
+                                     mixed(format, 256, 1);
         for (std::int32_t x = 0; x < 256; ++x)
-        {
-            black.Set(x, 0, {0, 0, 0, 255});
-            white.Set(x, 0, {255, 255, 255, 255});
             codes.Set(x, 0, {std::uint8_t(x), std::uint8_t(x), std::uint8_t(255 - x), 255});
-        }
-        const void* pair[] = {black.Data(), white.Data()};
-        const std::int32_t rows[] = {black.RowBytes(), white.RowBytes()};
+        // Codes 0 and 255 in equal parts: half of linear white, code 188 (0.7354 of full scale).
+        const void* pair[] = {codes.Data(), white.Data()};
+        const std::int32_t rows[] = {codes.RowBytes(), white.RowBytes()};
         const double halves[] = {0.5, 0.5};
-        Image mixed(format, 256, 1);
         ASSERT_EQ(
-            IR_Accumulate(pair, rows, halves, 2, mixed.Data(), mixed.RowBytes(), format, 256, 1, 5),
+            IR_Accumulate(pair, rows, halves, 2, mixed.Data(), mixed.RowBytes(), format, 1, 1, 5),
             kIR_NoError);
-        // Half of linear white encodes to code 188 (0.7354 of full scale).
-        EXPECT_EQ(mixed.Get(17, 0), (Pixel{188, 188, 188, 255}));
+        EXPECT_EQ(mixed.Get(0, 0), (Pixel{188, 188, 255, 255}));
         // Three sources of the same codes with weights summing to one give the codes back.
         const void* same[] = {codes.Data(), codes.Data(), codes.Data()};
         const std::int32_t sameRows[] = {codes.RowBytes(), codes.RowBytes(), codes.RowBytes()};
-        const double thirds[] = {0.25, 0.5, 0.25};
-        ASSERT_EQ(IR_Accumulate(same, sameRows, thirds, 3, mixed.Data(), mixed.RowBytes(), format,
+        const double parts[] = {0.25, 0.5, 0.25};
+        ASSERT_EQ(IR_Accumulate(same, sameRows, parts, 3, mixed.Data(), mixed.RowBytes(), format,
                                 256, 1, 5),
                   kIR_NoError);
         EXPECT_EQ(MaxDifference(mixed, codes), 0);
@@ -141,28 +120,23 @@ TEST(AccumulateLinearValues, MixesInLinearLightAndRoundTripsEveryCode)
 // Deinterlacing against means computed here, byte by byte or float by float: every
 // interleaved layout, widths covering every vector tail, either field kept, in place
 // and by quarter-height field copy.
-class DeinterlaceKernelTest : public ::testing::TestWithParam<IR_PixelFormat>
-{
-};
+using DeinterlaceKernelTest = ::testing::TestWithParam<IR_PixelFormat>;
 
 TEST_P(DeinterlaceKernelTest, RebuildsRowsAsTheMeanOfTheKeptRowsAroundThem)
 {
     const IR_PixelFormat format = GetParam();
     const bool isFloat = (format & kIR_FormatBit_Float) != 0;
     std::mt19937 random(format);
-    std::uniform_int_distribution<int> byte(0, 255);
-    // Component k of row y of an image, as a double; and the mean the kernels must give.
+    // Component k of row y of an image, and the mean the kernels must give.
     const auto at = [&](const Image& inImage, std::int32_t inY, std::size_t inK)
     {
-        if (!isFloat)
-            return static_cast<double>(inImage.Row(inY)[inK]);
-        float f;
-        std::memcpy(&f, inImage.Row(inY) + 4 * inK, 4);
-        return double{f};
+        float f = inImage.Row(inY)[inK];
+        if (isFloat)
+            std::memcpy(&f, inImage.Row(inY) + 4 * inK, 4);
+        return f;
     };
-    const auto mean = [&](double inA, double inB) {
-        return isFloat ? double{0.5f * (float(inA) + float(inB))} : std::floor((inA + inB + 1) / 2);
-    };
+    const auto mean = [&](float inA, float inB)
+    { return isFloat ? 0.5f * (inA + inB) : std::floor((inA + inB + 1) / 2); };
     for (std::int32_t width = 1; width <= 67; width += (width < 20 ? 1 : 11))
         for (bool keepSecond : {false, true})
         {
@@ -170,44 +144,39 @@ TEST_P(DeinterlaceKernelTest, RebuildsRowsAsTheMeanOfTheKeptRowsAroundThem)
             const std::int32_t height = 7;
             Image source(format, width, height, width % 3);
             const auto bytes = static_cast<std::size_t>(IR_MinimumRowBytes(format, width));
-            for (std::int32_t y = 0; y < height; ++y)
-                for (std::size_t i = 0; i < bytes; ++i)
-                    source.Row(y)[i] = static_cast<std::uint8_t>(byte(random));
-            if (isFloat) // finite values in 0..1
-                for (std::int32_t y = 0; y < height; ++y)
-                    for (std::int32_t x = 0; x < width; ++x)
-                        source.SetF(x, y, {byte(random) / 255.0f, 0.25f, 0.5f, 1.0f});
+            for (std::int32_t y = 0; y < height && !isFloat; ++y)
+                std::generate_n(source.Row(y), bytes, [&] { return std::uint8_t(random()); });
+            if (isFloat)
+                source.Randomise(random);
             Image frame = Copy(source, 1);
             ASSERT_EQ(IR_Deinterlace(frame.Data(), frame.RowBytes(), format, width, height,
                                      keepSecond, 5),
                       kIR_NoError);
-            const std::size_t values = isFloat ? bytes / 4 : bytes;
-            for (std::int32_t y = 0; y < height; ++y)
-                for (std::size_t k = 0; k < values; ++k)
-                {
-                    const bool kept = (y % 2 == 1) == keepSecond;
-                    const bool inside = y > 0 && y + 1 < height;
-                    const double expected = kept ? at(source, y, k)
-                                            : inside
-                                                ? mean(at(source, y - 1, k), at(source, y + 1, k))
-                                                : at(source, y > 0 ? y - 1 : y + 1, k);
-                    ASSERT_EQ(at(frame, y, k), expected) << "row " << y << " value " << k;
-                }
-            // Quarter height: each row the mean of two consecutive rows of the kept field.
+            // Quarter height from the first four rows: the mean of the kept field's two rows.
             Image quarter(format, width, 1, 2);
-            Image tall(format, width, 4, 0);
-            for (std::int32_t y = 0; y < 4; ++y)
-                std::memcpy(tall.Row(y), source.Row(y), bytes);
-            ASSERT_EQ(IR_DeinterlaceCopy(tall.Data(), tall.RowBytes(), 4, quarter.Data(),
+            ASSERT_EQ(IR_DeinterlaceCopy(source.Data(), source.RowBytes(), 4, quarter.Data(),
                                          quarter.RowBytes(), 1, format, width, keepSecond, 5),
                       kIR_NoError);
             const std::int32_t field = keepSecond ? 1 : 0;
-            for (std::size_t k = 0; k < values; ++k)
-                ASSERT_EQ(at(quarter, 0, k), mean(at(tall, field, k), at(tall, field + 2, k)));
+            for (std::size_t k = 0; k < (isFloat ? bytes / 4 : bytes); ++k)
+            {
+                ASSERT_EQ(at(quarter, 0, k), mean(at(source, field, k), at(source, field + 2, k)));
+                for (std::int32_t y = 0; y < height; ++y)
+                {
+                    const bool kept = (y % 2 == 1) == keepSecond;
+                    const float expected =
+                        kept ? at(source, y, k)
+                             : (y > 0 && y + 1 < height
+                                    ? mean(at(source, y - 1, k), at(source, y + 1, k))
+                                    : at(source, y > 0 ? y - 1 : y + 1, k));
+                    ASSERT_EQ(at(frame, y, k), expected) << "row " << y << " value " << k;
+                }
+            }
         }
 }
 
 INSTANTIATE_TEST_SUITE_P(Layouts, DeinterlaceKernelTest,
                          ::testing::Values(kBGRA8, kBGRP32f, kIR_PixelFormat_VUYA_4444_8u,
                                            kIR_PixelFormat_YUYV_422_8u));
+
 } // namespace
