@@ -6,6 +6,8 @@
 #include "Checks.h"
 #include "Kernels.h"
 #include "Scale.h"
+#include "SimdAccumulate.h"
+#include "SimdDeinterlace.h"
 #include "YUV.h"
 
 #include <algorithm>
@@ -165,6 +167,14 @@ std::int32_t IR_CrossDissolve(const void* inSrcA, std::int32_t inSrcARowBytes, c
     const View a = IR::MakeView(inSrcA, inSrcARowBytes, info, inHeight);
     const View b = IR::MakeView(inSrcB, inSrcBRowBytes, info, inHeight);
     const View d = IR::MakeView(outDst, inDstRowBytes, info, inHeight);
+    if (inQuality >= IR::kBestQuality && !info.linear && !info.isFloat)
+    {
+        const void* sources[2] = {inSrcA, inSrcB};
+        const std::int32_t rowBytes[2] = {inSrcARowBytes, inSrcBRowBytes};
+        const double weights[2] = {1.0 - static_cast<double>(inWeight), inWeight};
+        return IR::AccumulateLinear8(sources, rowBytes, weights, 2, outDst, inDstRowBytes, info,
+                                     inWidth, inHeight);
+    }
     if (inQuality >= IR::kBestQuality && !info.linear)
     {
         IR::ScratchBlock rows(static_cast<std::size_t>(inWidth) * 32);
@@ -221,6 +231,9 @@ std::int32_t IR_Accumulate(const void* const* inSrcs, const std::int32_t* inSrcR
         return kIR_NoError;
     const std::int32_t values = inWidth * 4;
     const bool viaLinear = inQuality >= IR::kBestQuality && !info.linear;
+    if (viaLinear && !info.isFloat)
+        return IR::AccumulateLinear8(inSrcs, inSrcRowBytes, inWeights, inCount, outDst,
+                                     inDstRowBytes, info, inWidth, inHeight);
     IR::ScratchBlock rows(static_cast<std::size_t>(values) * 8);
     if (!rows.Valid())
         return kIR_OutOfMemory;
@@ -513,16 +526,11 @@ void AverageRows(const std::uint8_t* inA, const std::uint8_t* inB, std::uint8_t*
                  std::size_t inBytes, bool inFloat)
 {
     if (inFloat)
-    {
-        const auto* a = reinterpret_cast<const float*>(inA);
-        const auto* b = reinterpret_cast<const float*>(inB);
-        auto* d = reinterpret_cast<float*>(outDst);
-        for (std::size_t i = 0; i < inBytes / 4; ++i)
-            d[i] = 0.5f * (a[i] + b[i]);
-        return;
-    }
-    for (std::size_t i = 0; i < inBytes; ++i)
-        outDst[i] = static_cast<std::uint8_t>((inA[i] + inB[i] + 1) >> 1);
+        IR::Simd::AverageRowsF(reinterpret_cast<const float*>(inA),
+                               reinterpret_cast<const float*>(inB),
+                               reinterpret_cast<float*>(outDst), inBytes / 4);
+    else
+        IR::Simd::AverageRows8(inA, inB, outDst, inBytes);
 }
 
 } // namespace

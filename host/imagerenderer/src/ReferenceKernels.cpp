@@ -137,6 +137,45 @@ void Accumulate(const void* const* inSrcs, const std::int32_t* inSrcRowBytes,
         }
 }
 
+void AccumulateLinear8(const void* const* inSrcs, const std::int32_t* inSrcRowBytes,
+                       const double* inWeights, std::int32_t inCount, void* outDst,
+                       std::int32_t inDstRowBytes, bool inPremultiplied, std::int32_t inWidth,
+                       std::int32_t inHeight)
+{
+    const auto toLinear = [](double inC)
+    { return inC <= 0.04045 ? inC / 12.92 : std::pow((inC + 0.055) / 1.055, 2.4); };
+    const auto toEncoded = [](double inL)
+    { return inL <= 0.0031308 ? inL * 12.92 : 1.055 * std::pow(inL, 1.0 / 2.4) - 0.055; };
+    for (std::int32_t y = 0; y < inHeight; ++y)
+        for (std::int32_t x = 0; x < inWidth; ++x)
+        {
+            double sum[4] = {0.0, 0.0, 0.0, 0.0};
+            for (std::int32_t i = 0; i < inCount; ++i)
+            {
+                double p[4];
+                Get(RowOf(inSrcs[i], inSrcRowBytes[i], y), false, x, p);
+                for (int c = 0; c < 3; ++c)
+                {
+                    double linear = toLinear(p[c]);
+                    if (inPremultiplied)
+                        linear = p[3] > 0.0 ? toLinear(std::min(1.0, p[c] / p[3])) * p[3] : 0.0;
+                    sum[c] += inWeights[i] * linear;
+                }
+                sum[3] += inWeights[i] * p[3];
+            }
+            const double a = std::clamp(sum[3], 0.0, 1.0);
+            double out[4] = {0.0, 0.0, 0.0, a};
+            for (int c = 0; c < 3; ++c)
+            {
+                if (!inPremultiplied)
+                    out[c] = toEncoded(std::clamp(sum[c], 0.0, 1.0));
+                else if (a > 0.0)
+                    out[c] = toEncoded(std::clamp(sum[c] / a, 0.0, 1.0)) * a;
+            }
+            Put(RowOf(outDst, inDstRowBytes, y), false, x, out);
+        }
+}
+
 void PremultipliedToStraight8(const std::uint8_t* inSrc, std::int32_t inSrcRowBytes,
                               std::uint8_t* outDst, std::int32_t inDstRowBytes,
                               std::int32_t inWidth, std::int32_t inHeight)

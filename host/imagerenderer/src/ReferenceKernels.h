@@ -27,6 +27,14 @@ void Accumulate(const void* const* inSrcs, const std::int32_t* inSrcRowBytes,
                 std::int32_t inDstRowBytes, IR_PixelFormat inFormat, std::int32_t inWidth,
                 std::int32_t inHeight);
 
+// The same on 8-bit BGRA (straight or premultiplied) in linear light, with the exact sRGB
+// transfer: premultiplied colour is un-premultiplied before linearising (capped at alpha)
+// and the sum is un-premultiplied by its clamped alpha before encoding.
+void AccumulateLinear8(const void* const* inSrcs, const std::int32_t* inSrcRowBytes,
+                       const double* inWeights, std::int32_t inCount, void* outDst,
+                       std::int32_t inDstRowBytes, bool inPremultiplied, std::int32_t inWidth,
+                       std::int32_t inHeight);
+
 // 8-bit association changes.
 void PremultipliedToStraight8(const std::uint8_t* inSrc, std::int32_t inSrcRowBytes,
                               std::uint8_t* outDst, std::int32_t inDstRowBytes,

@@ -126,14 +126,23 @@ TEST_F(TimeFiltersTest, TimeBlendAtHalfSpeedBlendsTheTwoFieldsAroundEachOutputFi
     EXPECT_EQ(Prefetches(*blend, *upper, straddling),
               (std::vector{MF::FrameTime(F(6), F(7)), MF::FrameTime(F(8), F(9))}));
 
-    // A progressive request blends the frames around its time.
-    const SourceRef progressive = Blend(MakeMarkedSource(Delivery::kProgressive), 0.5);
+    // A progressive request blends the frames around its time; on the upstream grid it is
+    // the upstream frame itself, whether the blend mixes codes or linear light.
+    auto frames = MakeMarkedSource(Delivery::kProgressive);
+    const SourceRef progressive = Blend(frames, 0.5);
     const TickTime three = Ticks(3 * kFrame);
     const TickTime four = Ticks(4 * kFrame);
     EXPECT_TRUE(
         RowsAre(Render(*progressive, MF::FrameTime(Ticks(3 * kFrame + kFrame / 4)), mParams),
                 WeightedSum({{0.75, Marker(three, 1)}, {0.25, Marker(four, 1)}}),
                 WeightedSum({{0.75, Marker(three, 2)}, {0.25, Marker(four, 2)}}), 1));
+    for (std::uint32_t quality : {4u, 5u})
+    {
+        const FrameRef onGrid =
+            Render(*progressive, MF::FrameTime(four), MakeParams(4, 6, quality));
+        EXPECT_TRUE(onGrid == frames->LastFrame()) << quality;
+        EXPECT_TRUE(RowsAre(onGrid, Marker(four, 1), Marker(four, 2))) << quality;
+    }
 }
 
 TEST_F(TimeFiltersTest, TimeBlendAtTwoAndAHalfAccumulatesEveryFieldInEachOutputFieldsSpan)

@@ -139,6 +139,42 @@ FrameRef WritableStaging(const FrameRef& inFrame, RenderQuality inQuality)
     return VF::MakeWriteableVideoFrame(staging, inQuality);
 }
 
+// Whether the kept field is memory rows 1, 3, 5, ... (the image renderer's second field)
+// when the picture's field inKeepSecond is kept: a bottom-left buffer of even height
+// exchanges the two.
+bool KeepsSecondRows(IR_PixelFormat inFormat, std::int32_t inHeight, bool inKeepSecond)
+{
+    return inKeepSecond != (IR_IsOriginBottomLeft(inFormat) && inHeight % 2 == 0);
+}
+
+// A new frame like the shared frame inFrame (of a format the image renderer addresses)
+// holding only the rows of its kept field, as the writeable copy that deinterlacing
+// rebuilds the other rows of: the rows it would overwrite are not copied.
+FrameRef CopyKeptField(const FrameRef& inFrame, bool inKeepSecond)
+{
+    FrameRef copy = inFrame->CreateEmptyFrame(false);
+    MVX_OUTPUT_CONTRACT(copy != nullptr);
+    const VF::IRFrameBuffer in = VF::GetIRFrameBuffer(*inFrame);
+    const VF::IRWritableFrameBuffer out = VF::GetWritableIRFrameBuffer(*copy);
+    const auto bytes = static_cast<std::size_t>(IR_MinimumRowBytes(in.mFormat, in.mWidth));
+    // A single row is kept whichever field is asked for (it has no neighbour to rebuild from).
+    const std::int32_t first =
+        in.mHeight < 2 ? 0 : (KeepsSecondRows(in.mFormat, in.mHeight, inKeepSecond) ? 1 : 0);
+    const std::int32_t step = in.mHeight < 2 ? 1 : 2;
+    const bool bottomLeft = IR_IsOriginBottomLeft(in.mFormat);
+    for (std::int32_t y = first; y < in.mHeight; y += step)
+    {
+        const std::int32_t row = bottomLeft ? in.mHeight - 1 - y : y;
+        std::memcpy(static_cast<std::uint8_t*>(out.mBase) + std::ptrdiff_t{row} * out.mRowBytes,
+                    static_cast<const std::uint8_t*>(in.mBase) + std::ptrdiff_t{row} * in.mRowBytes,
+                    bytes);
+    }
+    if (inFrame->TracksVisibleContent())
+        copy->SetVisibleContentRect(inFrame->GetVisibleContentRect());
+    copy->SetRenderTime(inFrame->GetRenderTime());
+    return copy;
+}
+
 } // namespace
 
 void ThrowIfFailed(QRT::Result inStatus)
@@ -235,8 +271,7 @@ FrameRef TakeFieldDirectly(const FrameRef& inFrame, const CutlistRenderParams& i
                                        static_cast<std::uint32_t>(in.mWidth), inParams.mHeight,
                                        inParams.mPixelAspectRatio, false, false, extracted));
     const VF::IRWritableFrameBuffer out = VF::GetWritableIRFrameBuffer(*extracted);
-    const bool keepSecondRows =
-        inKeepSecond != (IR_IsOriginBottomLeft(in.mFormat) && in.mHeight % 2 == 0);
+    const bool keepSecondRows = KeepsSecondRows(in.mFormat, in.mHeight, inKeepSecond);
     ThrowIfFailed(IR_DeinterlaceCopy(in.mBase, in.mRowBytes, in.mHeight, out.mBase, out.mRowBytes,
                                      out.mHeight, in.mFormat, in.mWidth, keepSecondRows,
                                      static_cast<std::int32_t>(quality)));
@@ -275,13 +310,15 @@ FrameRef DeinterlaceKeepingField(const FrameRef& inFrame, const CutlistRenderPar
     }
     else
     {
-        work = VF::MakeWriteableVideoFrame(MakeAddressableCopy(inFrame, inParams), quality);
+        const FrameRef addressable = MakeAddressableCopy(inFrame, inParams);
+        work = addressable == inFrame && inFrame->IsShared() && StagingFormatFor(format) == format
+                   ? CopyKeptField(inFrame, inKeepSecond)
+                   : VF::MakeWriteableVideoFrame(addressable, quality);
     }
 
     const FrameRef staging = WritableStaging(work, quality);
     const VF::IRWritableFrameBuffer buffer = VF::GetWritableIRFrameBuffer(*staging);
-    const bool keepSecondRows =
-        inKeepSecond != (IR_IsOriginBottomLeft(buffer.mFormat) && buffer.mHeight % 2 == 0);
+    const bool keepSecondRows = KeepsSecondRows(buffer.mFormat, buffer.mHeight, inKeepSecond);
     ThrowIfFailed(IR_Deinterlace(buffer.mBase, buffer.mRowBytes, buffer.mFormat, buffer.mWidth,
                                  buffer.mHeight, keepSecondRows,
                                  static_cast<std::int32_t>(inParams.mSecondaryQuality)));

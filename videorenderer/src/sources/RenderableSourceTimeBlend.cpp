@@ -314,6 +314,15 @@ private:
             {
                 const float w = MF::CalculateSampleWeight(inTime.GetSecondFieldTime(), inPlan.mT2a,
                                                           inPlan.mT2b);
+                // On the upstream grid the blend is one upstream frame exactly: that frame
+                // is shared when it already is what the output frame would be.
+                if (w == 0.0f || w == 1.0f)
+                {
+                    const FrameRef& only =
+                        inSources.at(w == 0.0f ? inPlan.mT2a : inPlan.mT2b).mFrame;
+                    if (only && StandsForOutput(*only, *output, inTime))
+                        return only;
+                }
                 SampleSource a = sourceOf(inPlan.mT2a, kWholeFrame);
                 SampleSource b = sourceOf(inPlan.mT2b, kWholeFrame);
                 a.mSlot = kWholeFrame;
@@ -335,6 +344,17 @@ private:
             ThrowIfFailed(VF::VideoFrameManipulators::CopyFrame(
                 work, output, static_cast<mvxmediatypes::RenderQuality>(inParams.mQuality)));
         return output;
+    }
+
+    // Whether inFrame holds what an output frame like inOutput for inTime would: the
+    // same format, bounds, pixel aspect ratio and field order.
+    static bool StandsForOutput(const MF::IVideoFrame& inFrame, const MF::IVideoFrame& inOutput,
+                                const MF::FrameTime& inTime)
+    {
+        return inFrame.GetPixelFormat() == inOutput.GetPixelFormat() &&
+               inFrame.GetBounds() == inOutput.GetBounds() &&
+               inFrame.GetPixelAspectRatio() == inOutput.GetPixelAspectRatio() &&
+               inFrame.GetFieldType() == inTime.GetFieldOrder();
     }
 
     // Blends two sources with weight inWeight for the second onto the rows
