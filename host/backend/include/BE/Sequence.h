@@ -80,8 +80,8 @@ private:
 // inSequence with item inItem of track inTrack (of the video group) replaced
 // by inReplacement. Input contracts: the indices exist; the replacement
 // overlaps no other item of the track.
-SequenceRef ReplaceTrackItem(const SequenceRef& inSequence, std::size_t inTrack,
-                             std::size_t inItem, const TrackItemRef& inReplacement);
+SequenceRef ReplaceTrackItem(const SequenceRef& inSequence, std::size_t inTrack, std::size_t inItem,
+                             const TrackItemRef& inReplacement);
 
 // inSequence with track inTrack's muted and locked flags replaced.
 SequenceRef ReplaceTrackSettings(const SequenceRef& inSequence, std::size_t inTrack,

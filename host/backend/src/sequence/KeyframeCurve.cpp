@@ -1,7 +1,6 @@
 // KeyframeCurve: evaluation of a track item's animated parameters (BE/Keyframes.h).
 
 #include "BE/Keyframes.h"
-
 #include "mvxcore/debug/Contract.h"
 
 #include <algorithm>
@@ -58,22 +57,22 @@ MF::KeyframePoint KeyframeCurve::ValueAt(mt::TickTime inTime) const
     if (inTime >= mKeys.back().mTime)
         return mKeys.back().mValue;
     // The last key at or before inTime governs the span.
-    const auto next = std::upper_bound(mKeys.begin(), mKeys.end(), inTime,
-                                       [](mt::TickTime inT, const CurveKey& inKey)
-                                       { return inT < inKey.mTime; });
+    const auto next =
+        std::upper_bound(mKeys.begin(), mKeys.end(), inTime,
+                         [](mt::TickTime inT, const CurveKey& inKey) { return inT < inKey.mTime; });
     const CurveKey& right = *next;
     const CurveKey& left = *(next - 1);
     const double span = static_cast<double>(right.mTime.GetTicks() - left.mTime.GetTicks());
     const double u = static_cast<double>(inTime.GetTicks() - left.mTime.GetTicks()) / span;
     switch (left.mInterpolation)
     {
-        case KeyframeInterpolation::kHold:
-            return left.mValue;
-        case KeyframeInterpolation::kLinear:
-            return {left.mValue.mX + (right.mValue.mX - left.mValue.mX) * u,
-                    left.mValue.mY + (right.mValue.mY - left.mValue.mY) * u};
-        case KeyframeInterpolation::kBezier:
-            break;
+    case KeyframeInterpolation::kHold:
+        return left.mValue;
+    case KeyframeInterpolation::kLinear:
+        return {left.mValue.mX + (right.mValue.mX - left.mValue.mX) * u,
+                left.mValue.mY + (right.mValue.mY - left.mValue.mY) * u};
+    case KeyframeInterpolation::kBezier:
+        break;
     }
     const double third = span / static_cast<double>(mt::kTicksPerSecond) / 3.0;
     auto axis = [&](double inV0, double inOut, double inIn, double inV1)

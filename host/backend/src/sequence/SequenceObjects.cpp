@@ -3,7 +3,6 @@
 // media and media streams. Every object is immutable after construction.
 
 #include "BE/Sequence.h"
-
 #include "QRT/Allocated.h"
 #include "mvxcore/debug/Contract.h"
 
@@ -43,9 +42,8 @@ private:
 class Media : public QRT::Implements<ISequenceMedia, IMediaDuration, IStillRanges>
 {
 public:
-    Media(const MediaSettings& inSettings, const StreamSettings& inStream,
-          VideoSourceRef inSource, SequenceRef inNested, bool inStill, bool inMissing,
-          mt::TickTime inDuration)
+    Media(const MediaSettings& inSettings, const StreamSettings& inStream, VideoSourceRef inSource,
+          SequenceRef inNested, bool inStill, bool inMissing, mt::TickTime inDuration)
         : mSettings(inSettings)
         , mStream(QRT::Allocated<MediaStream>::Create<IMediaStream>(inStream, std::move(inSource)))
         , mNested(std::move(inNested))
@@ -229,8 +227,7 @@ SequenceRef MakeSequence(const std::string& inName, const SequenceSettings& inSe
 TrackRef MakeTrack(std::uint32_t inIndex, const TrackSettings& inSettings,
                    std::vector<TrackItemRef> inItems)
 {
-    return QRT::Allocated<VideoTrack>::Create<IVideoTrack>(inIndex, inSettings,
-                                                           std::move(inItems));
+    return QRT::Allocated<VideoTrack>::Create<IVideoTrack>(inIndex, inSettings, std::move(inItems));
 }
 
 // The sequence's tracks as they are, for an edit to copy all but one.
@@ -274,58 +271,58 @@ MediaResult CreateMedia(const MediaSettings& inSettings, const SequenceRef& inNe
     mt::TickTime duration = mt::kTime_Max;
     switch (inSettings.mKind)
     {
-        case MediaKind::kFile:
-        case MediaKind::kStill:
+    case MediaKind::kFile:
+    case MediaKind::kStill:
+    {
+        const std::string& path =
+            inSettings.mResolvedPath.empty() ? inSettings.mLocation : inSettings.mResolvedPath;
+        std::error_code error;
+        if (!std::filesystem::exists(path, error))
         {
-            const std::string& path =
-                inSettings.mResolvedPath.empty() ? inSettings.mLocation : inSettings.mResolvedPath;
-            std::error_code error;
-            if (!std::filesystem::exists(path, error))
-            {
-                result.mMissing = true;
-                result.mStatus.mMessage = path + ": file not found; the media is offline";
-                break;
-            }
-            if (inSettings.mOffline)
-                break;
-            result.mStatus = OpenVideoSource(path, source);
-            if (!result.mStatus.Succeeded())
-                return result;
-            still = still || source->IsStill();
+            result.mMissing = true;
+            result.mStatus.mMessage = path + ": file not found; the media is offline";
             break;
         }
-        case MediaKind::kPattern:
-        {
-            const PatternParseResult pattern = ParsePatternSettings(inSettings.mLocation);
-            if (!pattern.Succeeded())
-            {
-                result.mStatus = {pattern.mResult, pattern.mMessage};
-                return result;
-            }
-            source = CreatePatternSource(pattern.mSettings);
-            still = pattern.mSettings.IsTimeInvariant();
+        if (inSettings.mOffline)
             break;
-        }
-        case MediaKind::kSolid:
+        result.mStatus = OpenVideoSource(path, source);
+        if (!result.mStatus.Succeeded())
+            return result;
+        still = still || source->IsStill();
+        break;
+    }
+    case MediaKind::kPattern:
+    {
+        const PatternParseResult pattern = ParsePatternSettings(inSettings.mLocation);
+        if (!pattern.Succeeded())
         {
-            PatternSettings solid;
-            solid.mKind = PatternKind::kSolid;
-            solid.mWidth = static_cast<std::uint32_t>(stream.mWidth);
-            solid.mHeight = static_cast<std::uint32_t>(stream.mHeight);
-            solid.mFrameRate = stream.mFrameRate;
-            solid.mColor = inSettings.mColor & 0xFFFFFFu;
-            source = CreatePatternSource(solid);
-            break;
+            result.mStatus = {pattern.mResult, pattern.mMessage};
+            return result;
         }
-        case MediaKind::kSequence:
-        {
-            const SequenceSettings& nested =
-                QRT::InterfaceRef<ISequenceSettings>(inNested)->GetSequenceSettings();
-            stream = {nested.mFrameRate,        nested.mWidth,     nested.mHeight,
-                      nested.mPixelAspectRatio, nested.mFieldType, mt::kAlphaChannel_Straight};
-            duration = inNested->GetEnd();
-            break;
-        }
+        source = CreatePatternSource(pattern.mSettings);
+        still = pattern.mSettings.IsTimeInvariant();
+        break;
+    }
+    case MediaKind::kSolid:
+    {
+        PatternSettings solid;
+        solid.mKind = PatternKind::kSolid;
+        solid.mWidth = static_cast<std::uint32_t>(stream.mWidth);
+        solid.mHeight = static_cast<std::uint32_t>(stream.mHeight);
+        solid.mFrameRate = stream.mFrameRate;
+        solid.mColor = inSettings.mColor & 0xFFFFFFu;
+        source = CreatePatternSource(solid);
+        break;
+    }
+    case MediaKind::kSequence:
+    {
+        const SequenceSettings& nested =
+            QRT::InterfaceRef<ISequenceSettings>(inNested)->GetSequenceSettings();
+        stream = {nested.mFrameRate,        nested.mWidth,     nested.mHeight,
+                  nested.mPixelAspectRatio, nested.mFieldType, mt::kAlphaChannel_Straight};
+        duration = inNested->GetEnd();
+        break;
+    }
     }
     if (source)
     {
@@ -373,8 +370,7 @@ SequenceBuilder& SequenceBuilder::AddItem(std::size_t inTrack, const TrackItemRe
     return *this;
 }
 
-SequenceBuilder& SequenceBuilder::AddItem(std::size_t inTrack,
-                                          const TrackItemSettings& inSettings,
+SequenceBuilder& SequenceBuilder::AddItem(std::size_t inTrack, const TrackItemSettings& inSettings,
                                           const MediaRef& inMedia)
 {
     return AddItem(inTrack, CreateTrackItem(inSettings, inMedia));
@@ -396,8 +392,8 @@ SequenceRef SequenceBuilder::Build()
     return MakeSequence(mName, mSettings, std::move(tracks));
 }
 
-SequenceRef ReplaceTrackItem(const SequenceRef& inSequence, std::size_t inTrack,
-                             std::size_t inItem, const TrackItemRef& inReplacement)
+SequenceRef ReplaceTrackItem(const SequenceRef& inSequence, std::size_t inTrack, std::size_t inItem,
+                             const TrackItemRef& inReplacement)
 {
     MVX_INPUT_CONTRACT(inSequence != nullptr && inReplacement != nullptr);
     std::vector<TrackRef> tracks = TracksOf(*inSequence);
