@@ -181,6 +181,14 @@ struct StreamSettings
     friend bool operator==(const StreamSettings&, const StreamSettings&) = default;
 };
 
+// The stream of media made to fit a sequence (solids, nested sequences).
+inline StreamSettings StreamOfSequence(const SequenceSettings& inSequence,
+                                       mvxmediatypes::AlphaChannel inAlpha)
+{
+    return {inSequence.mFrameRate,        inSequence.mWidth,     inSequence.mHeight,
+            inSequence.mPixelAspectRatio, inSequence.mFieldType, inAlpha};
+}
+
 enum class MediaKind
 {
     kFile,
@@ -195,6 +203,8 @@ struct MediaSettings
     MediaKind mKind = MediaKind::kFile;
     // kFile, kStill: the path as given; kPattern: the "pattern:" text;
     // kSequence: the nested sequence's name; kSolid: empty.
+    // Solids: the colour is mColor; the picture made is opaque, the alpha
+    // byte is kept for the renderer to apply.
     std::string mLocation;
     // kFile, kStill: the path opened (mLocation resolved against the
     // timeline file's folder).
@@ -206,7 +216,9 @@ struct MediaSettings
     MF::BinaryData mOpaqueData;
     ColorProfile mColorProfile;
     // What the stream is when the material cannot tell (offline files,
-    // solids) or should be taken as something else.
+    // solids) or should be taken as something else. A solid always has one
+    // once made (1920x1080 at 25 frames per second when none is given;
+    // timeline files give it its sequence's picture).
     std::optional<StreamSettings> mStream;
     // The media's length when the material cannot tell or is to be cut.
     std::optional<mvxmediatypes::TickTime> mDuration;

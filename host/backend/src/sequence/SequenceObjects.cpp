@@ -336,8 +336,13 @@ MediaResult CreateMedia(const MediaSettings& inSettings, const SequenceRef& inNe
         duration = *inSettings.mDuration;
     if (inSettings.mOffline || inSettings.mPending)
         source = {};
+    // A solid's picture is made from its stream, so the stream is part of
+    // what it is.
+    MediaSettings settings = inSettings;
+    if (settings.mKind == MediaKind::kSolid)
+        settings.mStream = stream;
     result.mMedia = QRT::Allocated<Media>::Create<ISequenceMedia>(
-        inSettings, stream, std::move(source), inNested, still, result.mMissing, duration);
+        settings, stream, std::move(source), inNested, still, result.mMissing, duration);
     return result;
 }
 

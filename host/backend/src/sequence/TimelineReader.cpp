@@ -50,9 +50,10 @@ private:
     };
 
     SequenceRef Build(std::size_t inIndex);
-    void ReadTrack(const Node& inNode, mt::FrameRate inRate, SequenceBuilder& ioBuilder);
+    void ReadTrack(const Node& inNode, const SequenceSettings& inSequence,
+                   SequenceBuilder& ioBuilder);
     TrackItemSettings ReadItem(const Node& inNode, mt::FrameRate inRate, mt::TickTime inStart);
-    MediaRef ReadMedia(const Node& inNode, mt::FrameRate inRate);
+    MediaRef ReadMedia(const Node& inNode, const SequenceSettings& inSequence);
     SequenceRef NestedSequence(const Node& inNode, const std::string& inName);
 
     const Json& mRoot;
@@ -134,7 +135,7 @@ SequenceRef TimelineReader::Build(std::size_t inIndex)
 
     SequenceBuilder builder(entry.mName, settings);
     for (const Node& track : node.Elements("tracks"))
-        ReadTrack(track, settings.mFrameRate, builder);
+        ReadTrack(track, settings, builder);
 
     mChain.pop_back();
     Entry& done = mEntries[inIndex];
@@ -143,8 +144,10 @@ SequenceRef TimelineReader::Build(std::size_t inIndex)
     return done.mBuilt;
 }
 
-void TimelineReader::ReadTrack(const Node& inNode, mt::FrameRate inRate, SequenceBuilder& ioBuilder)
+void TimelineReader::ReadTrack(const Node& inNode, const SequenceSettings& inSequence,
+                               SequenceBuilder& ioBuilder)
 {
+    const mt::FrameRate rate = inSequence.mFrameRate;
     CheckKeys(inNode.Value(), inNode.Path(), {"muted", "locked", "items"});
     const std::size_t track =
         ioBuilder.AddTrack({inNode.Bool("muted", false), inNode.Bool("locked", false)});
@@ -155,13 +158,13 @@ void TimelineReader::ReadTrack(const Node& inNode, mt::FrameRate inRate, Sequenc
         if (entry.Value().is_object() && entry.Has("gap"))
         {
             CheckKeys(entry.Value(), entry.Path(), {"gap"});
-            const mt::TickTime gap = entry.Child("gap").AsTime(inRate);
+            const mt::TickTime gap = entry.Child("gap").AsTime(rate);
             if (gap <= mt::kTime_Zero)
                 Fail(entry.PathOf("gap"), "zero or negative gap (" + SecondsText(gap) + ")");
             cursor = cursor + gap;
             continue;
         }
-        const TrackItemSettings settings = ReadItem(entry, inRate, cursor);
+        const TrackItemSettings settings = ReadItem(entry, rate, cursor);
         const std::string place = entry.Has("start") ? entry.PathOf("start") : entry.Path();
         if (previousStart && settings.mStart < *previousStart)
             Fail(place, "the items of a track must be in time order (this one starts at " +
@@ -171,7 +174,7 @@ void TimelineReader::ReadTrack(const Node& inNode, mt::FrameRate inRate, Sequenc
             Fail(place, "the item overlaps the one before it on this track (this one starts at " +
                             SecondsText(settings.mStart) + ", the one before ends at " +
                             SecondsText(cursor) + ")");
-        ioBuilder.AddItem(track, settings, ReadMedia(entry.Child("media"), inRate));
+        ioBuilder.AddItem(track, settings, ReadMedia(entry.Child("media"), inSequence));
         previousStart = settings.mStart;
         cursor = settings.mEnd;
     }
@@ -249,14 +252,22 @@ SequenceRef TimelineReader::NestedSequence(const Node& inNode, const std::string
     return Build(found->second);
 }
 
-MediaRef TimelineReader::ReadMedia(const Node& inNode, mt::FrameRate inRate)
+MediaRef TimelineReader::ReadMedia(const Node& inNode, const SequenceSettings& inSequence)
 {
+    const mt::FrameRate rate = inSequence.mFrameRate;
     static constexpr std::string_view kKinds[] = {"file", "still", "pattern", "color", "sequence"};
     CheckKeys(inNode.Value(), inNode.Path(),
               {"file", "still", "pattern", "color", "sequence", "offline", "pending", "draft",
                "opaque", "colorProfile", "stream", "duration"});
-    // Items naming the same material share one media object.
-    const std::string key = inNode.Value().dump();
+    // Items naming the same material share one media object. A solid
+    // without a stream takes the sequence's picture, so its key does too.
+    std::string key = inNode.Value().dump();
+    const bool sequencePicture = inNode.Has("color") && !inNode.Has("stream");
+    if (sequencePicture)
+        key += std::to_string(inSequence.mWidth) + "x" + std::to_string(inSequence.mHeight) + "@" +
+               std::to_string(rate.GetTicksPerFrame()) + ":" +
+               std::to_string(inSequence.mPixelAspectRatio.GetNumerator()) + "/" +
+               std::to_string(inSequence.mPixelAspectRatio.GetDenominator());
     if (const auto cached = mMedia.find(key); cached != mMedia.end())
         return cached->second;
 
@@ -298,9 +309,11 @@ MediaRef TimelineReader::ReadMedia(const Node& inNode, mt::FrameRate inRate)
         settings.mColorProfile.mName = inNode.String("colorProfile");
     if (inNode.Has("stream"))
         settings.mStream = ReadStream(inNode.Child("stream"));
+    else if (sequencePicture)
+        settings.mStream = StreamOfSequence(inSequence, mt::kAlphaChannel_None);
     if (inNode.Has("duration"))
     {
-        const mt::TickTime duration = inNode.Child("duration").AsTime(inRate);
+        const mt::TickTime duration = inNode.Child("duration").AsTime(rate);
         if (duration <= mt::kTime_Zero)
             Fail(inNode.PathOf("duration"),
                  "zero or negative duration (" + SecondsText(duration) + ")");

@@ -85,8 +85,9 @@ Json StreamJson(const StreamSettings& inStream)
     return stream;
 }
 
-Json MediaJson(const ISequenceMedia& inMedia, mt::FrameRate inRate)
+Json MediaJson(const ISequenceMedia& inMedia, const SequenceSettings& inSequence)
 {
+    const mt::FrameRate rate = inSequence.mFrameRate;
     static constexpr const char* kKinds[] = {"file", "still", "pattern", "color", "sequence"};
     const MediaSettings& settings = inMedia.GetMediaSettings();
     Json media;
@@ -102,10 +103,13 @@ Json MediaJson(const ISequenceMedia& inMedia, mt::FrameRate inRate)
         media["opaque"] = TextOf(settings.mOpaqueData);
     if (!settings.mColorProfile.mName.empty())
         media["colorProfile"] = settings.mColorProfile.mName;
-    if (settings.mStream)
+    // A solid that fits its sequence's picture is read back so without a stream.
+    const bool fits = settings.mKind == MediaKind::kSolid &&
+                      settings.mStream == StreamOfSequence(inSequence, mt::kAlphaChannel_None);
+    if (settings.mStream && !fits)
         media["stream"] = StreamJson(*settings.mStream);
     if (settings.mDuration)
-        media["duration"] = TimeText(*settings.mDuration, inRate);
+        media["duration"] = TimeText(*settings.mDuration, rate);
     return media;
 }
 
@@ -155,31 +159,32 @@ Json ClipJson(const ClipSettings& inClip, mt::FrameRate inRate)
     return clip;
 }
 
-Json ItemJson(const ITrackItem& inItem, mt::FrameRate inRate)
+Json ItemJson(const ITrackItem& inItem, const SequenceSettings& inSequence)
 {
+    const mt::FrameRate rate = inSequence.mFrameRate;
     const TrackItemSettings& settings = inItem.GetSettings();
     const TrackItemSettings fresh;
     Json item;
-    item["start"] = TimeText(settings.mStart, inRate);
-    item["end"] = TimeText(settings.mEnd, inRate);
+    item["start"] = TimeText(settings.mStart, rate);
+    item["end"] = TimeText(settings.mEnd, rate);
     if (settings.IsAdjustmentLayer())
         item["adjustment"] = true;
     PutIf(item, "flags", settings.mFlags & ~kTrackItemFlag_AdjustmentLayer, 0u);
-    item["media"] = MediaJson(*inItem.GetMedia(), inRate);
+    item["media"] = MediaJson(*inItem.GetMedia(), inSequence);
     if (settings.mBlendMode != fresh.mBlendMode)
         item["blend"] = NameOf(kBlendModes, settings.mBlendMode);
-    PutCurve(item, "opacity", settings.mOpacity, fresh.mOpacity, inRate);
+    PutCurve(item, "opacity", settings.mOpacity, fresh.mOpacity, rate);
     if (!(settings.mMotion == fresh.mMotion))
     {
         Json motion = Json::object();
-        PutCurve(motion, "position", settings.mMotion.mPosition, fresh.mMotion.mPosition, inRate);
-        PutCurve(motion, "scale", settings.mMotion.mScale, fresh.mMotion.mScale, inRate);
-        PutCurve(motion, "rotation", settings.mMotion.mRotation, fresh.mMotion.mRotation, inRate);
-        PutCurve(motion, "anchor", settings.mMotion.mAnchor, fresh.mMotion.mAnchor, inRate);
+        PutCurve(motion, "position", settings.mMotion.mPosition, fresh.mMotion.mPosition, rate);
+        PutCurve(motion, "scale", settings.mMotion.mScale, fresh.mMotion.mScale, rate);
+        PutCurve(motion, "rotation", settings.mMotion.mRotation, fresh.mMotion.mRotation, rate);
+        PutCurve(motion, "anchor", settings.mMotion.mAnchor, fresh.mMotion.mAnchor, rate);
         item["motion"] = std::move(motion);
     }
     if (!(settings.mClip == fresh.mClip))
-        item["clip"] = ClipJson(settings.mClip, inRate);
+        item["clip"] = ClipJson(settings.mClip, rate);
     for (const EffectSettings& effect : settings.mEffects)
     {
         Json entry;
@@ -194,8 +199,8 @@ Json ItemJson(const ITrackItem& inItem, mt::FrameRate inRate)
     {
         Json entry;
         entry["match"] = transition.mMatchName;
-        entry["start"] = TimeText(transition.mStart, inRate);
-        entry["end"] = TimeText(transition.mEnd, inRate);
+        entry["start"] = TimeText(transition.mStart, rate);
+        entry["end"] = TimeText(transition.mEnd, rate);
         PutIf(entry, "reverse", transition.mReverse, false);
         if (!transition.mParams.empty())
             entry["params"] = transition.mParams;
@@ -231,7 +236,7 @@ Json SequenceJson(const ISequence& inSequence)
         PutIf(entry, "locked", track->GetTrackSettings().mLocked, false);
         Json items = Json::array();
         for (std::size_t i = 0; i < track->GetItemCount(); ++i)
-            items.push_back(ItemJson(*track->GetItem(i), settings.mFrameRate));
+            items.push_back(ItemJson(*track->GetItem(i), settings));
         entry["items"] = std::move(items);
         tracks.push_back(std::move(entry));
     }
