@@ -29,6 +29,7 @@ namespace BE
 
 // Limits that every sequence and stream keeps.
 inline constexpr std::int32_t kMaxFrameDimension = 32768;
+inline constexpr double kMinFramesPerSecond = 0.01;
 inline constexpr double kMaxFramesPerSecond = 1000.0;
 inline constexpr double kMaxClipSpeed = 1000.0;
 

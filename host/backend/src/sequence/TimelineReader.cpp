@@ -22,6 +22,8 @@ namespace mt = mvxmediatypes;
 using namespace timeline;
 using Json = nlohmann::json;
 
+constexpr std::size_t kMaxNestingDepth = 64;
+
 class TimelineReader
 {
 public:
@@ -188,6 +190,8 @@ TrackItemSettings TimelineReader::ReadItem(const Node& inNode, mt::FrameRate inR
                "motion", "clip", "effects", "transitions"});
     TrackItemSettings item;
     item.mStart = inNode.Time("start", inRate, inStart);
+    if (item.mStart < mt::kTime_Zero)
+        Fail(inNode.PathOf("start"), "the item starts before 0 (" + SecondsText(item.mStart) + ")");
     if (inNode.Has("end") == inNode.Has("duration"))
         Fail(inNode.Path(), inNode.Has("end") ? "give \"end\" or \"duration\", not both"
                                               : "missing key \"end\" (or \"duration\")");
@@ -240,6 +244,10 @@ SequenceRef TimelineReader::NestedSequence(const Node& inNode, const std::string
     const auto found = mByName.find(inName);
     if (found == mByName.end())
         Fail(inNode.PathOf("sequence"), "no sequence named " + Quoted(inName));
+    // Each level of nesting is a level of recursion here and in the renderer.
+    if (mChain.size() >= kMaxNestingDepth)
+        Fail(inNode.PathOf("sequence"),
+             "sequences nest more than " + std::to_string(kMaxNestingDepth) + " deep");
     if (mEntries[found->second].mState == State::kBuilding)
     {
         std::string chain;

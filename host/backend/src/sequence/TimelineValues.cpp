@@ -102,11 +102,11 @@ mt::FrameRate ReadRate(const Node& inNode)
     }
     else
         fps = inNode.AsNumber();
-    if (!(fps > 0.0 && fps <= kMaxFramesPerSecond))
+    if (!(fps >= kMinFramesPerSecond && fps <= kMaxFramesPerSecond))
     {
         std::ostringstream text;
-        text << "frame rate " << fps << " is outside (0, " << kMaxFramesPerSecond
-             << "] frames per second";
+        text << "frame rate " << fps << " is outside " << kMinFramesPerSecond << ".."
+             << kMaxFramesPerSecond << " frames per second";
         Fail(inNode.Path(), text.str());
     }
     return ratio ? mt::FrameRate::Create(numerator, denominator) : mt::FrameRate::FromValue(fps);

@@ -13,6 +13,7 @@
 #include <cmath>
 #include <initializer_list>
 #include <map>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -119,22 +120,30 @@ public:
         return *value;
     }
 
+    // Times stay within a billion seconds (about 31 years) either way, so
+    // that sums of two times never leave the tick range.
     mvxmediatypes::TickTime AsTime(mvxmediatypes::FrameRate inRate) const
     {
+        constexpr double kLimitSeconds = 1.0e9;
+        constexpr std::int64_t kLimitTicks =
+            static_cast<std::int64_t>(kLimitSeconds) * mvxmediatypes::kTicksPerSecond;
+        std::optional<mvxmediatypes::TickTime> time;
         if (mValue.is_number())
         {
             const double seconds = mValue.get<double>();
-            // About 400 years either way still fits the tick range.
-            if (!std::isfinite(seconds) || std::fabs(seconds) > 1.0e10)
-                Fail(mPath, "the time is out of range");
-            return mvxmediatypes::TickTime::FromSeconds(seconds);
+            if (std::isfinite(seconds) && std::fabs(seconds) <= kLimitSeconds)
+                return mvxmediatypes::TickTime::FromSeconds(seconds);
+            Fail(mPath, "the time is more than a billion seconds from 0");
         }
         if (mValue.is_string())
-            if (const auto time = ParseTimeText(mValue.get<std::string>(), inRate))
-                return *time;
-        Fail(mPath,
-             std::string("expected a time (seconds, \"<n>f\" or \"<n>t\"), got ") +
-                 (mValue.is_string() ? Quoted(mValue.get<std::string>()) : TypeName(mValue)));
+            time = ParseTimeText(mValue.get<std::string>(), inRate);
+        if (!time)
+            Fail(mPath,
+                 std::string("expected a time (seconds, \"<n>f\" or \"<n>t\"), got ") +
+                     (mValue.is_string() ? Quoted(mValue.get<std::string>()) : TypeName(mValue)));
+        if (time->GetTicks() > kLimitTicks || time->GetTicks() < -kLimitTicks)
+            Fail(mPath, "the time is more than a billion seconds from 0");
+        return *time;
     }
 
     mvxmediatypes::TickTime Time(std::string_view inKey, mvxmediatypes::FrameRate inRate,

@@ -212,6 +212,17 @@ std::string Doc(std::initializer_list<std::string> inItems)
     return text + "\n]}]}]}";
 }
 
+// inDepth sequences, each but the last playing the next, one per line.
+std::string DeepNesting(int inDepth)
+{
+    std::string text = "{\"sequences\": [";
+    for (int i = 0; i < inDepth; ++i)
+        text += (i == 0 ? "" : ",\n") + std::string("{\"name\": \"S") + std::to_string(i) +
+                "\", \"tracks\": [{\"items\": [{\"end\": 1, \"media\": {\"sequence\": \"S" +
+                std::to_string(std::min(i + 1, inDepth - 1)) + "\"}}]}]}";
+    return text + "]}";
+}
+
 const std::string kBars = R"("media": {"pattern": "pattern:bars"})";
 
 struct ErrorCase
@@ -281,7 +292,7 @@ INSTANTIATE_TEST_SUITE_P(
         ErrorCase{"AbsurdSize", "{\"sequences\": [{\"name\": \"A\",\n \"size\": [0, 1080]}]}",
                   "t.json:2: /sequences/0/size: frame size 0x1080 is outside 1..32768"},
         ErrorCase{"AbsurdRate", "{\"sequences\": [{\"name\": \"A\",\n \"rate\": 5000}]}",
-                  "t.json:2: /sequences/0/rate: frame rate 5000 is outside (0, 1000] frames "
+                  "t.json:2: /sequences/0/rate: frame rate 5000 is outside 0.01..1000 frames "
                   "per second"},
         ErrorCase{"MalformedRate", "{\"sequences\": [{\"name\": \"A\",\n \"rate\": \"25/0\"}]}",
                   "t.json:2: /sequences/0/rate: expected a frame rate (\"25\" or "
@@ -314,6 +325,16 @@ INSTANTIATE_TEST_SUITE_P(
                            "\"red\""},
         ErrorCase{"BadTime", Doc({"{\"end\": \"3s\", " + kBars + "}"}),
                   kItem0 + "/end: expected a time (seconds, \"<n>f\" or \"<n>t\"), got \"3s\""},
+        ErrorCase{"TinyRate", "{\"sequences\": [{\"name\": \"A\",\n \"rate\": \"1/1000\"}]}",
+                  "t.json:2: /sequences/0/rate: frame rate 0.001 is outside 0.01..1000 frames "
+                  "per second"},
+        ErrorCase{"FarTime", Doc({"{\"end\": \"9223372036854775807t\", " + kBars + "}"}),
+                  kItem0 + "/end: the time is more than a billion seconds from 0"},
+        ErrorCase{"NegativeStart", Doc({"{\"start\": -1, \"end\": 1, " + kBars + "}"}),
+                  kItem0 + "/start: the item starts before 0 (-1.000 s)"},
+        ErrorCase{"NestedTooDeep", DeepNesting(70),
+                  "t.json:64: /sequences/63/tracks/0/items/0/media/sequence: sequences nest "
+                  "more than 64 deep"},
         ErrorCase{"Version", "{\"version\": 2,\n \"sequences\": []}",
                   "t.json:1: /version: version 2 is not supported (this reader knows version 1)"},
         ErrorCase{"NoSequences", "{\"sequences\": []}",
