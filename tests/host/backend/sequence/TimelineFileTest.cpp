@@ -217,10 +217,21 @@ std::string DeepNesting(int inDepth)
 {
     std::string text = "{\"sequences\": [";
     for (int i = 0; i < inDepth; ++i)
-        text += (i == 0 ? "" : ",\n") + std::string("{\"name\": \"S") + std::to_string(i) +
-                "\", \"tracks\": [{\"items\": [{\"end\": 1, \"media\": {\"sequence\": \"S" +
-                std::to_string(std::min(i + 1, inDepth - 1)) + "\"}}]}]}";
+    {
+        const std::string media = i + 1 < inDepth
+                                      ? "{\"sequence\": \"S" + std::to_string(i + 1) + "\"}"
+                                      : "{\"pattern\": \"pattern:bars\"}";
+        text += (i == 0 ? "{\"name\": \"S" : ",\n{\"name\": \"S") + std::to_string(i) +
+                "\", \"tracks\": [{\"items\": [{\"end\": 1, \"media\": " + media + "}]}]}";
+    }
     return text + "]}";
+}
+
+TEST(TimelineNesting, SixtyFourLevelsLoad)
+{
+    const BE::TimelineLoadResult loaded = BE::ParseTimeline(DeepNesting(64), "t.json", "/");
+    ASSERT_TRUE(loaded.Succeeded()) << loaded.mError;
+    EXPECT_EQ(loaded.mMain->GetName(), "S0");
 }
 
 const std::string kBars = R"("media": {"pattern": "pattern:bars"})";
