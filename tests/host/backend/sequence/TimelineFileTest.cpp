@@ -190,6 +190,23 @@ TEST_F(TimelineFileTest, ShorthandsPlaceItemsAfterGapsAndShareMedia)
     EXPECT_TRUE(other->IsOffline() && other->IsDraft());
 }
 
+TEST_F(TimelineFileTest, TheExamplesLoadAndSurviveARoundTrip)
+{
+    int examples = 0;
+    for (const auto& entry : std::filesystem::directory_iterator(VR_TIMELINE_EXAMPLES))
+    {
+        SCOPED_TRACE(entry.path().string());
+        const BE::TimelineLoadResult loaded = BE::LoadTimelineFile(entry.path().string());
+        ASSERT_TRUE(loaded.Succeeded()) << loaded.mError;
+        const BE::TimelineLoadResult again = BE::ParseTimeline(
+            BE::WriteTimeline(loaded.mMain), "again.json", entry.path().parent_path().string());
+        ASSERT_TRUE(again.Succeeded()) << again.mError;
+        EXPECT_TRUE(BE::SameSequence(*again.mMain, *loaded.mMain));
+        ++examples;
+    }
+    EXPECT_EQ(examples, 3);
+}
+
 TEST_F(TimelineFileTest, LoadsAFileWithPathsRelativeToItsFolder)
 {
     const std::string path = mFolder.File("show.json");
