@@ -2,6 +2,7 @@
 
 #include "BE/TimelineFile.h"
 #include "CutlistInfo.h"
+#include "VrenderTestSupport.h"
 
 #include <gtest/gtest.h>
 
@@ -42,6 +43,32 @@ TEST(SequenceInfoTest, PrintsTracksItemsMediaAndNestedSequences)
                   "  Media:\n"
                   "    1 pattern:bars?size=64x36 [still], duration endless\n"
                   "      video stream 0: 64x36, 25 fps, pixel aspect 1:1, progressive\n");
+}
+
+using SequenceInfoRunTest = vrendertest::ScratchDirectoryTest;
+
+TEST_F(SequenceInfoRunTest, WarnsOncePerMissingFileAndRefusesABadTimeline)
+{
+    const std::string good = (mDirectory / "good.json").string();
+    std::ofstream(good) << R"({"sequences": [{"name": "S", "tracks": [{"items": [
+        {"end": 1, "media": {"file": "gone.y4m"}}, {"duration": 1, "media": {"file": "gone.y4m"}},
+        {"duration": 1, "media": {"still": "lost.png"}}]}]}]})";
+    const vrendertest::RunResult run = Run({"info", good});
+    EXPECT_EQ(run.mExitCode, 0);
+    EXPECT_EQ(run.mErr, "vrender: warning: " + (mDirectory / "gone.y4m").string() +
+                            ": media file not found; it plays as offline\n"
+                            "vrender: warning: " +
+                            (mDirectory / "lost.png").string() +
+                            ": media file not found; it plays as offline\n");
+    EXPECT_EQ(run.mOut.rfind("Sequence \"S\": ", 0), 0u) << run.mOut;
+
+    const std::string bad = (mDirectory / "bad.json").string();
+    std::ofstream(bad) << "{\"sequences\": [{\"name\": \"S\",\n \"tracks\": 3}]}";
+    const vrendertest::RunResult refused = Run({"info", bad});
+    EXPECT_EQ(refused.mExitCode, 2);
+    EXPECT_EQ(refused.mErr,
+              "vrender: " + bad + ":2: /sequences/0/tracks: expected an array, got a number\n");
+    EXPECT_EQ(refused.mOut, "");
 }
 
 } // namespace
