@@ -100,7 +100,8 @@ struct ClipSettings
     mvxmediatypes::TickTime mOutPoint = mvxmediatypes::kTime_Max;
     double mSpeed = 1.0;
     bool mReverse = false;
-    // Media time in seconds as a function of clip time; in use when keyed.
+    // Media time in seconds as a function of clip time; in use when keyed
+    // (its default value plays no part).
     KeyframeCurve mTimeRemapping;
     FrameHold mFrameHold;
     FieldProcessing mFieldProcessing = FieldProcessing::kNone;

@@ -201,8 +201,13 @@ ClipSettings ReadClip(const Node& inNode, mt::FrameRate inRate)
     }
     clip.mReverse = inNode.Bool("reverse", false);
     if (inNode.Has("timeRemap"))
-        clip.mTimeRemapping =
-            ReadCurve(inNode.Child("timeRemap"), KeyframeCurve::Scalar(0.0), inRate, 0.0, 1.0e9);
+    {
+        // A constant would read as "not remapped": only keys say what to play.
+        const Node remap = inNode.Child("timeRemap");
+        if (!remap.Value().is_array())
+            WrongType(remap.Value(), remap.Path(), "a list of keys");
+        clip.mTimeRemapping = ReadCurve(remap, KeyframeCurve::Scalar(0.0), inRate, 0.0, 1.0e9);
+    }
     if (inNode.Has("frameHold"))
     {
         const Node hold = inNode.Child("frameHold");

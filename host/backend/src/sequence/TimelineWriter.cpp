@@ -123,7 +123,9 @@ Json ClipJson(const ClipSettings& inClip, mt::FrameRate inRate)
         clip["out"] = TimeText(inClip.mOutPoint, inRate);
     PutIf(clip, "speed", inClip.mSpeed, fresh.mSpeed);
     PutIf(clip, "reverse", inClip.mReverse, fresh.mReverse);
-    PutCurve(clip, "timeRemap", inClip.mTimeRemapping, fresh.mTimeRemapping, inRate);
+    // Only keys remap; a curve without keys is not in use and not written.
+    if (inClip.IsTimeRemapped())
+        PutCurve(clip, "timeRemap", inClip.mTimeRemapping, fresh.mTimeRemapping, inRate);
     if (inClip.mFrameHold.IsSet())
     {
         Json hold;
@@ -209,14 +211,13 @@ Json ItemJson(const ITrackItem& inItem, const SequenceSettings& inSequence)
     return item;
 }
 
-Json SequenceJson(const ISequence& inSequence)
+Json SequenceJson(const SequenceRef& inSequence)
 {
     const SequenceSettings& settings =
-        QRT::InterfaceRef<ISequenceSettings>(SequenceRef(const_cast<ISequence*>(&inSequence)))
-            ->GetSequenceSettings();
+        QRT::InterfaceRef<ISequenceSettings>(inSequence)->GetSequenceSettings();
     const SequenceSettings fresh;
     Json sequence;
-    sequence["name"] = inSequence.GetName();
+    sequence["name"] = inSequence->GetName();
     if (settings.mFrameRate != fresh.mFrameRate)
         sequence["rate"] = RateText(settings.mFrameRate);
     if (settings.mWidth != fresh.mWidth || settings.mHeight != fresh.mHeight)
@@ -227,7 +228,7 @@ Json SequenceJson(const ISequence& inSequence)
     if (settings.mFieldType != fresh.mFieldType)
         sequence["field"] = NameOf(kFieldTypes, settings.mFieldType);
     Json tracks = Json::array();
-    const QRT::InterfaceRef<ITrackGroup> group = inSequence.GetTrackGroup(0);
+    const QRT::InterfaceRef<ITrackGroup> group = inSequence->GetTrackGroup(0);
     for (std::size_t t = 0; t < group->GetTrackCount(); ++t)
     {
         const QRT::InterfaceRef<IVideoTrack> track = group->GetTrack(t);
@@ -276,7 +277,7 @@ std::string WriteTimeline(const SequenceRef& inMain)
     root["main"] = inMain->GetName();
     Json sequences = Json::array();
     for (const SequenceRef& sequence : order)
-        sequences.push_back(SequenceJson(*sequence));
+        sequences.push_back(SequenceJson(sequence));
     root["sequences"] = std::move(sequences);
     return root.dump(2) + "\n";
 }

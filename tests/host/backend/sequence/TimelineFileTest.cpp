@@ -346,6 +346,9 @@ INSTANTIATE_TEST_SUITE_P(
                  ", \"opacity\": [{\"time\": 1, \"value\": 5}, {\"time\": 1, \"value\": 6}]}"}),
             kItem0 + "/opacity/1/time: keyframe times must increase (1.000 s is not after "
                      "1.000 s)"},
+        ErrorCase{"ConstantRemap",
+                  Doc({"{\"end\": 1, " + kBars + ", \"clip\": {\"timeRemap\": 3}}"}),
+                  kItem0 + "/clip/timeRemap: expected a list of keys, got a number"},
         ErrorCase{"OpacityOutOfRange", Doc({"{\"end\": 1, " + kBars + ", \"opacity\": 140}"}),
                   kItem0 + "/opacity: the value is outside 0..100"},
         ErrorCase{"BadColor", Doc({"{\"end\": 1, \"media\": {\"color\": \"red\"}}"}),
