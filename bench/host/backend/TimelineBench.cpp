@@ -53,7 +53,7 @@ std::string GenerateTimeline(int inItems)
                 R"(, "clip": {"speed": 1.5, "in": 3})",
                 R"(, "opacity": [{"time": 0, "value": 0}, {"time": 1, "value": 100, "interp": "bezier", "inSlope": 10}])",
                 R"(, "motion": {"scale": 50, "position": [{"time": 0, "value": [0, 0]}, {"time": 4, "value": [200, 100]}]})",
-                R"(, "effects": [{"match": "AE.ADBE Tint", "params": {"amount": "40"}}])",
+                R"(, "effects": [{"match": "vr.Tint", "params": {"amount": "40"}}])",
             };
             std::snprintf(item, sizeof(item), "%s\n      {\"duration\": %.3f, \"media\": %s%s}%s",
                           i == 0 ? "" : ",", slot * 0.8, media[kind], extra[(i / 4) % 4],

@@ -79,10 +79,10 @@ BE::SequenceRef FullModel(const std::string& inFolder)
     clip.mReverseFieldDominance = clip.mFrameBlend = clip.mScaleToFrame = true;
     clip.mAlpha = {mt::kAlphaChannel_Premultiplied, true, true, 0xFF102030u};
     clip.mPulldown = {true, mt::kPulldownCadence_23_BC};
-    full.mEffects = {{"AE.Blur", {{"radius", "4"}, {"axis", "x"}}, MF::BinaryData::FromText("fx")},
-                     {"AE.Tint", {}, {}}};
+    full.mEffects = {{"vr.Blur", {{"radius", "4"}, {"axis", "x"}}, MF::BinaryData::FromText("fx")},
+                     {"vr.Tint", {}, {}}};
     full.mTransitions = {
-        {"AE.Dissolve", TickTime::TicksToTime(12345), Seconds(1), true, {{"border", "2"}}}};
+        {"vr.CrossDissolve", TickTime::TicksToTime(12345), Seconds(1), true, {{"border", "2"}}}};
     BE::TrackItemSettings adjustment = Item(6, 7);
     adjustment.mFlags = BE::kTrackItemFlag_AdjustmentLayer;
 
