@@ -223,3 +223,21 @@ TEST_F(SequenceModelTest, UnreadableMaterialIsRefusedWithItsReason)
 }
 
 } // namespace
+
+namespace
+{
+
+TEST(ClipSettingsTest, TimeRemappingTextNamesEveryKeyAndIsEmptyWhenNotInUse)
+{
+    BE::ClipSettings clip;
+    EXPECT_FALSE(clip.IsTimeRemapped());
+    EXPECT_EQ(clip.GetTimeRemappingText(), "");
+    clip.mTimeRemapping = BE::KeyframeCurve::Scalar(
+        0, {{Seconds(0), {1.5, 0}, BE::KeyframeInterpolation::kHold, {}, {}},
+            {Seconds(2), {0.25, 0}, BE::KeyframeInterpolation::kBezier, {2, 0}, {-1, 0}}});
+    EXPECT_TRUE(clip.IsTimeRemapped());
+    EXPECT_EQ(clip.GetTimeRemappingText(),
+              "0=1.5:hold;" + std::to_string(2 * mt::kTicksPerSecond) + "=0.25:bezier(2,-1)");
+}
+
+} // namespace
