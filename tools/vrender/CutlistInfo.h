@@ -8,7 +8,13 @@
 // distinct node tree once, every node with its type, render flags,
 // properties (colours as 0xAARRGGBB, other values quoted), inputs and operators, children indented
 // under their parent. Sealed cutlists are immutable, so any thread may call it.
+//
+// DescribeSequence prints a sequence of the back end (`vrender info
+// TIMELINE`): its settings, each track with its items and their times, then
+// the media the items play with their streams, then each nested sequence the
+// same way. Sequences are immutable, so any thread may call it too.
 
+#include "BE/SequenceInterfaces.h"
 #include "MF/RenderableCutlist.h"
 #include "QRT/InterfaceRef.h"
 #include "mvxmediatypes/TickTime.h"
@@ -25,6 +31,8 @@ namespace vrender
 QRT::InterfaceRef<MF::IRenderableCutlist> CreateExampleCutlist();
 
 std::string DescribeCutlist(const MF::IRenderableCutlist& inCutlist);
+
+std::string DescribeSequence(const QRT::InterfaceRef<BE::ISequence>& inSequence);
 
 // "1.500 s"; "start" and "end" for kTime_Min and kTime_Max.
 std::string FormatTime(mvxmediatypes::TickTime inTime);

@@ -627,8 +627,10 @@ ParsedCommandLine ParseCommandLine(std::span<const std::string_view> inArguments
             }
         }
         if (!rest.empty())
-            result.mError = "info: unexpected argument " + Quoted(rest[0]) +
-                            " (info prints the built-in example cutlist)";
+            result.mOptions.mMedia = std::string(rest[0]);
+        if (rest.size() > 1)
+            result.mError = "info: unexpected argument " + Quoted(rest[1]) +
+                            " (info prints the built-in example cutlist, or one timeline file)";
     }
     else if (command == "demo")
     {
@@ -675,6 +677,8 @@ Usage:
                                 render frames of one media source
   vrender info                  print the built-in example cutlist (colours as
                                 0xAARRGGBB)
+  vrender info TIMELINE         print a timeline file (.json): its sequences,
+                                tracks, items and media
   vrender demo [options]        the demo, with options as for source
   vrender --help                this text
 

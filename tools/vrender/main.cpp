@@ -15,6 +15,7 @@
 // second signal, the watcher makes the output complete (PendingOutput) and
 // ends the process.
 
+#include "BE/TimelineFile.h"
 #include "CutlistInfo.h"
 #include "ML/RenderExecutors.h"
 #include "ML/VideoRenderer.h"
@@ -129,8 +130,27 @@ public:
     RendererSession& operator=(const RendererSession&) = delete;
 };
 
-int RunInfo()
+// Prints the timeline file inPath; each missing media file is warned of once.
+int RunTimelineInfo(const std::string& inPath)
 {
+    const BE::TimelineLoadResult loaded = BE::LoadTimelineFile(inPath);
+    if (!loaded.Succeeded())
+    {
+        std::fprintf(stderr, "vrender: %s\n", loaded.mError.c_str());
+        return 2;
+    }
+    for (const std::string& missing : loaded.mMissingFiles)
+        std::fprintf(stderr, "vrender: warning: %s: media file not found; it plays as offline\n",
+                     missing.c_str());
+    const std::string text = vrender::DescribeSequence(loaded.mMain);
+    std::fwrite(text.data(), 1, text.size(), stdout);
+    return 0;
+}
+
+int RunInfo(const std::string& inTimeline)
+{
+    if (!inTimeline.empty())
+        return RunTimelineInfo(inTimeline);
     RendererSession session;
     const auto cutlist = vrender::CreateExampleCutlist();
     const std::string text = vrender::DescribeCutlist(*cutlist);
@@ -211,7 +231,7 @@ int main(int inArgc, char** inArgv)
             return 0;
         }
         case vrender::Command::kInfo:
-            return RunInfo();
+            return RunInfo(parsed.mOptions.mMedia);
         case vrender::Command::kDemo:
             return RunRender(parsed.mOptions, true);
         case vrender::Command::kSource:

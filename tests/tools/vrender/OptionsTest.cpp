@@ -133,7 +133,7 @@ TEST_F(OptionsTest, RefusalsNameTheArgumentAndExitWithTwo)
     const std::pair<const char*, const char*> cases[] = {
         {"render", "unknown command 'render' (commands: source, info, demo, help)"},
         {"--size 10x10", "a command comes first: source, info, demo or help (got option '--size')"},
-        {"info extra", "info: unexpected argument 'extra' (info prints the built-in"},
+        {"info a.json extra", "info: unexpected argument 'extra' (info prints the built-in"},
         {"demo media.png", "unexpected argument 'media.png'"},
         {"source", "source: no media given (an image file, a .y4m file or a pattern:"},
         {"source m other", "unexpected argument 'other'"},

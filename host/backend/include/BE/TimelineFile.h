@@ -1,0 +1,58 @@
+#pragma once
+
+// Timeline files: the JSON form of the back end's sequences
+// (docs/timeline-format.md describes the format, docs/timeline-format.schema.json
+// gives its JSON Schema).
+//
+// Loading builds the file's sequences (BE/Sequence.h), nested sequences
+// first, media shared between the items that name the same material. A
+// file that is malformed or describes something impossible is refused with
+// one message naming the file, the line (when known), the JSON place and
+// the problem:
+//
+//     show.json:12: /sequences/0/tracks/1/items/3/clip/speeed: unknown key
+//     "speeed" (did you mean "speed"?)
+//
+// A media file that does not exist is not an error: the item keeps its
+// place and plays offline media, and the file is listed in mMissingFiles.
+//
+// Every function may be called from any thread.
+
+#include "BE/Sequence.h"
+
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace BE
+{
+
+struct TimelineLoadResult
+{
+    // Empty on success.
+    std::string mError;
+    // The sequence named by "main", else the first one.
+    SequenceRef mMain;
+    // Every sequence of the file, in file order.
+    std::vector<SequenceRef> mSequences;
+    // Media files that do not exist, each once, as resolved, in file order.
+    std::vector<std::string> mMissingFiles;
+
+    bool Succeeded() const { return mError.empty(); }
+};
+
+// Reads and loads inPath; relative media paths are taken from inPath's folder.
+TimelineLoadResult LoadTimelineFile(const std::string& inPath);
+
+// Loads inText; inFileName names the text in messages, inBaseFolder is the
+// folder relative media paths are taken from.
+TimelineLoadResult ParseTimeline(std::string_view inText, const std::string& inFileName,
+                                 const std::string& inBaseFolder);
+
+// The timeline text of inMain and of every sequence it nests (those first),
+// two-space indented, keys that hold their default value left out. Loading
+// it again gives a sequence for which SameSequence holds. Input contract:
+// distinct sequences reachable from inMain have distinct names.
+std::string WriteTimeline(const SequenceRef& inMain);
+
+} // namespace BE
