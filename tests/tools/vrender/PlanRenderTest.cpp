@@ -137,6 +137,41 @@ TEST_F(PlanRenderTest, ReverseEndlessMediaEndsAtTimeZero)
                                       mt::kFrameRate_Video25));
 }
 
+// Y4M output of the source's size without filters asks for the stream's own
+// sampling, so that a source with it hands its samples over; everything else
+// renders in BGRA unless --format says otherwise.
+TEST_F(PlanRenderTest, Y4MWithoutFiltersAsksForTheStreamsSampling)
+{
+    using K = vrender::OutputKind;
+    using C = vrender::Y4MChroma;
+    const auto y4m = [](K inKind, C inChroma)
+    {
+        vrender::RenderOptions options;
+        options.mOutputKind = inKind;
+        options.mChroma = inChroma;
+        return options;
+    };
+    std::vector<std::pair<vrender::RenderOptions, mt::PixelFormat>> cases = {
+        {y4m(K::kY4MStream, C::k420), mt::kPixelFormat_YUV_420_8u_Planar},
+        {y4m(K::kY4MFile, C::k420), mt::kPixelFormat_YUV_420_8u_Planar},
+        {y4m(K::kY4MStream, C::k444), mt::kPixelFormat_VUYA_4444_8u},
+        {y4m(K::kPngSequence, C::k420), mt::kPixelFormat_BGRA_4444_8u},
+    };
+    cases.push_back(cases[0]);
+    cases.back().first.mFilters.mDeinterlace = true;
+    cases.back().second = mt::kPixelFormat_BGRA_4444_8u;
+    cases.push_back(cases[0]);
+    std::tie(cases.back().first.mWidth, cases.back().first.mHeight) = std::pair(320u, 180u);
+    cases.back().second = mt::kPixelFormat_BGRA_4444_8u;
+    cases.push_back(cases[0]);
+    cases.back().first.mPixelFormat = cases.back().second = mt::kPixelFormat_BGRA_4444_16u;
+    for (std::size_t i = 0; i < cases.size(); ++i)
+    {
+        SCOPED_TRACE(i);
+        EXPECT_EQ(Plan(cases[i].first, Clip()).mPixelFormat, cases[i].second);
+    }
+}
+
 // The frames in flight are as many as fit the memory budget (half the
 // physical memory unless --memory says otherwise); a frame that does not
 // fit alone is refused.
