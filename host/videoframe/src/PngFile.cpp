@@ -132,7 +132,7 @@ bool RunWrite(PngWriteJob& ioJob)
     // Rendered frames are written as they come: no row filters (choosing one
     // per row costs more than it saves on rendered pictures) and zlib's
     // default level.
-    png_set_filter(ioJob.mPng, PNG_FILTER_TYPE_BASE, PNG_NO_FILTERS);
+    png_set_filter(ioJob.mPng, PNG_FILTER_TYPE_BASE, PNG_FILTER_NONE);
     png_set_compression_level(ioJob.mPng, PNG_Z_DEFAULT_COMPRESSION);
     png_set_IHDR(ioJob.mPng, ioJob.mInfo, ioJob.mWidth, ioJob.mHeight, ioJob.mBitDepth,
                  ioJob.mColorType, PNG_INTERLACE_NONE, PNG_COMPRESSION_TYPE_BASE,
