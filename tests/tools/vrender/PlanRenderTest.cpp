@@ -143,32 +143,29 @@ TEST_F(PlanRenderTest, ReverseEndlessMediaEndsAtTimeZero)
 TEST_F(PlanRenderTest, Y4MWithoutFiltersAsksForTheStreamsSampling)
 {
     using K = vrender::OutputKind;
-    using C = vrender::Y4MChroma;
-    const auto y4m = [](K inKind, C inChroma)
+    const auto c420 = vrender::Y4MChroma::k420, c444 = vrender::Y4MChroma::k444;
+    // (output, chroma, deinterlace, output width, --format, expected)
+    const std::tuple<K, vrender::Y4MChroma, bool, std::uint32_t, std::optional<mt::PixelFormat>,
+                     mt::PixelFormat>
+        cases[] = {
+            {K::kY4MStream, c420, false, 0, {}, mt::kPixelFormat_YUV_420_8u_Planar},
+            {K::kY4MFile, c420, false, 640, {}, mt::kPixelFormat_YUV_420_8u_Planar},
+            {K::kY4MStream, c444, false, 0, {}, mt::kPixelFormat_VUYA_4444_8u},
+            {K::kPngSequence, c420, false, 0, {}, mt::kPixelFormat_BGRA_4444_8u},
+            {K::kY4MStream, c420, true, 0, {}, mt::kPixelFormat_BGRA_4444_8u},
+            {K::kY4MStream, c420, false, 320, {}, mt::kPixelFormat_BGRA_4444_8u},
+            {K::kY4MStream, c420, false, 0, mt::kPixelFormat_BGRA_4444_16u,
+             mt::kPixelFormat_BGRA_4444_16u},
+        };
+    for (std::size_t i = 0; i < std::size(cases); ++i)
     {
+        const auto& [kind, chroma, deinterlace, width, format, expected] = cases[i];
         vrender::RenderOptions options;
-        options.mOutputKind = inKind;
-        options.mChroma = inChroma;
-        return options;
-    };
-    std::vector<std::pair<vrender::RenderOptions, mt::PixelFormat>> cases = {
-        {y4m(K::kY4MStream, C::k420), mt::kPixelFormat_YUV_420_8u_Planar},
-        {y4m(K::kY4MFile, C::k420), mt::kPixelFormat_YUV_420_8u_Planar},
-        {y4m(K::kY4MStream, C::k444), mt::kPixelFormat_VUYA_4444_8u},
-        {y4m(K::kPngSequence, C::k420), mt::kPixelFormat_BGRA_4444_8u},
-    };
-    cases.push_back(cases[0]);
-    cases.back().first.mFilters.mDeinterlace = true;
-    cases.back().second = mt::kPixelFormat_BGRA_4444_8u;
-    cases.push_back(cases[0]);
-    std::tie(cases.back().first.mWidth, cases.back().first.mHeight) = std::pair(320u, 180u);
-    cases.back().second = mt::kPixelFormat_BGRA_4444_8u;
-    cases.push_back(cases[0]);
-    cases.back().first.mPixelFormat = cases.back().second = mt::kPixelFormat_BGRA_4444_16u;
-    for (std::size_t i = 0; i < cases.size(); ++i)
-    {
-        SCOPED_TRACE(i);
-        EXPECT_EQ(Plan(cases[i].first, Clip()).mPixelFormat, cases[i].second);
+        std::tie(options.mOutputKind, options.mChroma, options.mPixelFormat) =
+            std::tuple(kind, chroma, format);
+        options.mFilters.mDeinterlace = deinterlace;
+        std::tie(options.mWidth, options.mHeight) = std::pair(width, width * 9 / 16);
+        EXPECT_EQ(Plan(options, Clip()).mPixelFormat, expected) << "case " << i;
     }
 }
 
