@@ -101,7 +101,7 @@ run_job() {
       -vf "setpts=2*PTS,framerate=fps=25" -f yuv4mpegpipe -y /dev/null) ;;
   png)
     rm -rf "$png_dir" && mkdir -p "$png_dir"
-    ours=("$VRENDER" source "$CLIP" -q "${VR_THREADS[@]}" --count 30 -o "$png_dir/ours_%05d.png")
+    ours=("$VRENDER" source "$CLIP" -q "${VR_THREADS[@]}" --count 30 -y -o "$png_dir/ours_%05d.png")
     theirs=(ffmpeg -hide_banner -loglevel error "${FF_THREADS[@]}" -i "$CLIP" -frames:v 30 -y "$png_dir/theirs_%05d.png") ;;
   *)
     echo "sources: unknown job $name" >&2

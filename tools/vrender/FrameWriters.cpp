@@ -1,5 +1,6 @@
 #include "FrameWriters.h"
 
+#include "IR/YUVPlanes.h"
 #include "Options.h"
 #include "PendingOutput.h"
 #include "VF/PngFile.h"
@@ -8,11 +9,14 @@
 #include "mvxmediatypes/TickTime.h"
 
 #include <cerrno>
+#include <climits>
 #include <cmath>
 #include <cstring>
 #include <filesystem>
 #include <map>
+#include <mutex>
 #include <numeric>
+#include <sys/uio.h>
 #include <system_error>
 
 namespace vrender
@@ -76,6 +80,9 @@ public:
                    "range are then removed)";
         return false;
     }
+
+    // Frames are converted to the render's format first, which sets the depth.
+    bool Accepts(mt::PixelFormat /*inFormat*/) const override { return false; }
 
     EncodedFrame Encode(std::int64_t inIndex, const FrameRef& inFrame) override
     {
@@ -245,6 +252,11 @@ public:
         return Write(header.data(), header.size(), outError);
     }
 
+    bool Accepts(mt::PixelFormat inFormat) const override
+    {
+        return inFormat.IsRaster() && (!inFormat.IsPlanar() || mChroma == Y4MChroma::k420);
+    }
+
     EncodedFrame Encode(std::int64_t inIndex, const FrameRef& inFrame) override
     {
         EncodedFrame encoded;
@@ -252,6 +264,7 @@ public:
         const QRT::ParamRect bounds = inFrame->GetBounds();
         const std::uint32_t width = static_cast<std::uint32_t>(bounds.Width());
         const std::uint32_t height = static_cast<std::uint32_t>(bounds.Height());
+        const mt::PixelFormat format = inFrame->GetPixelFormat();
         if (width != mInfo.mWidth || height != mInfo.mHeight)
         {
             encoded.mError = "frame " + std::to_string(inIndex) + " is " + std::to_string(width) +
@@ -259,23 +272,26 @@ public:
                              std::to_string(mInfo.mWidth) + "x" + std::to_string(mInfo.mHeight);
             return encoded;
         }
-        if (inFrame->GetPixelFormat() == mt::kPixelFormat_BGRA_4444_8u)
+        if (!Accepts(format))
         {
-            // The common case gets an integer kernel; the general conversion
-            // below works in floating point and costs several times as much.
-            std::vector<std::uint8_t> vuya(std::size_t{width} * height * 4);
-            ConvertBGRAToVUYA(*inFrame, height < 720, vuya.data());
-            PackPlanes(vuya.data(), std::size_t{width} * 4, encoded.mBytes);
+            encoded.mError = "frame " + std::to_string(inIndex) + " is " +
+                             std::string(mt::GetPixelFormatName(format)) +
+                             ", which the stream's chroma sampling cannot take as it is";
             return encoded;
         }
-        FrameRef yuv = inFrame;
-        if (inFrame->GetPixelFormat() != mt::kPixelFormat_VUYA_4444_8u)
+        if (format == mt::kPixelFormat_YUV_420_8u_Planar)
         {
-            yuv = VF::CreateVideoFrame(mt::kPixelFormat_VUYA_4444_8u, width, height,
-                                       inFrame->GetPixelAspectRatio(), false, false);
+            encoded.mFrame = inFrame;
+            return encoded;
+        }
+        FrameRef packed = inFrame;
+        if (format != mt::kPixelFormat_BGRA_4444_8u && format != mt::kPixelFormat_VUYA_4444_8u)
+        {
+            packed = VF::CreateVideoFrame(mt::kPixelFormat_VUYA_4444_8u, width, height,
+                                          inFrame->GetPixelAspectRatio(), false, false);
             const QRT::Result result =
-                yuv ? VF::VideoFrameManipulators::CopyFrame(inFrame, yuv, mInfo.mQuality)
-                    : VF::kResult_OutOfFrameMemory;
+                packed ? VF::VideoFrameManipulators::CopyFrame(inFrame, packed, mInfo.mQuality)
+                       : VF::kResult_OutOfFrameMemory;
             if (QRT::Failed(result))
             {
                 encoded.mError = "frame " + std::to_string(inIndex) +
@@ -284,17 +300,30 @@ public:
                 return encoded;
             }
         }
-        PackPlanes(static_cast<const std::uint8_t*>(yuv->GetBaseAddress()),
-                   static_cast<std::size_t>(yuv->GetRowBytes()), encoded.mBytes);
+        PackPlanes(*packed, encoded.mBytes);
         return encoded;
     }
 
     bool Commit(EncodedFrame& ioFrame, std::string& outError) override
     {
-        return Write(ioFrame.mBytes.data(), ioFrame.mBytes.size(), outError);
+        const bool written = ioFrame.mFrame
+                                 ? WriteFrame(*ioFrame.mFrame, outError)
+                                 : Write(ioFrame.mBytes.data(), ioFrame.mBytes.size(), outError);
+        Discard(ioFrame);
+        return written;
     }
 
-    void Discard(EncodedFrame& ioFrame) override { ioFrame.mBytes.clear(); }
+    // Keeps the buffer for a later frame: its pages are touched already.
+    void Discard(EncodedFrame& ioFrame) override
+    {
+        ioFrame.mFrame.Reset();
+        if (ioFrame.mBytes.empty())
+            return;
+        std::lock_guard lock(mSpareMutex);
+        if (mSpare.size() < kMaxSpareBuffers)
+            mSpare.push_back(std::move(ioFrame.mBytes));
+        ioFrame.mBytes = {};
+    }
 
     bool Finish(std::string& outError) override
     {
@@ -325,6 +354,11 @@ public:
     }
 
 private:
+    static constexpr char kFrameTag[] = "FRAME\n";
+    static constexpr std::size_t kTagSize = sizeof(kFrameTag) - 1;
+    // Buffers kept for reuse; more frames than this are rarely in flight.
+    static constexpr std::size_t kMaxSpareBuffers = 8;
+
     bool Write(const void* inData, std::size_t inSize, std::string& outError)
     {
         if (std::fwrite(inData, 1, inSize, mFile) == inSize)
@@ -333,104 +367,90 @@ private:
         return false;
     }
 
-    // Video-range Y'CbCr of 8-bit BGRA in VUYA byte order, with the matrix
-    // the image renderer uses for a frame of this height, in 16-bit fixed point.
-    void ConvertBGRAToVUYA(const MF::IVideoFrame& inFrame, bool inMatrix601,
-                           std::uint8_t* outPixels) const
+    // "FRAME\n" and the planes of a planar 4:2:0 frame in one gathered write
+    // (rows one by one when they are padded). The stream's lock is held
+    // throughout, so that a forced exit's flush waits for the whole frame.
+    bool WriteFrame(const MF::IVideoFrame& inFrame, std::string& outError)
     {
-        const double kr = inMatrix601 ? 0.299 : 0.2126;
-        const double kb = inMatrix601 ? 0.114 : 0.0722;
-        const double kg = 1.0 - kr - kb;
-        const double luma = 219.0 / 255.0;
-        const double chroma = 224.0 / 255.0;
-        auto fixed = [](double inValue)
-        { return static_cast<std::int32_t>(std::lround(inValue * 65536.0)); };
-        const std::int32_t yR = fixed(luma * kr), yG = fixed(luma * kg), yB = fixed(luma * kb);
-        const std::int32_t uR = fixed(-chroma * kr / (2 * (1 - kb))),
-                           uG = fixed(-chroma * kg / (2 * (1 - kb))), uB = fixed(chroma * 0.5);
-        const std::int32_t vR = fixed(chroma * 0.5), vG = fixed(-chroma * kg / (2 * (1 - kr))),
-                           vB = fixed(-chroma * kb / (2 * (1 - kr)));
-        constexpr std::int32_t kRound = 1 << 15;
-        const auto* base = static_cast<const std::uint8_t*>(inFrame.GetBaseAddress());
-        const std::size_t rowBytes = static_cast<std::size_t>(inFrame.GetRowBytes());
-        for (std::uint32_t y = 0; y < mInfo.mHeight; ++y)
+        std::vector<iovec> pieces;
+        pieces.push_back({const_cast<char*>(kFrameTag), kTagSize});
+        const std::size_t chromaWidth = (mInfo.mWidth + 1) / 2;
+        const std::size_t chromaHeight = (mInfo.mHeight + 1) / 2;
+        for (std::uint32_t plane = 0; plane < 3; ++plane)
         {
-            const std::uint8_t* row = base + y * rowBytes;
-            std::uint8_t* out = outPixels + std::size_t{y} * mInfo.mWidth * 4;
-            for (std::uint32_t x = 0; x < mInfo.mWidth; ++x)
+            const std::size_t width = plane == 0 ? mInfo.mWidth : chromaWidth;
+            const std::size_t rows = plane == 0 ? mInfo.mHeight : chromaHeight;
+            const auto rowBytes = static_cast<std::size_t>(inFrame.GetPlaneRowBytes(plane));
+            auto* base =
+                static_cast<std::uint8_t*>(const_cast<void*>(inFrame.GetPlaneBaseAddress(plane)));
+            if (rowBytes == width)
+                pieces.push_back({base, width * rows});
+            else
+                for (std::size_t y = 0; y < rows; ++y)
+                    pieces.push_back({base + y * rowBytes, width});
+        }
+        flockfile(mFile);
+        bool written = fflush_unlocked(mFile) == 0;
+        const int descriptor = fileno(mFile);
+        for (std::size_t next = 0; written && next < pieces.size();)
+        {
+            const int count =
+                static_cast<int>(std::min<std::size_t>(pieces.size() - next, IOV_MAX));
+            const ssize_t result = writev(descriptor, pieces.data() + next, count);
+            if (result < 0)
             {
-                const std::int32_t b = row[4 * x], g = row[4 * x + 1], r = row[4 * x + 2];
-                // Every result lies inside 16..240 by construction; no clamping.
-                out[4 * x] = static_cast<std::uint8_t>(
-                    ((128 << 16) + vR * r + vG * g + vB * b + kRound) >> 16);
-                out[4 * x + 1] = static_cast<std::uint8_t>(
-                    ((128 << 16) + uR * r + uG * g + uB * b + kRound) >> 16);
-                out[4 * x + 2] = static_cast<std::uint8_t>(
-                    ((16 << 16) + yR * r + yG * g + yB * b + kRound) >> 16);
-                out[4 * x + 3] = row[4 * x + 3];
+                written = errno == EINTR;
+                continue;
+            }
+            // Skips what went out; a short write resumes inside a piece.
+            auto left = static_cast<std::size_t>(result);
+            while (next < pieces.size() && left >= pieces[next].iov_len)
+                left -= pieces[next++].iov_len;
+            if (left > 0)
+            {
+                pieces[next].iov_base = static_cast<std::uint8_t*>(pieces[next].iov_base) + left;
+                pieces[next].iov_len -= left;
             }
         }
+        const int error = errno;
+        funlockfile(mFile);
+        if (!written)
+            outError = "writing " + Describe() + ": " + ErrnoText(error);
+        return written;
     }
 
-    // "FRAME\n", then the Y plane, then Cb, then Cr, from rows of VUYA bytes
-    // (V = Cr, U = Cb, Y, A).
-    void PackPlanes(const std::uint8_t* inBase, std::size_t inRowBytes,
-                    std::vector<std::uint8_t>& outBytes) const
+    // "FRAME\n", then the Y, Cb and Cr planes of a BGRA or VUYA frame, into
+    // outBytes (a spare buffer when there is one).
+    void PackPlanes(const MF::IVideoFrame& inFrame, std::vector<std::uint8_t>& outBytes)
     {
         const std::uint32_t width = mInfo.mWidth;
         const std::uint32_t height = mInfo.mHeight;
         const bool subsampled = mChroma == Y4MChroma::k420;
         const std::uint32_t chromaWidth = subsampled ? (width + 1) / 2 : width;
         const std::uint32_t chromaHeight = subsampled ? (height + 1) / 2 : height;
-        static constexpr char kFrameTag[] = "FRAME\n";
-        const std::size_t tagSize = sizeof(kFrameTag) - 1;
         const std::size_t lumaSize = std::size_t{width} * height;
         const std::size_t chromaSize = std::size_t{chromaWidth} * chromaHeight;
-        outBytes.resize(tagSize + lumaSize + 2 * chromaSize);
-        std::memcpy(outBytes.data(), kFrameTag, tagSize);
-        std::uint8_t* luma = outBytes.data() + tagSize;
+        {
+            std::lock_guard lock(mSpareMutex);
+            if (!mSpare.empty())
+            {
+                outBytes = std::move(mSpare.back());
+                mSpare.pop_back();
+            }
+        }
+        outBytes.resize(kTagSize + lumaSize + 2 * chromaSize);
+        std::memcpy(outBytes.data(), kFrameTag, kTagSize);
+        std::uint8_t* luma = outBytes.data() + kTagSize;
         std::uint8_t* cb = luma + lumaSize;
         std::uint8_t* cr = cb + chromaSize;
-
-        const std::uint8_t* base = inBase;
-        const std::size_t rowBytes = inRowBytes;
-        for (std::uint32_t y = 0; y < height; ++y)
-        {
-            const std::uint8_t* row = base + y * rowBytes;
-            std::uint8_t* lumaRow = luma + std::size_t{y} * width;
-            for (std::uint32_t x = 0; x < width; ++x)
-                lumaRow[x] = row[4 * x + 2];
-            if (!subsampled)
-            {
-                std::uint8_t* cbRow = cb + std::size_t{y} * width;
-                std::uint8_t* crRow = cr + std::size_t{y} * width;
-                for (std::uint32_t x = 0; x < width; ++x)
-                {
-                    cbRow[x] = row[4 * x + 1];
-                    crRow[x] = row[4 * x];
-                }
-            }
-        }
-        if (!subsampled)
-            return;
-        for (std::uint32_t cy = 0; cy < chromaHeight; ++cy)
-        {
-            const std::uint8_t* top = base + (2 * cy) * rowBytes;
-            // The last row of an odd height has no partner below.
-            const std::uint8_t* bottom = 2 * cy + 1 < height ? top + rowBytes : top;
-            std::uint8_t* cbRow = cb + std::size_t{cy} * chromaWidth;
-            std::uint8_t* crRow = cr + std::size_t{cy} * chromaWidth;
-            for (std::uint32_t cx = 0; cx < chromaWidth; ++cx)
-            {
-                const std::uint32_t left = 4 * (2 * cx);
-                const std::uint32_t right = 2 * cx + 1 < width ? left + 4 : left;
-                const unsigned sumCb =
-                    top[left + 1] + top[right + 1] + bottom[left + 1] + bottom[right + 1];
-                const unsigned sumCr = top[left] + top[right] + bottom[left] + bottom[right];
-                cbRow[cx] = static_cast<std::uint8_t>((sumCb + 2) / 4);
-                crRow[cx] = static_cast<std::uint8_t>((sumCr + 2) / 4);
-            }
-        }
+        const bool vuya = inFrame.GetPixelFormat() == mt::kPixelFormat_VUYA_4444_8u;
+        // The formats and sizes are checked above, so the packing cannot fail.
+        IR_PackYUVPlanes(inFrame.GetBaseAddress(), inFrame.GetRowBytes(),
+                         vuya ? kIR_PixelFormat_VUYA_4444_8u : kIR_PixelFormat_BGRA_8u,
+                         height < 720, luma, static_cast<std::int32_t>(width), cb,
+                         static_cast<std::int32_t>(chromaWidth), cr,
+                         static_cast<std::int32_t>(chromaWidth), subsampled,
+                         static_cast<std::int32_t>(width), static_cast<std::int32_t>(height));
     }
 
     std::FILE* mFile;
@@ -439,6 +459,9 @@ private:
     const bool mOverwrite;
     bool mOwnsFile = false;
     StreamInfo mInfo;
+    // Guards mSpare.
+    std::mutex mSpareMutex;
+    std::vector<std::vector<std::uint8_t>> mSpare;
 };
 
 } // namespace

@@ -18,6 +18,7 @@
 #include "mvxmediatypes/FieldType.h"
 #include "mvxmediatypes/FrameRate.h"
 #include "mvxmediatypes/PixelAspectRatio.h"
+#include "mvxmediatypes/PixelFormat.h"
 
 #include <cstdint>
 #include <cstdio>
@@ -48,8 +49,11 @@ struct StreamInfo
 struct EncodedFrame
 {
     std::int64_t mIndex = 0;
-    // Y4M: the frame's bytes ("FRAME\n" and the planes).
+    // Y4M: the frame's bytes ("FRAME\n" and the planes), or, for a planar
+    // frame that needs no conversion, the frame itself, whose planes Commit
+    // writes as they are.
     std::vector<std::uint8_t> mBytes;
+    QRT::InterfaceRef<MF::IVideoFrame> mFrame;
     // PNG: the temporary file and the final path.
     std::string mTemporaryPath;
     std::string mFinalPath;
@@ -65,6 +69,9 @@ public:
     // Prepares the output (creates the directory, writes the stream header).
     // Called once, before any other operation. False with outError on failure.
     virtual bool Begin(const StreamInfo& inInfo, std::string& outError) = 0;
+    // True when Encode takes frames of inFormat as they are, so that the
+    // render need not convert them first. Any thread.
+    virtual bool Accepts(mvxmediatypes::PixelFormat inFormat) const = 0;
     // Any thread, concurrently. inFrame has the stream's size.
     virtual EncodedFrame Encode(std::int64_t inIndex,
                                 const QRT::InterfaceRef<MF::IVideoFrame>& inFrame) = 0;
@@ -97,7 +104,9 @@ std::unique_ptr<FrameWriter> CreatePngSequenceWriter(std::string inPattern,
 // that the writer creates at inPath when inFile is null; an existing file
 // there makes Begin fail unless inOverwrite is set. Frames are converted to
 // 8-bit video-range Y'CbCr (BT.601 below 720 rows, BT.709 from 720), 4:4:4
-// or 4:2:0 with each chroma sample the mean of its 2x2 block.
+// or 4:2:0 with each chroma sample the mean of its 2x2 block, in one pass
+// into a buffer the writer reuses (IR_PackYUVPlanes); planar 4:2:0 frames
+// go out into a 4:2:0 stream unconverted. Each frame is one write.
 std::unique_ptr<FrameWriter> CreateY4MWriter(std::FILE* inFile, std::string inPath,
                                              Y4MChroma inChroma, bool inOverwrite = false);
 

@@ -56,7 +56,7 @@ std::string RenderableFormatNames()
     std::string names;
     for (const mt::PixelFormat format : mt::GetPixelFormatCatalogue())
     {
-        if (!format.IsRaster())
+        if (!format.IsRaster() || format.IsPlanar())
             continue;
         if (!names.empty())
             names += ", ";
@@ -331,7 +331,7 @@ private:
             if (!format)
                 return Fail(prefix + "unknown pixel format " + Quoted(*value) + " (one of " +
                             RenderableFormatNames() + ")");
-            if (!format->IsRaster())
+            if (!format->IsRaster() || format->IsPlanar())
                 return Fail(prefix + Quoted(*value) + " cannot be rendered to (one of " +
                             RenderableFormatNames() + ")");
             options.mPixelFormat = *format;

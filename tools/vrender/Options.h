@@ -89,7 +89,9 @@ struct RenderOptions
     std::uint32_t mHeight = 0;
     // Unset: the source's pixel aspect ratio.
     std::optional<mvxmediatypes::PixelAspectRatio> mPixelAspectRatio;
-    mvxmediatypes::PixelFormat mPixelFormat = mvxmediatypes::kPixelFormat_BGRA_4444_8u;
+    // Unset: BGRA_4444_8u, or the stream's own sampling for Y4M output
+    // without filters (see PlanRender).
+    std::optional<mvxmediatypes::PixelFormat> mPixelFormat;
     // Unset: the source's field order.
     std::optional<mvxmediatypes::FieldType> mFieldType;
     // Unset: the source's frame rate (25 for still images).

@@ -95,13 +95,16 @@ struct SharedState
     const std::string mMediaNote;
 };
 
-// The delivered frame in the stream's format and size: the source delivers
-// the nearest format it has and may keep its own size.
-FrameRef ConformToStream(const FrameRef& inFrame, const RenderPlan& inPlan, std::string& outError)
+// The delivered frame in the stream's size and in the render's format, or
+// in any format the writer takes as it is: the source delivers the nearest
+// format it has and may keep its own size.
+FrameRef ConformToStream(const FrameRef& inFrame, const RenderPlan& inPlan,
+                         const FrameWriter& inWriter, std::string& outError)
 {
     const QRT::ParamRect bounds = inFrame->GetBounds();
     const StreamInfo& stream = inPlan.mStream;
-    if (inFrame->GetPixelFormat() == inPlan.mPixelFormat &&
+    const mt::PixelFormat format = inFrame->GetPixelFormat();
+    if ((format == inPlan.mPixelFormat || inWriter.Accepts(format)) &&
         static_cast<std::uint32_t>(bounds.Width()) == stream.mWidth &&
         static_cast<std::uint32_t>(bounds.Height()) == stream.mHeight)
         return inFrame;
@@ -200,7 +203,7 @@ FrameResult FinishFrame(SharedState& inState, std::int64_t inIndex, FrameRef inF
             return result;
         }
         std::string problem;
-        const FrameRef frame = ConformToStream(inFrame, inState.mPlan, problem);
+        const FrameRef frame = ConformToStream(inFrame, inState.mPlan, *inState.mWriter, problem);
         if (!frame)
         {
             result.mError = name + ": " + problem;
@@ -531,7 +534,16 @@ bool PlanRender(const RenderOptions& inOptions, const SourceFacts& inSource,
         outError = "--field: the frame rate is too high for interlaced frames";
         return false;
     }
-    plan.mPixelFormat = inOptions.mPixelFormat;
+    // A Y4M stream of the source's own size without filters asks for its
+    // own sampling (planar 4:2:0, or 4:4:4 Y'CbCr): a source that has it
+    // hands its samples over unconverted. Filters work in BGRA.
+    const bool asStored = inOptions.mOutputKind != OutputKind::kPngSequence &&
+                          !inOptions.mFilters.Any() && stream.mWidth == inSource.mWidth &&
+                          stream.mHeight == inSource.mHeight;
+    plan.mPixelFormat = inOptions.mPixelFormat.value_or(!asStored ? mt::kPixelFormat_BGRA_4444_8u
+                                                        : inOptions.mChroma == Y4MChroma::k420
+                                                            ? mt::kPixelFormat_YUV_420_8u_Planar
+                                                            : mt::kPixelFormat_VUYA_4444_8u);
 
     // The media's length in frames of the output grid, when it has one; a
     // speed plays it in fewer or more frames.

@@ -21,7 +21,9 @@
 #include <algorithm>
 #include <cerrno>
 #include <charconv>
+#include <cstring>
 #include <fcntl.h>
+#include <memory>
 #include <unistd.h>
 #include <vector>
 
@@ -211,6 +213,20 @@ bool ReadLine(int inDescriptor, std::uint64_t inOffset, std::string& outLine)
     return true;
 }
 
+// Scratch memory of the calling thread, one block per slot, kept from frame
+// to frame so that a read touches no fresh pages; its content is undefined.
+std::uint8_t* ThreadScratch(std::size_t inSlot, std::size_t inBytes)
+{
+    thread_local std::unique_ptr<std::uint8_t[]> sBlocks[2];
+    thread_local std::size_t sSizes[2] = {};
+    if (sSizes[inSlot] < inBytes)
+    {
+        sBlocks[inSlot] = std::make_unique_for_overwrite<std::uint8_t[]>(inBytes);
+        sSizes[inSlot] = inBytes;
+    }
+    return sBlocks[inSlot].get();
+}
+
 class Y4MSource : public detail::VideoSourceBase
 {
 public:
@@ -231,10 +247,12 @@ protected:
     {
         if (inIndex == mCutFrame)
             return kResult_MediaMalformed;
+        const std::uint64_t offset = mOffsets[static_cast<std::size_t>(inIndex)];
+        if (inFormat == mvxmediatypes::kPixelFormat_YUV_420_8u_Planar)
+            return ReadPlanes(offset, outFrame);
         const std::uint64_t frameBytes = mHeader.FrameBytes();
-        std::vector<std::uint8_t> samples(frameBytes);
-        if (detail::ReadAt(mFile->Get(), mOffsets[static_cast<std::size_t>(inIndex)],
-                           samples.data(), samples.size()) != frameBytes)
+        std::uint8_t* samples = ThreadScratch(0, frameBytes);
+        if (detail::ReadAt(mFile->Get(), offset, samples, frameBytes) != frameBytes)
             return kResult_MediaMalformed;
 
         FrameRef frame;
@@ -247,7 +265,7 @@ protected:
         const std::uint32_t width = mHeader.mWidth;
         const std::uint32_t height = mHeader.mHeight;
         const std::uint32_t chromaWidth = mHeader.ChromaWidth();
-        const std::uint8_t* lumaPlane = samples.data();
+        const std::uint8_t* lumaPlane = samples;
         const std::uint8_t* cbPlane = lumaPlane + std::size_t{width} * height;
         const std::uint8_t* crPlane = cbPlane + std::size_t{chromaWidth} * mHeader.ChromaHeight();
         auto* base = static_cast<std::uint8_t*>(frame->GetWritableBaseAddress());
@@ -288,8 +306,9 @@ protected:
             // conversion to BGRA; subsampled chroma is repeated.
             const bool staged = inFormat != mvxmediatypes::kPixelFormat_VUYA_4444_8u;
             const std::int32_t stagingRowBytes = static_cast<std::int32_t>(width) * 4;
-            std::vector<std::uint8_t> staging(staged ? std::size_t{width} * 4 * height : 0);
-            std::uint8_t* vuyaBase = staged ? staging.data() : base;
+            std::uint8_t* staging =
+                staged ? ThreadScratch(1, std::size_t{width} * 4 * height) : nullptr;
+            std::uint8_t* vuyaBase = staged ? staging : base;
             const std::int32_t vuyaRowBytes = staged ? stagingRowBytes : rowBytes;
             for (std::uint32_t y = 0; y < height; ++y)
             {
@@ -313,9 +332,9 @@ protected:
                     kIR_PixelFormat_VUYA_4444_8u |
                     (matrix601 ? kIR_FormatBit_BT601 : kIR_FormatBit_BT709);
                 const std::int32_t status = IR_Convert(
-                    staging.data(), stagingRowBytes, source, base, rowBytes,
-                    kIR_PixelFormat_BGRA_8u, static_cast<std::int32_t>(width),
-                    static_cast<std::int32_t>(height), mvxmediatypes::kRenderQuality_Max);
+                    staging, stagingRowBytes, source, base, rowBytes, kIR_PixelFormat_BGRA_8u,
+                    static_cast<std::int32_t>(width), static_cast<std::int32_t>(height),
+                    mvxmediatypes::kRenderQuality_Max);
                 if (status != kIR_NoError)
                     return kResult_MediaUnsupported;
             }
@@ -333,6 +352,39 @@ protected:
     }
 
 private:
+    // The file's planes straight into a planar 4:2:0 frame: one read per
+    // plane when its rows are unpadded, else through scratch memory.
+    QRT::Result ReadPlanes(std::uint64_t inOffset, FrameRef& outFrame) const
+    {
+        FrameRef frame;
+        const QRT::Result created =
+            VF::CreateVideoFrame(mvxmediatypes::kPixelFormat_YUV_420_8u_Planar, mHeader.mWidth,
+                                 mHeader.mHeight, mHeader.mPixelAspectRatio, false, false, frame);
+        if (QRT::Failed(created))
+            return created;
+        const std::uint32_t widths[3] = {mHeader.mWidth, mHeader.ChromaWidth(),
+                                         mHeader.ChromaWidth()};
+        const std::uint32_t heights[3] = {mHeader.mHeight, mHeader.ChromaHeight(),
+                                          mHeader.ChromaHeight()};
+        std::uint64_t offset = inOffset;
+        for (std::uint32_t plane = 0; plane < 3; ++plane)
+        {
+            auto* base = static_cast<std::uint8_t*>(frame->GetWritablePlaneBaseAddress(plane));
+            const auto rowBytes = static_cast<std::size_t>(frame->GetPlaneRowBytes(plane));
+            const std::size_t width = widths[plane];
+            const std::size_t bytes = width * heights[plane];
+            std::uint8_t* target = rowBytes == width ? base : ThreadScratch(0, bytes);
+            if (detail::ReadAt(mFile->Get(), offset, target, bytes) != bytes)
+                return kResult_MediaMalformed;
+            if (target != base)
+                for (std::size_t y = 0; y < heights[plane]; ++y)
+                    std::memcpy(base + y * rowBytes, target + y * width, width);
+            offset += bytes;
+        }
+        outFrame = std::move(frame);
+        return QRT::kResult_Success;
+    }
+
     const Y4MHeader mHeader;
     const std::shared_ptr<FileDescriptor> mFile;
     // The file offset of every frame's first sample.
@@ -432,6 +484,9 @@ OpenStatus OpenY4MSource(const std::string& inPath, VideoSourceRef& outSource)
     description.mFrameCount = static_cast<std::int64_t>(offsets.size());
     description.mPixelFormats = {mvxmediatypes::kPixelFormat_BGRA_4444_8u,
                                  mvxmediatypes::kPixelFormat_VUYA_4444_8u};
+    // 4:2:0 files hand their planes over unconverted to whoever asks for them.
+    if (header.mChroma == Chroma::k420)
+        description.mPixelFormats.push_back(mvxmediatypes::kPixelFormat_YUV_420_8u_Planar);
     if (header.mChroma == Chroma::k422 && header.mWidth % 2 == 0)
         description.mPixelFormats.push_back(mvxmediatypes::kPixelFormat_YUYV_422_8u);
     description.mColorProfile.mName = header.mHeight < kBT709MinimumHeight ? "BT.601" : "BT.709";

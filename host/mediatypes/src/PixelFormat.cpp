@@ -15,7 +15,7 @@ struct CatalogueEntry
     std::string_view mName;
 };
 
-constexpr std::array<CatalogueEntry, 13> kCatalogue = {{
+constexpr std::array<CatalogueEntry, 14> kCatalogue = {{
     {kPixelFormat_BGRA_4444_8u, "BGRA_4444_8u"},
     {kPixelFormat_BGRA_4444_16u, "BGRA_4444_16u"},
     {kPixelFormat_BGRA_4444_16f, "BGRA_4444_16f"},
@@ -27,6 +27,7 @@ constexpr std::array<CatalogueEntry, 13> kCatalogue = {{
     {kPixelFormat_YUYV_422_8u_Fields, "YUYV_422_8u_Fields"},
     {kPixelFormat_YUYV_422_8u_HalfWidthFields, "YUYV_422_8u_HalfWidthFields"},
     {kPixelFormat_MJPG_422_Compressed, "MJPG_422_Compressed"},
+    {kPixelFormat_YUV_420_8u_Planar, "YUV_420_8u_Planar"},
     {kPixelFormat_Any, "Any"},
     {kPixelFormat_Invalid, "Invalid"},
 }};
@@ -59,7 +60,7 @@ std::uint32_t Differs(bool inLeft, bool inRight)
     return inLeft != inRight ? 1 : 0;
 }
 
-using Rank = std::array<std::uint32_t, 10>;
+using Rank = std::array<std::uint32_t, 11>;
 
 // Smaller is closer; compared lexicographically in the order of the documented rule.
 Rank RankCandidate(PixelFormat inRequested, PixelFormat inCandidate, std::uint32_t inQuality)
@@ -82,6 +83,8 @@ Rank RankCandidate(PixelFormat inRequested, PixelFormat inCandidate, std::uint32
     }
     return Rank{
         Differs(inRequested.IsCompressed(), inCandidate.IsCompressed()),
+        // Planar frames cannot stand in for packed ones, nor the reverse.
+        Differs(inRequested.IsPlanar(), inCandidate.IsPlanar()),
         Differs(inRequested.IsYUV(), inCandidate.IsYUV()),
         depthRank,
         depthDistance,

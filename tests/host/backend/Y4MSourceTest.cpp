@@ -1,6 +1,7 @@
 #include "BE/MediaStatus.h"
 #include "BackendTestSupport.h"
 
+#include <algorithm>
 #include <cstring>
 #include <sys/stat.h>
 #include <tuple>
@@ -237,6 +238,45 @@ TEST_F(Y4MSourceTest, ALastFrameCutShortKeepsTheCompleteFrames)
         FrameRef frame;
         EXPECT_EQ(ReadFrame(source, TickTime::FromFrame(2, kFrameRate_Video25), frame),
                   BE::kResult_MediaMalformed);
+    }
+}
+
+// 4:2:0 files offer their planes as they are: a planar request gets the
+// file's samples in the frame's planes (padded rows or not), and no other
+// request is answered with a planar frame.
+TEST_F(Y4MSourceTest, A420FileHandsItsPlanesOverUnconverted)
+{
+    for (const auto& [width, height] : {std::pair(37, 9), std::pair(128, 2)})
+    {
+        SCOPED_TRACE(width);
+        const int chromaWidth = (width + 1) / 2, chromaHeight = (height + 1) / 2;
+        const std::size_t frameBytes = width * height + 2 * chromaWidth * chromaHeight;
+        std::string samples;
+        for (std::size_t i = 0; i < 2 * frameBytes; ++i)
+            samples += char(i * 7 + i / 5);
+        const BE::VideoSourceRef source =
+            Write("YUV4MPEG2 W" + std::to_string(width) + " H" + std::to_string(height) +
+                  " F25:1\nFRAME\n" + samples.substr(0, frameBytes) + "FRAME\n" +
+                  samples.substr(frameBytes));
+        ASSERT_TRUE(source);
+        const std::vector<PixelFormat> formats = source->GetPixelFormats();
+        EXPECT_EQ(std::count(formats.begin(), formats.end(), kPixelFormat_YUV_420_8u_Planar), 1);
+        BE::VideoFrameRequest request;
+        request.mPixelFormat = kPixelFormat_YUYV_422_8u;
+        EXPECT_EQ(ReadFrameOrFail(source, TickTime::FromFrame(1, k25), request)->GetPixelFormat(),
+                  kPixelFormat_VUYA_4444_8u);
+        request.mPixelFormat = kPixelFormat_YUV_420_8u_Planar;
+        const FrameRef frame = ReadFrameOrFail(source, TickTime::FromFrame(1, k25), request);
+        ASSERT_TRUE(frame && frame->GetPixelFormat() == request.mPixelFormat);
+        ASSERT_EQ(frame->GetPlaneCount(), 3u);
+        std::string read;
+        for (std::uint32_t plane = 0; plane < 3; ++plane)
+        {
+            const auto* base = static_cast<const char*>(frame->GetPlaneBaseAddress(plane));
+            for (int y = 0; y < (plane ? chromaHeight : height); ++y)
+                read.append(base + y * frame->GetPlaneRowBytes(plane), plane ? chromaWidth : width);
+        }
+        EXPECT_TRUE(read == samples.substr(frameBytes)) << "the planes differ from the file";
     }
 }
 

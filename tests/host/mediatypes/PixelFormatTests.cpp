@@ -13,7 +13,7 @@ namespace
 
 // What a catalogue format physically is, written down by hand.
 constexpr unsigned kRender = 1, kFields = 2, kHalved = 4, kYuv = 8, kAlpha = 16, kPremul = 32,
-                   kFloat = 64, kLinear = 128, kCompressed = 256;
+                   kFloat = 64, kLinear = 128, kCompressed = 256, kPlanar = 512;
 
 struct Expected
 {
@@ -37,7 +37,8 @@ const Expected kCatalogue[] = {
     {kPixelFormat_YUYV_422_8u_HalfWidthFields, "YUYV_422_8u_HalfWidthFields", "YUFh", 2, 3, 8, 0,
      kFields | kHalved | kYuv},
     {kPixelFormat_MJPG_422_Compressed, "MJPG_422_Compressed", "MJPG", 0, 3, 8, 1,
-     kYuv | kCompressed}};
+     kYuv | kCompressed},
+    {kPixelFormat_YUV_420_8u_Planar, "YUV_420_8u_Planar", "I420", 2, 3, 8, 0, kYuv | kPlanar}};
 
 const PixelFormat kBgra8 = kPixelFormat_BGRA_4444_8u;
 const PixelFormat kBgra16 = kPixelFormat_BGRA_4444_16u;
@@ -47,6 +48,7 @@ const PixelFormat kVuya32 = kPixelFormat_VUYA_4444_32f;
 const PixelFormat kYuyv = kPixelFormat_YUYV_422_8u;
 const PixelFormat kYuyvFields = kPixelFormat_YUYV_422_8u_Fields;
 const PixelFormat kYuyvHalf = kPixelFormat_YUYV_422_8u_HalfWidthFields;
+const PixelFormat kPlanar420 = kPixelFormat_YUV_420_8u_Planar;
 const PixelFormat kAny = kPixelFormat_Any;
 const PixelFormat kInvalid = kPixelFormat_Invalid;
 
@@ -71,7 +73,7 @@ TEST_F(PixelFormatTest, EveryCatalogueFormatAnswersTheRendererBitTests)
                                 kHalved * f.IsHorizontallyHalved() | kYuv * f.IsYUV() |
                                 kAlpha * f.HasAlpha() | kPremul * f.IsPremultiplied() |
                                 kFloat * f.IsFloat() | kLinear * f.IsLinear() |
-                                kCompressed * f.IsCompressed();
+                                kCompressed * f.IsCompressed() | kPlanar * f.IsPlanar();
         EXPECT_EQ(traits, e.traits);
         EXPECT_TRUE(f.IsRGB() != f.IsYUV() && f.IsRaster() != f.IsCompressed() && f.IsValid());
         EXPECT_EQ(std::tuple(f.GetBytesPerPixel(), f.GetChannelCount(), f.GetBitDepth()),
@@ -138,6 +140,8 @@ TEST_F(PixelFormatTest, SelectNearestFollowsItsPreferenceOrder)
             {"only wildcards", kBgra8, {kInvalid}, 5, kInvalid},
             {"Any in the list takes the request", kYuyv, {kBgra8, kAny}, 5, kYuyv},
             {"Any requested: first concrete", kAny, {kAny, kVuya8, kBgra8}, 5, kVuya8},
+            {"planar never for packed", kYuyv, {kBgra8, kPlanar420, kVuya8}, 5, kVuya8},
+            {"packed for planar at last", kPlanar420, {kBgra8, kVuya8}, 5, kVuya8},
         };
     for (const auto& [why, requested, list, quality, expected] : cases)
         EXPECT_EQ(SelectNearestPixelFormat(requested, list, quality), expected) << why;

@@ -11,11 +11,7 @@ namespace
 using namespace vftest;
 using QRT::ParamRect;
 
-// A 4:2:0 planar 8-bit format, not in the catalogue, to check planar layout.
-constexpr mt::PixelFormat kPlanar420 = mt::PixelFormat::Make(
-    mt::MakePixelFormatCode('I', '4', '2', '0'),
-    mt::MakePixelProperties(true, mt::kPixelSampleKind_8u, 3, false, false, mt::kPixelChroma_420,
-                            false, mt::kPixelFieldLayout_Interleaved, 1, 8));
+constexpr mt::PixelFormat kPlanar420 = mt::kPixelFormat_YUV_420_8u_Planar;
 constexpr mt::PixelFormat kBGRA8 = mt::kPixelFormat_BGRA_4444_8u;
 
 std::pair<uint32_t, uint32_t> OriginOf(const MF::IVideoFrame& inFrame)

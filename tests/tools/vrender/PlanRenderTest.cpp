@@ -137,6 +137,38 @@ TEST_F(PlanRenderTest, ReverseEndlessMediaEndsAtTimeZero)
                                       mt::kFrameRate_Video25));
 }
 
+// Y4M output of the source's size without filters asks for the stream's own
+// sampling, so that a source with it hands its samples over; everything else
+// renders in BGRA unless --format says otherwise.
+TEST_F(PlanRenderTest, Y4MWithoutFiltersAsksForTheStreamsSampling)
+{
+    using K = vrender::OutputKind;
+    const auto c420 = vrender::Y4MChroma::k420, c444 = vrender::Y4MChroma::k444;
+    // (output, chroma, deinterlace, output width, --format, expected)
+    const std::tuple<K, vrender::Y4MChroma, bool, std::uint32_t, std::optional<mt::PixelFormat>,
+                     mt::PixelFormat>
+        cases[] = {
+            {K::kY4MStream, c420, false, 0, {}, mt::kPixelFormat_YUV_420_8u_Planar},
+            {K::kY4MFile, c420, false, 640, {}, mt::kPixelFormat_YUV_420_8u_Planar},
+            {K::kY4MStream, c444, false, 0, {}, mt::kPixelFormat_VUYA_4444_8u},
+            {K::kPngSequence, c420, false, 0, {}, mt::kPixelFormat_BGRA_4444_8u},
+            {K::kY4MStream, c420, true, 0, {}, mt::kPixelFormat_BGRA_4444_8u},
+            {K::kY4MStream, c420, false, 320, {}, mt::kPixelFormat_BGRA_4444_8u},
+            {K::kY4MStream, c420, false, 0, mt::kPixelFormat_BGRA_4444_16u,
+             mt::kPixelFormat_BGRA_4444_16u},
+        };
+    for (std::size_t i = 0; i < std::size(cases); ++i)
+    {
+        const auto& [kind, chroma, deinterlace, width, format, expected] = cases[i];
+        vrender::RenderOptions options;
+        std::tie(options.mOutputKind, options.mChroma, options.mPixelFormat) =
+            std::tuple(kind, chroma, format);
+        options.mFilters.mDeinterlace = deinterlace;
+        std::tie(options.mWidth, options.mHeight) = std::pair(width, width * 9 / 16);
+        EXPECT_EQ(Plan(options, Clip()).mPixelFormat, expected) << "case " << i;
+    }
+}
+
 // The frames in flight are as many as fit the memory budget (half the
 // physical memory unless --memory says otherwise); a frame that does not
 // fit alone is refused.

@@ -59,8 +59,16 @@
 //   YUYV_422_8u_Fields         0x08044431   2   4:2:2, fields stored apart
 //   YUYV_422_8u_HalfWidthFields 0x08064C31  2   pixel pairs, fields apart
 //   MJPG_422_Compressed        0x08080433   0   compressed 4:2:2
+//   YUV_420_8u_Planar          0x08040831   2   planar 4:2:0, no alpha (below)
 //   Any                        0            0   wildcard: "any format"
 //   Invalid                    0            0   no format (the value 0)
+//
+// Planar 4:2:0 (the only planar layout): one buffer holding the Y plane, then
+// the Cb plane, then the Cr plane, the chroma planes (width + 1) / 2 samples
+// wide and (height + 1) / 2 rows high; VF::ComputeFrameLayout places them.
+// Such a format is a raster but not a render format: the code that walks
+// packed rows (filters, compositing, staging) refuses it, so nearest-format
+// selection answers it only to a request for a planar format.
 //
 // Value type, trivially copyable; every function here is safe from any thread.
 
@@ -203,6 +211,9 @@ public:
         return (GetProperties() & kPixelProperty_StorageMask) == kPixelProperty_StorageRaster &&
                (GetProperties() & kPixelProperty_ChromaMask) == 0;
     }
+    // A raster whose samples lie in separate planes (4:2:0) rather than in
+    // packed rows.
+    constexpr bool IsPlanar() const { return IsRaster() && GetChroma() == kPixelChroma_420; }
     // A raster format whose fields are copied one by one.
     constexpr bool IsFieldByField() const
     {
@@ -287,6 +298,10 @@ inline constexpr PixelFormat kPixelFormat_YUYV_422_8u_HalfWidthFields = PixelFor
     MakePixelFormatCode('Y', 'U', 'F', 'h'),
     MakePixelProperties(true, kPixelSampleKind_8u, 3, false, false, kPixelChroma_422Pairs, false,
                         kPixelFieldLayout_HalfWidthFieldsUpperFirst, 1, 8));
+inline constexpr PixelFormat kPixelFormat_YUV_420_8u_Planar = PixelFormat::Make(
+    MakePixelFormatCode('I', '4', '2', '0'),
+    MakePixelProperties(true, kPixelSampleKind_8u, 3, false, false, kPixelChroma_420, false,
+                        kPixelFieldLayout_Interleaved, 1, 8));
 inline constexpr PixelFormat kPixelFormat_MJPG_422_Compressed = PixelFormat::Make(
     MakePixelFormatCode('M', 'J', 'P', 'G'),
     MakePixelProperties(true, kPixelSampleKind_Compressed, 3, false, false, kPixelChroma_422, false,
@@ -320,7 +335,7 @@ std::optional<PixelFormat> PixelFormatFromName(std::string_view inName);
 //   2. r itself when the list holds r, or holds kPixelFormat_Any;
 //   3. r == kPixelFormat_Any: the first concrete format of the list;
 //   4. otherwise the closest concrete format of the list, ranked by, in order:
-//      same storage (raster or compressed); same colour model (RGB or YUV);
+//      same storage (raster or compressed, then planar or packed); same colour model (RGB or YUV);
 //      depth (below); same alpha presence; same premultiplication; same
 //      linearity; same float-ness; same chroma sampling; same field layout;
 //      earlier in the list;
