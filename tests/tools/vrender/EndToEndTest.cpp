@@ -229,8 +229,7 @@ TEST_F(EndToEndTest, SizeFormatAndQualityOptions)
     ASSERT_EQ(run.mExitCode, 0) << run.mErr;
     const FrameRef frame = ReadPng(out / "frame_00001.png");
     ASSERT_TRUE(frame);
-    EXPECT_EQ(frame->GetBounds().Width(), 32);
-    EXPECT_EQ(frame->GetBounds().Height(), 18);
+    EXPECT_EQ(frame->GetBounds(), QRT::ParamRect(0, 0, 32, 18));
     // The first bar is 75 % white.
     for (int c = 0; c < 3; ++c)
         EXPECT_NEAR(static_cast<const std::uint8_t*>(frame->GetBaseAddress())[c], 191, 2);
@@ -257,17 +256,11 @@ TEST_F(EndToEndTest, Y4MFileKeepsRateAndLengthAndARangeBeyondItIsRefused)
 
 TEST_F(EndToEndTest, UnreadableMediaExitsWithOneAndIsNamed)
 {
-    const std::pair<std::string, std::string> cases[] = {
-        {(mDirectory / "missing.y4m").string(),
-         "vrender: " + (mDirectory / "missing.y4m").string() + ": "}};
-    for (const auto& [media, prefix] : cases)
-    {
-        const auto run =
-            Run({"source", media, "--count", "1", "-o", (mDirectory / "f_%d.png").string()});
-        EXPECT_EQ(run.mExitCode, 1) << media;
-        EXPECT_EQ(run.mErr.rfind(prefix, 0), 0u) << run.mErr;
-        EXPECT_NE(run.mErr.find(media), std::string::npos) << run.mErr;
-    }
+    const std::string media = (mDirectory / "missing.y4m").string();
+    const auto run =
+        Run({"source", media, "--count", "1", "-o", (mDirectory / "f_%d.png").string()});
+    EXPECT_EQ(run.mExitCode, 1);
+    EXPECT_EQ(run.mErr.rfind("vrender: " + media + ": ", 0), 0u) << run.mErr;
 }
 
 TEST_F(EndToEndTest, HelpAndInfoPrintToStandardOutput)
