@@ -263,11 +263,8 @@ TEST_F(EndToEndTest, UnreadableMediaExitsWithOneAndIsNamed)
     EXPECT_EQ(run.mErr.rfind("vrender: " + media + ": ", 0), 0u) << run.mErr;
 }
 
-TEST_F(EndToEndTest, HelpAndInfoPrintToStandardOutput)
+TEST_F(EndToEndTest, InfoPrintsToStandardOutput)
 {
-    const auto help = Run({"--help"});
-    EXPECT_EQ(help.mExitCode, 0);
-    EXPECT_EQ(help.mOut.rfind("vrender: renders video frames", 0), 0u);
     const auto info = Run({"info"});
     ASSERT_EQ(info.mExitCode, 0) << info.mErr;
     EXPECT_EQ(info.mOut.rfind("Cutlist \"Example\" {", 0), 0u) << info.mOut;

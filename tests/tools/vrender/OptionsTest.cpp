@@ -140,7 +140,6 @@ TEST_F(OptionsTest, RefusalsNameTheArgumentAndExitWithTwo)
         {"source m --size", "--size needs a value"},
         {"source m --bogus", "unknown option '--bogus' (see vrender --help)"},
         {"source m --quiet=yes", "--quiet takes no value"},
-        {"source m --deinterlace=1", "--deinterlace takes no value"},
         {"source m --size 1x1 --size 2x2", "--size is given twice"},
         {"source m --frames 0:9 --count 3", "--frames cannot be combined with --start or --count"},
         {"source m -o - --y4m", "--y4m: the output is already chosen by -o; give only one of -o,"},
@@ -165,10 +164,8 @@ TEST_F(OptionsTest, RefusalsNameTheArgumentAndExitWithTwo)
         {"source m --format RGB24",
          "--format: unknown pixel format 'RGB24' (one of BGRA_4444_8u, "},
         {"source m --format Any", "--format: 'Any' cannot be rendered to (one of BGRA_4444_8u, "},
-        // A pattern text is checked with the arguments.
+        // A pattern text is checked with the arguments (PatternSettingsTest has the reasons).
         {"source pattern:nope", "pattern 'pattern:nope': unknown pattern 'nope' (expected bars,"},
-        {"source pattern:bars?size=abc", "pattern 'pattern:bars?size=abc': size 'abc' is not WxH"},
-        {"source pattern:solid?speed=2", "pattern 'pattern:solid?speed=2': unknown parameter"},
     };
     for (const auto& [args, error] : cases)
         EXPECT_THAT(Parse(args).mError, testing::StartsWith(error)) << args;
