@@ -254,15 +254,6 @@ TEST_F(EndToEndTest, Y4MFileKeepsRateAndLengthAndARangeBeyondItIsRefused)
     EXPECT_EQ(beyond.mOut, "") << "nothing is written before the range is checked";
 }
 
-TEST_F(EndToEndTest, UnreadableMediaExitsWithOneAndIsNamed)
-{
-    const std::string media = (mDirectory / "missing.y4m").string();
-    const auto run =
-        Run({"source", media, "--count", "1", "-o", (mDirectory / "f_%d.png").string()});
-    EXPECT_EQ(run.mExitCode, 1);
-    EXPECT_EQ(run.mErr.rfind("vrender: " + media + ": ", 0), 0u) << run.mErr;
-}
-
 TEST_F(EndToEndTest, InfoPrintsToStandardOutput)
 {
     const auto info = Run({"info"});
