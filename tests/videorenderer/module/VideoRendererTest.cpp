@@ -184,15 +184,8 @@ TEST_F(VideoRendererTest, UnbalancedShutdownLeavesEverythingAsItWasAndReports)
 
 // --- Suite families -----------------------------------------------------------
 
-struct TestSuiteTable
-{
-    int (*mFunction)(int);
-};
-int Negate(int inValue)
-{
-    return -inValue;
-}
-const TestSuiteTable kTestSuiteTable = {&Negate};
+// A suite table stands for itself: only its address is registered.
+const int kTestSuiteTable = 0;
 
 TEST_F(VideoRendererTest, SuiteFamilyRegistersEveryVersionAndChecksTheLastResult)
 {
