@@ -140,6 +140,7 @@ TEST_F(OptionsTest, RefusalsNameTheArgumentAndExitWithTwo)
         {"source m --size", "--size needs a value"},
         {"source m --bogus", "unknown option '--bogus' (see vrender --help)"},
         {"source m --quiet=yes", "--quiet takes no value"},
+        {"source m --deinterlace=1", "--deinterlace takes no value"},
         {"source m --size 1x1 --size 2x2", "--size is given twice"},
         {"source m --frames 0:9 --count 3", "--frames cannot be combined with --start or --count"},
         {"source m -o - --y4m", "--y4m: the output is already chosen by -o; give only one of -o,"},
