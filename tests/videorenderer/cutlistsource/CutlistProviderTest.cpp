@@ -5,6 +5,7 @@
 
 #include <tuple>
 
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 namespace
@@ -36,6 +37,18 @@ protected:
     const QRT::ImmutableString mSequence = QRT::ImmutableString::CreateStatic("Sequence 01");
     const QRT::ImmutableString mDefault{};
 };
+
+TEST_F(CutlistProviderTest, PropertiesAnswerTheSettingsThroughTheirInterface)
+{
+    const auto properties = QRT::QueryRef<MF::IRenderableCutlistProviderProperties>(mProvider);
+    ASSERT_TRUE(properties);
+    std::int32_t bounds[4] = {-1, -1, -1, -1};
+    properties->GetBounds(bounds[0], bounds[1], bounds[2], bounds[3]);
+    EXPECT_THAT(bounds, ::testing::ElementsAre(0, 0, 720, 576));
+    EXPECT_EQ(properties->GetPixelAspectRatio(), mvxmediatypes::kPixelAspectRatio_D1PAL);
+    EXPECT_EQ(properties->GetFieldType(), mvxmediatypes::kFieldType_LowerFirst);
+    EXPECT_EQ(properties->GetFrameRate(), mvxmediatypes::kFrameRate_Video25);
+}
 
 TEST_F(CutlistProviderTest, GettersAnswerTheCutlistsOfTheNameOrTheDefaultSet)
 {
