@@ -11,6 +11,7 @@
 #include <stdexcept>
 #include <string>
 #include <thread>
+#include <tuple>
 #include <vector>
 
 #include <boost/weak_ptr.hpp>
@@ -125,11 +126,9 @@ TEST_P(ExecutorTest, AtOneRunsReadyTasksOneByOneInPostOrder)
     const ExecutorRef executor = Make(1);
     constexpr int kTotal = 2000;
     std::vector<int> order;
-    std::atomic<int> running{0};
-    std::atomic<int> overlaps{0};
+    std::atomic<int> running{0}, overlaps{0};
     CountingSignal done;
     for (int i = 0; i < kTotal; ++i)
-    {
         executor->Post(
             [&, i]
             {
@@ -140,7 +139,6 @@ TEST_P(ExecutorTest, AtOneRunsReadyTasksOneByOneInPostOrder)
                 --running;
                 done.Notify();
             });
-    }
     ASSERT_TRUE(done.WaitFor(kTotal));
     EXPECT_EQ(overlaps.load(), 0);
     std::vector<int> expected(kTotal);
@@ -152,13 +150,9 @@ TEST_P(ExecutorTest, RunsUpToItsLimitAtOnceAndNeverMore)
 {
     constexpr int kLimit = 3;
     const ExecutorRef executor = Make(kLimit);
-    CountingSignal meeting;
-    CountingSignal done;
-    std::atomic<int> met{0};
-    std::atomic<int> running{0};
-    std::atomic<int> over{0};
+    CountingSignal meeting, done;
+    std::atomic<int> met{0}, running{0}, over{0};
     for (int i = 0; i < 300; ++i)
-    {
         executor->Post(
             [&, meets = i < kLimit]
             {
@@ -170,7 +164,6 @@ TEST_P(ExecutorTest, RunsUpToItsLimitAtOnceAndNeverMore)
                 --running;
                 done.Notify();
             });
-    }
     ASSERT_TRUE(done.WaitFor(300));
     EXPECT_EQ(met.load(), kLimit);
     EXPECT_EQ(over.load(), 0);
@@ -180,8 +173,7 @@ TEST_P(ExecutorTest, ShutdownRefusesNewTasksStartsNoQueuedOneAndDiscardReleasesT
 {
     const ExecutorRef executor = Make(1);
     Occupy(executor);
-    std::atomic<int> live{0};
-    std::atomic<int> ran{0};
+    std::atomic<int> live{0}, ran{0};
     for (int i = 0; i < 10; ++i)
     {
         PostTracked(executor, live, ran);
@@ -264,7 +256,6 @@ TEST_F(SubExecutorTest, StateQueryFollowsTheNestingAndASubKeepsItsParentAlive)
     std::atomic<int> seen[3] = {-1, -1, -1};
     CountingSignal done;
     for (int level = 0; level < 3; ++level)
-    {
         levels[level]->Post(
             [&, level]
             {
@@ -274,11 +265,9 @@ TEST_F(SubExecutorTest, StateQueryFollowsTheNestingAndASubKeepsItsParentAlive)
                 seen[level] = bits;
                 done.Notify();
             });
-    }
     ASSERT_TRUE(done.WaitFor(3));
-    EXPECT_EQ(seen[0].load(), 0b001);
-    EXPECT_EQ(seen[1].load(), 0b011);
-    EXPECT_EQ(seen[2].load(), 0b111);
+    EXPECT_EQ(std::tuple(seen[0].load(), seen[1].load(), seen[2].load()),
+              std::tuple(0b001, 0b011, 0b111));
     parent.reset();
     levels[0].reset();
     levels[1].reset();
@@ -294,8 +283,7 @@ TEST_F(SubExecutorTest, ParentShutdownShutsItDownAndReleasesItsTasks)
 {
     const ExecutorRef parent = CreateThreadPoolExecutor(1);
     const ExecutorRef sub = CreateSubExecutor(parent, 1);
-    std::atomic<int> live{0};
-    std::atomic<int> ran{0};
+    std::atomic<int> live{0}, ran{0};
     Occupy(parent);
     for (int i = 0; i < 5; ++i)
         PostTracked(sub, live, ran);

@@ -47,11 +47,7 @@ TEST(StringsTest, UnpairedSurrogatesAreReplaced)
 
 TEST(StringsTest, EachMaximalIllFormedUTF8SubsequenceIsReplacedOnce)
 {
-    const struct
-    {
-        const char* utf8;
-        std::u16string utf16;
-    } cases[] = {
+    const std::pair<const char*, std::u16string> cases[] = {
         // Bytes that never start a sequence, overlong forms, encoded
         // surrogates and values above U+10FFFF.
         {"\xF5\xFF", {kR, kR}},
@@ -65,8 +61,8 @@ TEST(StringsTest, EachMaximalIllFormedUTF8SubsequenceIsReplacedOnce)
         {"\x61\xF1\x80\x80\xE1\x80\xC2\x62\x80\x63\x80\xBF\x64",
          {u'a', kR, kR, kR, u'b', kR, u'c', kR, kR, u'd'}},
     };
-    for (const auto& c : cases)
-        EXPECT_EQ(UTF8to16(c.utf8), c.utf16) << testing::PrintToString(std::string(c.utf8));
+    for (const auto& [utf8, utf16] : cases)
+        EXPECT_EQ(UTF8to16(utf8), utf16) << testing::PrintToString(std::string(utf8));
     EXPECT_EQ(mvxcore::utility::AsciiToUTF16("A\xE9Z"), std::u16string({u'A', kR, u'Z'}));
 }
 

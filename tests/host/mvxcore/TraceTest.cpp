@@ -45,19 +45,14 @@ private:
 
 TEST_F(TraceTest, PatternsMatchExactNamesAndTrailingWildcards)
 {
-    const struct
-    {
-        const char* pattern;
-        const char* category;
-        bool matches;
-    } cases[] = {{"ML.Queue", "ML.Queue", true},
-                 {"ML.Queue", "ML.Queue.Sub", false},
-                 {"ML.*", "ML.A.RenderFrame", true},
-                 {"ML.*", "MLX.Queue", false},
-                 {"", "ML", false}};
-    for (const auto& c : cases)
-        EXPECT_EQ(trace::MatchesPattern(c.pattern, c.category), c.matches)
-            << c.pattern << " / " << c.category;
+    const std::tuple<const char*, const char*, bool> cases[] = {{"ML.Queue", "ML.Queue", true},
+                                                                {"ML.Queue", "ML.Queue.Sub", false},
+                                                                {"ML.*", "ML.A.RenderFrame", true},
+                                                                {"ML.*", "MLX.Queue", false},
+                                                                {"", "ML", false}};
+    for (const auto& [pattern, category, matches] : cases)
+        EXPECT_EQ(trace::MatchesPattern(pattern, category), matches)
+            << pattern << " / " << category;
 }
 
 TEST_F(TraceTest, OnlyEnabledCategoriesWriteCategoryColonTextAndTheMacroFormatsOnlyThen)

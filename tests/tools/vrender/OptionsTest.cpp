@@ -165,10 +165,8 @@ TEST_F(OptionsTest, RefusalsNameTheArgumentAndExitWithTwo)
         {"source m --format RGB24",
          "--format: unknown pixel format 'RGB24' (one of BGRA_4444_8u, "},
         {"source m --format Any", "--format: 'Any' cannot be rendered to (one of BGRA_4444_8u, "},
-        // A pattern text is checked with the arguments.
+        // A pattern text is checked with the arguments (PatternSettingsTest has the reasons).
         {"source pattern:nope", "pattern 'pattern:nope': unknown pattern 'nope' (expected bars,"},
-        {"source pattern:bars?size=abc", "pattern 'pattern:bars?size=abc': size 'abc' is not WxH"},
-        {"source pattern:solid?speed=2", "pattern 'pattern:solid?speed=2': unknown parameter"},
     };
     for (const auto& [args, error] : cases)
         EXPECT_THAT(Parse(args).mError, testing::StartsWith(error)) << args;

@@ -117,38 +117,32 @@ TEST_F(RenderableCutlistSourceTest, ConformedTimeAndFieldRateFollowTheFieldType)
     const MF::FrameTime frame(t(0));
     const MF::FrameTime upper(t(0), t(kFieldTicks));
     const MF::FrameTime lower(t(kFieldTicks), t(0));
-    const struct
-    {
-        FieldType mType;
-        MF::FrameTime mRequested;
-        MF::FrameTime mExpected;
-        mvxmediatypes::FrameRate mRate = mvxmediatypes::kFrameRate_Video25;
-    } cases[] = {
-        {kP, MF::FrameTime(t(100)), frame},
-        {kU, MF::FrameTime(t(100)), upper},
-        {kL, MF::FrameTime(t(100)), lower},
+    const auto k25 = mvxmediatypes::kFrameRate_Video25;
+    const std::tuple<FieldType, MF::FrameTime, MF::FrameTime, mvxmediatypes::FrameRate> cases[] = {
+        {kP, MF::FrameTime(t(100)), frame, k25},
+        {kU, MF::FrameTime(t(100)), upper, k25},
+        {kL, MF::FrameTime(t(100)), lower, k25},
         // "As source" takes the order of an interlaced request.
-        {kA, MF::FrameTime(t(7), t(9)), upper},
-        {kA, MF::FrameTime(t(9), t(7)), lower},
-        {kA, MF::FrameTime(t(9)), frame},
+        {kA, MF::FrameTime(t(7), t(9)), upper, k25},
+        {kA, MF::FrameTime(t(9), t(7)), lower, k25},
+        {kA, MF::FrameTime(t(9)), frame, k25},
         // A zero rate leaves the time unaligned.
         {kP, MF::FrameTime(t(9)), MF::FrameTime(t(9)), mvxmediatypes::kFrameRate_Zero},
     };
-    for (const auto& testCase : cases)
+    for (const auto& [type, requested, expected, rate] : cases)
     {
-        SCOPED_TRACE(testCase.mType);
+        SCOPED_TRACE(type);
         MF::FrameTime conformed(Ticks(-1));
-        const auto source = Source(testCase.mType, testCase.mRate);
-        source->ConformFrameTime(testCase.mRequested, mParams, conformed);
-        EXPECT_EQ(conformed, testCase.mExpected);
+        const auto source = Source(type, rate);
+        source->ConformFrameTime(requested, mParams, conformed);
+        EXPECT_EQ(conformed, expected);
         // The field rate is twice the frame rate only when interlaced.
-        mvxmediatypes::FrameRate rate;
-        source->GetFrameRate(rate);
-        EXPECT_EQ(rate, testCase.mRate);
-        source->GetFieldRate(rate);
-        EXPECT_EQ(rate, testCase.mType == kU || testCase.mType == kL
-                            ? mvxmediatypes::kFrameRate_Video50
-                            : testCase.mRate);
+        mvxmediatypes::FrameRate frameRate, fieldRate;
+        source->GetFrameRate(frameRate);
+        source->GetFieldRate(fieldRate);
+        EXPECT_EQ(
+            std::pair(frameRate, fieldRate),
+            std::pair(rate, type == kU || type == kL ? mvxmediatypes::kFrameRate_Video50 : rate));
     }
 }
 
@@ -158,46 +152,39 @@ TEST_F(RenderableCutlistSourceTest, RenderSizeFollowsFieldTypeAndQuality)
     // height (scale rescaled to match); from quality 3 it renders the full
     // frame (16 wide, scale 1). Progressive renders the full frame only from
     // quality 5.
-    const struct
+    // Field type, quality, height, full-frame height, width, height and
+    // vertical scale the producer sees.
+    const std::tuple<FieldType, std::uint32_t, std::uint32_t, std::uint32_t, std::uint32_t,
+                     std::uint32_t, double>
+        cases[] = {
+            {kU, 2, 4, 8, 8, 4, 0.5},
+            {kL, 2, 5, 8, 8, 6, 6.0 / 8.0},
+            // An unset quality (all bits) counts as below 3 when compared signed.
+            {kL, 0xFFFFFFFFu, 5, 8, 8, 6, 6.0 / 8.0},
+            // Without a full-frame height the scale stays as requested.
+            {kL, 1, 5, 0, 8, 6, 0.5},
+            {kU, 3, 4, 8, 16, 8, 1.0},
+            {kP, 4, 5, 8, 8, 5, 0.5},
+            {kP, 5, 5, 8, 16, 8, 1.0},
+        };
+    for (const auto& [type, quality, height, fullHeight, widthSeen, heightSeen, scale] : cases)
     {
-        FieldType mType;
-        std::uint32_t mQuality;
-        std::uint32_t mHeight;
-        std::uint32_t mFullHeight;
-        std::uint32_t mWidthSeen;
-        std::uint32_t mHeightSeen;
-        double mScale;
-    } cases[] = {
-        {kU, 2, 4, 8, 8, 4, 0.5},
-        {kL, 2, 5, 8, 8, 6, 6.0 / 8.0},
-        // An unset quality (all bits) counts as below 3 when compared signed.
-        {kL, 0xFFFFFFFFu, 5, 8, 8, 6, 6.0 / 8.0},
-        // Without a full-frame height the scale stays as requested.
-        {kL, 1, 5, 0, 8, 6, 0.5},
-        {kU, 3, 4, 8, 16, 8, 1.0},
-        {kP, 4, 5, 8, 8, 5, 0.5},
-        {kP, 5, 5, 8, 16, 8, 1.0},
-    };
-    for (const auto& testCase : cases)
-    {
-        SCOPED_TRACE(testing::Message() << testCase.mType << " q" << testCase.mQuality);
-        mParams.mQuality = testCase.mQuality;
-        mParams.mHeight = testCase.mHeight;
-        mParams.mFullFrameHeight = testCase.mFullHeight;
+        SCOPED_TRACE(testing::Message() << type << " q" << quality);
+        std::tie(mParams.mQuality, mParams.mHeight, mParams.mFullFrameHeight) =
+            std::tuple(quality, height, fullHeight);
         const MF::FrameTime time(Ticks(kFrameTicks), Ticks(kFrameTicks + kFieldTicks));
-        Source(testCase.mType)->RenderFrame(time, mParams, mFrame);
+        Source(type)->RenderFrame(time, mParams, mFrame);
         ASSERT_TRUE(mFrame);
         const ML::CutlistRenderParams seen = ProducerOf(mNodes[0]).LastParams();
-        const bool full = testCase.mWidthSeen == 16;
+        const bool full = widthSeen == 16;
         EXPECT_EQ(std::tuple(seen.mWidth, seen.mHeight, seen.mVerticalScale, seen.mHorizontalScale),
-                  std::tuple(testCase.mWidthSeen, testCase.mHeightSeen, testCase.mScale,
-                             full ? 1.0 : 0.5));
+                  std::tuple(widthSeen, heightSeen, scale, full ? 1.0 : 0.5));
         EXPECT_EQ(seen.mPixelAspectRatio, full ? mvxmediatypes::kPixelAspectRatio_D1PAL
                                                : mvxmediatypes::kPixelAspectRatio_Square);
-        EXPECT_EQ(std::tuple(seen.mFieldType, seen.mFrameRate, seen.GetFrameTime()),
-                  std::tuple(static_cast<std::uint32_t>(testCase.mType),
-                             mvxmediatypes::kFrameRate_Video25, time));
-        EXPECT_EQ(mFrame->GetBounds().Height(), static_cast<std::int32_t>(testCase.mHeightSeen));
+        EXPECT_EQ(
+            std::tuple(seen.mFieldType, seen.mFrameRate, seen.GetFrameTime()),
+            std::tuple(static_cast<std::uint32_t>(type), mvxmediatypes::kFrameRate_Video25, time));
+        EXPECT_EQ(mFrame->GetBounds().Height(), static_cast<std::int32_t>(heightSeen));
     }
 }
 

@@ -20,19 +20,13 @@ TEST(RequestIDTest, IdentifiersStartAtTwoAndTheWrapSkipsZero)
     EXPECT_EQ(kSecondIDAfterLoad, 3u);
     // 0 means "no request": past the top the counter goes on at 1, also from
     // a counter left at the top.
-    const struct
+    const std::pair<unsigned int, std::vector<unsigned int>> cases[] = {
+        {0xFFFFFFFEu, {0xFFFFFFFFu, 1, 2}}, {0xFFFFFFFFu, {1}}};
+    for (const auto& [last, ids] : cases)
     {
-        unsigned int mLast;
-        std::vector<unsigned int> mExpected;
-    } cases[] = {
-        {0xFFFFFFFEu, {0xFFFFFFFFu, 1, 2}},
-        {0xFFFFFFFFu, {1}},
-    };
-    for (const auto& testCase : cases)
-    {
-        ML::ModuleInternals::SetLastRequestID(testCase.mLast);
-        for (unsigned int expected : testCase.mExpected)
-            EXPECT_EQ(ML::GetNextRequestID(), expected) << "after " << testCase.mLast;
+        ML::ModuleInternals::SetLastRequestID(last);
+        for (unsigned int expected : ids)
+            EXPECT_EQ(ML::GetNextRequestID(), expected) << "after " << last;
     }
 }
 

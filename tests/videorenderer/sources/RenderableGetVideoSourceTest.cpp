@@ -54,26 +54,18 @@ TEST_F(RenderableGetVideoSourceTest, RatesFollowKindStillAndSourceFieldType)
     const ScriptedSourceRef scripted = MakeScriptedSource();
     const SourceRef source = Make(scripted, {});
     const std::int32_t clip = BE::Deprecated::kMediaInfoKind_Clip;
-    const struct
-    {
-        mt::FieldType mFieldType;
-        bool mStill;
-        std::int32_t mKind;
-        FrameRate mRate, mFieldRate;
-    } cases[] = {
+    const std::tuple<mt::FieldType, bool, std::int32_t, FrameRate, FrameRate> cases[] = {
         {kProg, false, clip, k25, k25},
         {kLower, false, clip, k25, k50},
         {kUpper, true, clip, k1000, k1000},
         {kUpper, false, BE::Deprecated::kMediaInfoKind_TimeInvariant, kNoRate, kNoRate},
     };
-    for (const auto& c : cases)
+    for (const auto& [fieldType, still, kind, rate, fieldRate] : cases)
     {
-        SCOPED_TRACE(testing::Message() << c.mFieldType << " still " << c.mStill);
-        scripted->mFieldType = c.mFieldType;
-        scripted->mStill = c.mStill;
-        scripted->mKind = c.mKind;
-        EXPECT_EQ(RateOf(*source), c.mRate);
-        EXPECT_EQ(FieldRateOf(*source), c.mFieldRate);
+        std::tie(scripted->mFieldType, scripted->mStill, scripted->mKind) =
+            std::tuple(fieldType, still, kind);
+        EXPECT_EQ(std::pair(RateOf(*source), FieldRateOf(*source)), std::pair(rate, fieldRate))
+            << fieldType << " still " << still;
     }
 }
 
@@ -115,18 +107,13 @@ TEST_F(RenderableGetVideoSourceTest, ConvertsTimeByFrameNumberOnlyBetweenVideoRa
     const MF::FrameTime time(Ticks(kFrame25 * 9 + 3));
     const Declaration noRate{.mOrigin = Ticks(300), .mInvertAlpha = true, .mFrameRate = kNoRate};
     // Still rates are not numbered against video rates, nor is a clip without a rate.
-    const struct
-    {
-        FrameRate mSourceRate;
-        Declaration mDeclaration;
-        std::int64_t mTicks;
-    } cases[] = {
+    const std::tuple<FrameRate, Declaration, std::int64_t> cases[] = {
         {k50, {}, 9 * kField25}, {k1000, {}, kFrame25 * 9 + 3}, {k50, noRate, kFrame25 * 9 + 3}};
-    for (const auto& c : cases)
+    for (const auto& [rate, declaration, ticks] : cases)
     {
-        scripted->mFrameRate = c.mSourceRate;
-        Render(*Make(scripted, c.mDeclaration), time, MakeParams(2, 2));
-        EXPECT_EQ(scripted->DrawCalls().back().mTime.GetTicks(), c.mTicks);
+        scripted->mFrameRate = rate;
+        Render(*Make(scripted, declaration), time, MakeParams(2, 2));
+        EXPECT_EQ(scripted->DrawCalls().back().mTime.GetTicks(), ticks);
     }
     // The clip's arguments; quality 4 of the params is kRenderQuality_High.
     EXPECT_EQ(scripted->DrawCalls().back().mArguments,

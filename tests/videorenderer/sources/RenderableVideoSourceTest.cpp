@@ -80,24 +80,19 @@ TEST_F(RenderableVideoSourceTest, RatesFollowTheDeclarationTheSourceAndStills)
     // as-source declarations keep it.
     const FrameRate odd = FrameRate::Create(1'000'001);
     const FrameRate even = FrameRate::Create(1'000'002);
-    const struct
-    {
-        ScriptedSourceRef mSource;
-        mt::FieldType mDeclared;
-        FrameRate mDeclaredRate, mRate, mFieldRate;
-    } cases[] = {
+    // Source, declared field type and rate, frame rate, field rate.
+    const std::tuple<ScriptedSourceRef, mt::FieldType, FrameRate, FrameRate, FrameRate> cases[] = {
         {lower, kProg, k25, k25, k25},           {progressive, kUpper, k25, k25, k50},
         {lower, kAsSource, k25, k25, k50},       {progressive, kAsSource, k25, k25, k25},
         {still, kProg, k25, k1000, k1000},       {progressive, kLower, odd, even, even * 2},
         {progressive, kAsSource, odd, odd, odd},
     };
-    for (const auto& c : cases)
+    for (const auto& [scripted, declared, declaredRate, rate, fieldRate] : cases)
     {
-        SCOPED_TRACE(testing::Message() << "case " << &c - cases);
         const SourceRef source =
-            Make(c.mSource, {.mFrameRate = c.mDeclaredRate, .mFieldType = c.mDeclared});
-        EXPECT_EQ(RateOf(*source), c.mRate);
-        EXPECT_EQ(FieldRateOf(*source), c.mFieldRate);
+            Make(scripted, {.mFrameRate = declaredRate, .mFieldType = declared});
+        EXPECT_EQ(std::pair(RateOf(*source), FieldRateOf(*source)), std::pair(rate, fieldRate))
+            << declared << " " << declaredRate.GetFrameDuration().GetTicks();
     }
 }
 
@@ -109,41 +104,34 @@ TEST_F(RenderableVideoSourceTest, ConformsToTheFrameOrFieldGridInTheDeliveredOrd
     const MF::FrameTime upperRequest(Ticks(f2 + 10), Ticks(f2 + 10 + kField25));
     const MF::FrameTime interlaced(Ticks(7 * kFrame25 + 5), Ticks(7 * kFrame25 + 5 + kField25));
     const MF::FrameTime order1(Ticks(early), Ticks(early + kField25));
+    const MF::FrameTime order0(Ticks(early));
     const std::int32_t invariant = BE::Deprecated::kMediaInfoKind_TimeInvariant;
     const std::int32_t clip = BE::Deprecated::kMediaInfoKind_Clip;
     const FrameRate odd = FrameRate::Create(1'000'001);
     // Source field type, declared field type, media kind, declared rate,
     // request, conformed field times.
-    const struct
+    const std::tuple<mt::FieldType, mt::FieldType, std::int32_t, FrameRate, MF::FrameTime, TickPair>
+        cases[] = {
+            // Time-invariant media and clips without a rate: one frame at 0.
+            {kProg, kUpper, invariant, k25, interlaced, {0, 0}},
+            {kProg, kUpper, clip, kNoRate, interlaced, {0, 0}},
+            // Interlaced material: progressive requests on the field grid,
+            // interlaced ones on the frame grid in their order.
+            {kUpper, kAsSource, clip, k25, order0, {f4 + kField25, f4 + kField25}},
+            {kUpper, kAsSource, clip, k25, order1, {f4, f4 + kField25}},
+            {kProg, kAsSource, clip, k25, upperRequest, {f2, f2}},
+            // A declared order wins over the request's, also a progressive one.
+            {kProg, kLower, clip, k25, upperRequest, {f2 + kField25, f2}},
+            // An odd interlaced frame: fields half the stored frame apart.
+            {kProg, kUpper, clip, odd, MF::FrameTime(Ticks(1'000'003)), {1'000'002, 1'500'003}},
+        };
+    for (const auto& [fieldType, declared, kind, rate, request, conformed] : cases)
     {
-        mt::FieldType mSourceFieldType, mDeclared;
-        std::int32_t mKind;
-        FrameRate mDeclaredRate;
-        MF::FrameTime mRequest;
-        TickPair mConformed;
-    } cases[] = {
-        // Time-invariant media and clips without a rate: one frame at 0.
-        {kProg, kUpper, invariant, k25, interlaced, {0, 0}},
-        {kProg, kUpper, clip, kNoRate, interlaced, {0, 0}},
-        // Interlaced material: progressive requests on the field grid,
-        // interlaced ones on the frame grid in their order.
-        {kUpper, kAsSource, clip, k25, MF::FrameTime(Ticks(early)), {f4 + kField25, f4 + kField25}},
-        {kUpper, kAsSource, clip, k25, order1, {f4, f4 + kField25}},
-        {kProg, kAsSource, clip, k25, upperRequest, {f2, f2}},
-        // A declared order wins over the request's, also a progressive one.
-        {kProg, kLower, clip, k25, upperRequest, {f2 + kField25, f2}},
-        // An odd interlaced frame: fields half the stored frame apart.
-        {kProg, kUpper, clip, odd, MF::FrameTime(Ticks(1'000'003)), {1'000'002, 1'500'003}},
-    };
-    for (const auto& c : cases)
-    {
-        SCOPED_TRACE(testing::Message() << "request " << c.mRequest.GetTime().GetTicks());
         const ScriptedSourceRef scripted = MakeScriptedSource();
-        scripted->mFieldType = c.mSourceFieldType;
-        scripted->mKind = c.mKind;
-        const SourceRef source =
-            Make(scripted, {.mFrameRate = c.mDeclaredRate, .mFieldType = c.mDeclared});
-        EXPECT_EQ(TicksOf(Conform(*source, c.mRequest)), c.mConformed);
+        std::tie(scripted->mFieldType, scripted->mKind) = std::pair(fieldType, kind);
+        const SourceRef source = Make(scripted, {.mFrameRate = rate, .mFieldType = declared});
+        EXPECT_EQ(TicksOf(Conform(*source, request)), conformed)
+            << "request " << request.GetTime().GetTicks();
     }
     // A still conforms without aligning; a real time-invariant pattern to 0.
     const ScriptedSourceRef still = MakeScriptedSource();
@@ -197,33 +185,24 @@ TEST_F(RenderableVideoSourceTest, AlphaIsMadeStraightInvertedOrIgnoredAsDeclared
     // Only the colour bytes count: an alpha byte alone is still a black matte.
     const QRT::ParamColor black = QRT::ParamColor::FromRGBA(0, 0, 0, 0xFF);
     const Pixel opaque{0x99, 0x66, 0x33, 255};
-    const struct
+    // Media, alpha kind, matte, ignore and invert alpha, pixel.
+    const std::tuple<const std::string&, mt::AlphaChannel, QRT::ParamColor, bool, bool, Pixel>
+        cases[] = {
+            {overBlack, pre, black, false, false, {0, 0, 255, 128}},
+            {overBlue, pre, blue, false, false, {0, 0, 255, 128}},
+            // The blue matte taken as black.
+            {overBlue, pre, {}, false, false, {253, 0, 255, 128}},
+            // Ignoring wins over inverting and over premultiplied.
+            {straight, plain, {}, true, true, opaque},
+            {straight, plain, {}, false, true, {0x99, 0x66, 0x33, 191}},
+        };
+    for (const auto& [media, kind, matte, ignore, invert, expected] : cases)
     {
-        const std::string& mMedia;
-        mt::AlphaChannel mKind;
-        QRT::ParamColor mMatte;
-        bool mIgnore, mInvert;
-        Pixel mExpected;
-    } cases[] = {
-        {overBlack, pre, black, false, false, {0, 0, 255, 128}},
-        {overBlue, pre, blue, false, false, {0, 0, 255, 128}},
-        // The blue matte taken as black.
-        {overBlue, pre, {}, false, false, {253, 0, 255, 128}},
-        // Ignoring wins over inverting and over premultiplied.
-        {straight, plain, {}, true, true, opaque},
-        {straight, plain, {}, false, true, {0x99, 0x66, 0x33, 191}},
-    };
-    for (const auto& c : cases)
-    {
-        SCOPED_TRACE(testing::Message() << c.mMedia << " " << c.mIgnore << c.mInvert);
-        const Declaration declaration{.mAlphaKind = c.mKind,
-                                      .mMatte = c.mMatte,
-                                      .mIgnoreAlpha = c.mIgnore,
-                                      .mInvertAlpha = c.mInvert};
-        const FrameRef frame =
-            Render(*Make(OpenPattern(c.mMedia), declaration), MF::FrameTime(), MakeParams(8, 4, 5));
-        EXPECT_TRUE(AllPixelsAre(frame, c.mExpected));
-        EXPECT_TRUE(c.mIgnore || c.mInvert || frame->GetAlphaChannel() == plain);
+        SCOPED_TRACE(testing::Message() << media << " " << ignore << invert);
+        const FrameRef frame = Render(*Make(OpenPattern(media), {kind, matte, ignore, invert}),
+                                      MF::FrameTime(), MakeParams(8, 4, 5));
+        EXPECT_TRUE(AllPixelsAre(frame, expected));
+        EXPECT_TRUE(ignore || invert || frame->GetAlphaChannel() == plain);
     }
 }
 
@@ -257,29 +236,25 @@ TEST_F(RenderableVideoSourceTest, PixelAspectRatioIsAdjustedForNonUniformDeliver
     const ScriptedSourceRef scripted = Handing(delivered);
     const PixelAspectRatio ntsc(10, 11);
     const PixelAspectRatio square = mt::kPixelAspectRatio_Square;
-    const struct
+    // Declared ratio, requested size, ratio of the frame, whether it is the delivered one.
+    const std::tuple<PixelAspectRatio, std::uint32_t, std::uint32_t, PixelAspectRatio, bool>
+        cases[] = {
+            // Half the columns of a 720x480 request: pixels twice as wide.
+            {ntsc, 720, 480, PixelAspectRatio(20, 11), false},
+            // Uniform delivery keeps the declared ratio; a request without a size too.
+            // A frame that already has the ratio is handed on untouched, and a
+            // clip that accepts any ratio keeps the source's.
+            {PixelAspectRatio(2, 2), 360, 480, square, true},
+            {mt::kPixelAspectRatio_Any, 720, 480, square, true},
+        };
+    for (const auto& [declared, width, height, expected, same] : cases)
     {
-        PixelAspectRatio mDeclared;
-        std::uint32_t mWidth, mHeight;
-        PixelAspectRatio mExpected;
-        bool mSameFrame;
-    } cases[] = {
-        // Half the columns of a 720x480 request: pixels twice as wide.
-        {ntsc, 720, 480, PixelAspectRatio(20, 11), false},
-        // Uniform delivery keeps the declared ratio; a request without a size too.
-        // A frame that already has the ratio is handed on untouched, and a
-        // clip that accepts any ratio keeps the source's.
-        {PixelAspectRatio(2, 2), 360, 480, square, true},
-        {mt::kPixelAspectRatio_Any, 720, 480, square, true},
-    };
-    for (const auto& c : cases)
-    {
-        SCOPED_TRACE(testing::Message() << c.mWidth << "x" << c.mHeight);
-        const FrameRef frame = Render(*Make(scripted, {.mRatio = c.mDeclared}), MF::FrameTime(),
-                                      MakeParams(c.mWidth, c.mHeight, 5));
+        const FrameRef frame = Render(*Make(scripted, {.mRatio = declared}), MF::FrameTime(),
+                                      MakeParams(width, height, 5));
         ASSERT_TRUE(frame);
-        EXPECT_EQ(frame->GetPixelAspectRatio(), c.mExpected);
-        EXPECT_EQ(frame == delivered, c.mSameFrame);
+        EXPECT_EQ(std::pair(frame->GetPixelAspectRatio(), frame == delivered),
+                  std::pair(expected, same))
+            << width << "x" << height;
     }
     EXPECT_EQ(delivered->GetPixelAspectRatio(), square);
 }

@@ -418,10 +418,10 @@ public:
     std::int32_t mKind = BE::Deprecated::kMediaInfoKind_Clip;
     std::vector<mt::PixelFormat> mPixelFormats = {mt::kPixelFormat_BGRA_4444_8u};
     // A read answers mFrameStatus and on success mFrame, or with mNewFrames a new 4x2 frame per
-    // read. Frames read are held (when mHoldsReadFrames) and answer kFrameRequestFlag_NoBlock.
+    // read. Frames read are held and answer kFrameRequestFlag_NoBlock.
     QRT::Result mFrameStatus = QRT::kResult_Success;
     FrameRef mFrame;
-    bool mNewFrames = false, mHoldsReadFrames = true;
+    bool mNewFrames = false;
     // DrawVideoFrame answers mDrawStatus.
     QRT::Result mDrawStatus = QRT::kResult_Success;
     bool mPrefetchWanted = false;
@@ -498,7 +498,7 @@ public:
         if (QRT::Failed(mFrameStatus))
             return mFrameStatus;
         outFrame = mNewFrames ? MakeFilledFrame(4, 2, Pixel{}) : mFrame;
-        if (outFrame && mHoldsReadFrames)
+        if (outFrame)
             mHeld[inTime.GetTicks()] = outFrame;
         return QRT::kResult_Success;
     }
