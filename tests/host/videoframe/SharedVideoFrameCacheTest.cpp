@@ -5,6 +5,7 @@
 
 #include <atomic>
 #include <cstdlib>
+#include <optional>
 #include <thread>
 
 #include <gtest/gtest.h>
@@ -98,6 +99,77 @@ TEST_F(SharedVideoFrameCacheTest, EvictsPriorityZeroBeforeTenThenTheLeastRecentl
     ASSERT_TRUE(mCache.RetrieveFromCache(KeyFor(2)));
     Insert(5, VF::kCachePriority_High);
     EXPECT_EQ(Held(6), (Keys{2, 4, 5}));
+}
+
+TEST_F(SharedVideoFrameCacheTest, LowClassKeepsToItsAllowanceByRecencyAndPinsHoldAgainstBoth)
+{
+    // Budget four frames, low-priority allowance two. Each step, then the keys held after it
+    // (looked up without touching recency).
+    enum Op
+    {
+        kHigh,
+        kLow,
+        kPinnedLow, // pinned, then inserted at the low priority
+        kPin,
+        kUnpin,
+        kRetrieve
+    };
+    const struct
+    {
+        Op mOp;
+        uint32_t mKey;
+        Keys mHeld;
+    } steps[] = {
+        {kHigh, 0, {0}},
+        {kLow, 1, {0, 1}},
+        {kLow, 2, {0, 1, 2}},
+        {kLow, 3, {0, 2, 3}}, // the oldest low frame goes; the older high one stays
+        {kRetrieve, 2, {0, 2, 3}},
+        {kLow, 4, {0, 2, 4}},       // 3 is now the least recently used low frame
+        {kPinnedLow, 5, {0, 4, 5}}, // pinned frames count, unpinned ones make room
+        {kPin, 4, {0, 4, 5}},
+        {kLow, 6, {0, 4, 5}},      // every other low frame is pinned: the newcomer goes
+        {kHigh, 7, {0, 4, 5, 7}},  // the allowance does not limit the high class
+        {kHigh, 8, {4, 5, 7, 8}},  // over the budget with the low class pinned: oldest high goes
+        {kUnpin, 5, {4, 5, 7, 8}}, // within the allowance: nothing to evict
+        {kUnpin, 4, {4, 5, 7, 8}},
+        {kLow, 9, {5, 7, 8, 9}}, // over both: the least recently used low frame goes
+    };
+    VF::VideoFrameCache cache(4 * kFrameBytes, true, 2 * kFrameBytes);
+    for (const auto& step : steps)
+    {
+        SCOPED_TRACE(step.mKey);
+        const Guid key = KeyFor(step.mKey);
+        if (step.mOp == kPin || step.mOp == kPinnedLow)
+            cache.RegisterDependencyOnFrame(key);
+        if (step.mOp == kUnpin)
+            cache.UnregisterDependencyOnFrame(key);
+        if (step.mOp == kRetrieve)
+        {
+            EXPECT_TRUE(cache.RetrieveFromCache(key));
+        }
+        if (step.mOp == kHigh || step.mOp == kLow || step.mOp == kPinnedLow)
+            cache.InsertIntoCache(MakeTagged(uint8_t(step.mKey)), key,
+                                  step.mOp == kHigh ? VF::kCachePriority_High : 0);
+        Keys held;
+        for (uint32_t i = 0; i < 10; ++i)
+            if (cache.GetCachedPriority(KeyFor(i)))
+                held.push_back(i);
+        EXPECT_EQ(held, step.mHeld);
+    }
+    EXPECT_EQ(std::tuple(cache.GetCachedPriority(KeyFor(9)), cache.GetCachedPriority(KeyFor(8)),
+                         cache.GetStatistics().mLowPriorityBytes),
+              std::tuple(std::optional<int32_t>(0), std::optional<int32_t>(10), 2 * kFrameBytes));
+    // Lowering the allowance evicts at once; the default allowance is a few HD frames.
+    cache.SetLowPriorityByteBudget(kFrameBytes);
+    EXPECT_EQ(std::tuple(bool(cache.GetCachedPriority(KeyFor(5))), cache.GetStatistics().mFrames),
+              std::tuple(false, 3u));
+    EXPECT_EQ(std::pair(VF::VideoFrameCache::GetDefaultLowPriorityByteBudget(size_t{4} << 30),
+                        VF::VideoFrameCache::GetDefaultLowPriorityByteBudget(size_t{64} << 20)),
+              std::pair(size_t{32} << 20, size_t{8} << 20));
+    EXPECT_EQ(VF::SharedVideoFrameCache::GetInstance().GetLowPriorityByteBudget(),
+              VF::VideoFrameCache::GetDefaultLowPriorityByteBudget(
+                  VF::SharedVideoFrameCache::GetInstance().GetByteBudget()));
 }
 
 TEST_F(SharedVideoFrameCacheTest, BudgetHoldsAfterEveryInsertion)
