@@ -172,6 +172,43 @@ TEST_F(SharedVideoFrameCacheTest, LowClassKeepsToItsAllowanceByRecencyAndPinsHol
                   VF::SharedVideoFrameCache::GetInstance().GetByteBudget()));
 }
 
+TEST_F(SharedVideoFrameCacheTest, ConcurrentUseKeepsTheClassesAccountedAndWithinBounds)
+{
+    // Four threads insert both classes over shared keys, pin, unpin and retrieve; afterwards
+    // the byte counts match the frames held and both limits hold.
+    VF::VideoFrameCache cache(12 * kFrameBytes, true, 3 * kFrameBytes);
+    std::vector<std::thread> threads;
+    for (uint32_t t = 0; t < 4; ++t)
+        threads.emplace_back(
+            [&cache, t]
+            {
+                for (uint32_t i = 0; i < 2000; ++i)
+                {
+                    const Guid key = KeyFor((i * 7 + t) % 40);
+                    if (i % 5 == 0)
+                        cache.RegisterDependencyOnFrame(key);
+                    cache.InsertIntoCache(MakeTagged(0), key, (i + t) % 3 == 0 ? 10 : 0);
+                    cache.RetrieveFromCache(KeyFor(i % 40));
+                    if (i % 5 == 0)
+                        cache.UnregisterDependencyOnFrame(key);
+                }
+            });
+    for (std::thread& thread : threads)
+        thread.join();
+    uint64_t low = 0, all = 0;
+    for (uint32_t i = 0; i < 40; ++i)
+        if (const std::optional<int32_t> priority = cache.GetCachedPriority(KeyFor(i)))
+        {
+            all += kFrameBytes;
+            low += *priority < VF::kCachePriority_High ? kFrameBytes : 0;
+        }
+    const VF::FrameCacheStatistics s = cache.GetStatistics();
+    EXPECT_EQ(std::tuple(s.mBytes, s.mLowPriorityBytes, s.mFrames),
+              std::tuple(all, low, all / kFrameBytes));
+    EXPECT_LE(s.mBytes, 12 * kFrameBytes);
+    EXPECT_LE(s.mLowPriorityBytes, 3 * kFrameBytes);
+}
+
 TEST_F(SharedVideoFrameCacheTest, BudgetHoldsAfterEveryInsertion)
 {
     VF::VideoFrameCache cache(10 * kFrameBytes + 100, true);
