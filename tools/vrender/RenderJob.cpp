@@ -11,6 +11,7 @@
 #include "ML/VideoRenderer.h"
 #include "OrderingWindow.h"
 #include "Progress.h"
+#include "VF/FrameCachePriority.h"
 #include "VF/VideoFrame.h"
 #include "VF/VideoFrameManipulators.h"
 #include "mvxcore/threads/ExecutorFactories.h"
@@ -419,6 +420,9 @@ private:
         params.mFullFramePixelAspectRatio = stream.mPixelAspectRatio;
         params.mFrameRate = stream.mFrameRate;
         params.mFieldType = static_cast<std::uint32_t>(stream.mFieldType);
+        // One pass over the material: its frames are not asked for again,
+        // except by neighbours, which the cache's low-priority allowance keeps.
+        params.mCachePriority = VF::kCachePriority_Low;
         MF::FrameTime conformed;
         mState->mSource->ConformFrameTime(requested, params, conformed);
         params.SetFrameTime(conformed);

@@ -22,6 +22,11 @@ bool DisabledByEnvironment()
     return value != nullptr && std::strcmp(value, "1") == 0;
 }
 
+bool IsLowClass(int32_t inPriority)
+{
+    return inPriority < kCachePriority_High;
+}
+
 // Orders eviction candidates: lower priority first, then older use.
 bool IsBetterVictim(int32_t inPriority, uint64_t inLastUse, int32_t inBestPriority,
                     uint64_t inBestLastUse)
@@ -44,15 +49,32 @@ size_t VideoFrameCache::GetDefaultByteBudget()
     return std::min(quarter, size_t{4} << 30);
 }
 
+size_t VideoFrameCache::GetDefaultLowPriorityByteBudget(size_t inByteBudget) noexcept
+{
+    // A handful of HD frames: what a frame blend or a field filter of an
+    // export asks for again, not the export itself.
+    return std::min(size_t{32} << 20, inByteBudget / 8);
+}
+
 VideoFrameCache::VideoFrameCache()
-    : VideoFrameCache(GetDefaultByteBudget(), !DisabledByEnvironment())
+    : VideoFrameCache(GetDefaultByteBudget(), !DisabledByEnvironment(),
+                      GetDefaultLowPriorityByteBudget(GetDefaultByteBudget()))
 {
 }
 
-VideoFrameCache::VideoFrameCache(size_t inByteBudget, bool inEnabled)
+VideoFrameCache::VideoFrameCache(size_t inByteBudget, bool inEnabled,
+                                 size_t inLowPriorityByteBudget)
     : mEnabled(inEnabled)
     , mByteBudget(inByteBudget)
+    , mLowPriorityByteBudget(inLowPriorityByteBudget)
 {
+}
+
+bool VideoFrameCache::IsOverBudget() const noexcept
+{
+    return mBytes.load(std::memory_order_relaxed) > mByteBudget.load(std::memory_order_relaxed) ||
+           mLowPriorityBytes.load(std::memory_order_relaxed) >
+               mLowPriorityByteBudget.load(std::memory_order_relaxed);
 }
 
 VideoFrameCache::~VideoFrameCache() = default;
@@ -118,11 +140,13 @@ void VideoFrameCache::InsertIntoCache(const FrameRef& inFrame, const Guid& inKey
             entry.mPriority = inPriority;
             entry.mLastUse = mUseClock.fetch_add(1, std::memory_order_relaxed) + 1;
             mBytes.fetch_add(bytes, std::memory_order_relaxed);
+            if (IsLowClass(inPriority))
+                mLowPriorityBytes.fetch_add(bytes, std::memory_order_relaxed);
             mFrames.fetch_add(1, std::memory_order_relaxed);
         }
         mInsertions.fetch_add(1, std::memory_order_relaxed);
         replaced.Reset();
-        if (mBytes.load(std::memory_order_relaxed) > mByteBudget.load(std::memory_order_relaxed))
+        if (IsOverBudget())
             EvictToBudget();
     }
     std::shared_ptr<const FrameCacheNotification> notification;
@@ -142,6 +166,8 @@ void VideoFrameCache::RemoveFrameLocked(Shard& inShard, Entry& ioEntry, const Gu
     if (lists->second.empty())
         inShard.mRecency.erase(lists);
     mBytes.fetch_sub(ioEntry.mBytes, std::memory_order_relaxed);
+    if (IsLowClass(ioEntry.mPriority))
+        mLowPriorityBytes.fetch_sub(ioEntry.mBytes, std::memory_order_relaxed);
     mFrames.fetch_sub(1, std::memory_order_relaxed);
     outFrame = std::move(ioEntry.mFrame);
     ioEntry.mFrame.Reset();
@@ -172,8 +198,10 @@ void VideoFrameCache::EvictToBudget()
 {
     std::lock_guard evictionLock(mEvictionMutex);
     std::vector<FrameRef> evicted;
-    while (mBytes.load(std::memory_order_relaxed) > mByteBudget.load(std::memory_order_relaxed))
+    while (IsOverBudget())
     {
+        const bool overBudget =
+            mBytes.load(std::memory_order_relaxed) > mByteBudget.load(std::memory_order_relaxed);
         bool found = false;
         Victim best;
         for (size_t index = 0; index < kShardCount; ++index)
@@ -192,6 +220,10 @@ void VideoFrameCache::EvictToBudget()
         }
         if (!found)
             break; // only pinned frames are left
+        // Only the low class is over its allowance, and every frame of it
+        // left is pinned: the best victim is of the high class.
+        if (!overBudget && !IsLowClass(best.mPriority))
+            break;
         Shard& shard = mShards[best.mShard];
         std::lock_guard lock(shard.mMutex);
         auto entry = shard.mEntries.find(best.mKey);
@@ -235,9 +267,9 @@ void VideoFrameCache::UnregisterDependencyOnFrame(const Guid& inKey)
                 shard.mEntries.erase(found);
         }
     }
-    // A pinned frame may have held the cache above its budget.
-    if (unpinned &&
-        mBytes.load(std::memory_order_relaxed) > mByteBudget.load(std::memory_order_relaxed))
+    // A pinned frame may have held the cache above its budget or the low
+    // class above its allowance.
+    if (unpinned && IsOverBudget())
         EvictToBudget();
 }
 
@@ -247,6 +279,16 @@ uint32_t VideoFrameCache::GetDependencyCount(const Guid& inKey) const
     std::lock_guard lock(shard.mMutex);
     auto found = shard.mEntries.find(inKey);
     return found == shard.mEntries.end() ? 0 : found->second.mDependencies;
+}
+
+std::optional<int32_t> VideoFrameCache::GetCachedPriority(const Guid& inKey) const
+{
+    Shard& shard = ShardFor(inKey);
+    std::lock_guard lock(shard.mMutex);
+    auto found = shard.mEntries.find(inKey);
+    if (found == shard.mEntries.end() || !found->second.mFrame)
+        return std::nullopt;
+    return found->second.mPriority;
 }
 
 void VideoFrameCache::SetNotificationFunction(FrameCacheNotification inFunction)
@@ -296,6 +338,17 @@ size_t VideoFrameCache::GetByteBudget() const noexcept
     return mByteBudget.load(std::memory_order_relaxed);
 }
 
+void VideoFrameCache::SetLowPriorityByteBudget(size_t inBytes)
+{
+    mLowPriorityByteBudget.store(inBytes, std::memory_order_relaxed);
+    EvictToBudget();
+}
+
+size_t VideoFrameCache::GetLowPriorityByteBudget() const noexcept
+{
+    return mLowPriorityByteBudget.load(std::memory_order_relaxed);
+}
+
 FrameCacheStatistics VideoFrameCache::GetStatistics() const noexcept
 {
     FrameCacheStatistics statistics;
@@ -306,6 +359,7 @@ FrameCacheStatistics VideoFrameCache::GetStatistics() const noexcept
     statistics.mEvictions = mEvictions.load(std::memory_order_relaxed);
     statistics.mBytes = mBytes.load(std::memory_order_relaxed);
     statistics.mFrames = mFrames.load(std::memory_order_relaxed);
+    statistics.mLowPriorityBytes = mLowPriorityBytes.load(std::memory_order_relaxed);
     return statistics;
 }
 

@@ -2,6 +2,7 @@
 
 #include "ContractExpect.h"
 #include "FrameTestSupport.h"
+#include "VF/SharedVideoFrameCache.h"
 
 #include <gtest/gtest.h>
 
@@ -45,6 +46,36 @@ TEST_F(FrameMemoryPoolTest, CapTrimsLeastRecentlyReturnedFirstAndRefusesLargerBu
     // Zero bytes is a contract error; returning an empty buffer is ignored.
     EXPECT_INPUT_CONTRACT(pool.Acquire(0), "inBytes > 0");
     pool.Return(VF::PoolBuffer{});
+}
+
+TEST_F(FrameMemoryPoolTest, ReleasedFrameBufferServesTheNextFrameOfItsSizeWithoutAFill)
+{
+    // Whoever lets the frame go last (its holder; the cache, evicting it from an allowance of
+    // 0 once unpinned, or clearing), its buffer returns to the shared pool and the next frame
+    // of its size takes it as it was left; asked for, a clear zeroes it.
+    VF::VideoFrameCache cache(size_t{1} << 20, true, 0);
+    const mvxcore::utility::Guid key(7, 7, 7, {7, 7, 7, 7, 7, 7, 7, 7});
+    for (const int release : {0, 1, 2})
+    {
+        SCOPED_TRACE(release);
+        Frame frame = MakeFrame(mt::kPixelFormat_BGRA_4444_8u, 90, 50, false);
+        const uint64_t reuses = VF::FrameMemoryPool::GetShared().GetStatistics().mReuses;
+        FillBytes(*frame, uint8_t(0xA0 + release));
+        const void* const memory = frame->GetBaseAddress();
+        cache.RegisterDependencyOnFrame(key);
+        if (release != 0)
+            cache.InsertIntoCache(frame, key, release == 1 ? 0 : 10);
+        frame.Reset();
+        EXPECT_EQ(bool(cache.RetrieveFromCache(key)), release != 0); // pinned, it stays
+        cache.UnregisterDependencyOnFrame(key);
+        if (release == 2)
+            cache.Clear();
+        Frame next = MakeFrame(mt::kPixelFormat_BGRA_4444_8u, 90, 50, release == 2);
+        EXPECT_EQ(std::tuple(next->GetBaseAddress(),
+                             AllBytesAre(*next, release == 2 ? 0 : 0xA0 + release),
+                             VF::FrameMemoryPool::GetShared().GetStatistics().mReuses),
+                  std::tuple(memory, true, reuses + 1));
+    }
 }
 
 } // namespace

@@ -5,6 +5,7 @@
 
 #include <atomic>
 #include <cstdlib>
+#include <optional>
 #include <thread>
 
 #include <gtest/gtest.h>
@@ -92,6 +93,89 @@ TEST_F(SharedVideoFrameCacheTest,
     ASSERT_TRUE(mCache.RetrieveFromCache(KeyFor(2)));
     Insert(5, VF::kCachePriority_High);
     EXPECT_EQ(Held(6), (Keys{2, 4, 5}));
+}
+
+TEST_F(SharedVideoFrameCacheTest, LowClassKeepsToItsAllowanceByRecencyAndPinsHoldAgainstBoth)
+{
+    // Budget four frames, low-priority allowance two. Each step: an operation on a key (H, L:
+    // insert at the high or the low priority; P, U: pin, unpin; R: retrieve), then the keys held
+    // (looked up without touching recency).
+    const std::tuple<char, uint32_t, Keys> steps[] = {
+        {'H', 0, {0}},
+        {'L', 1, {0, 1}},
+        {'L', 2, {0, 1, 2}},
+        {'L', 3, {0, 2, 3}}, // the oldest low frame goes; the older high one stays
+        {'R', 2, {0, 2, 3}},
+        {'L', 4, {0, 2, 4}}, // 3 is now the least recently used
+        {'P', 5, {0, 2, 4}},
+        {'L', 5, {0, 4, 5}}, // a pinned frame counts, others make room
+        {'P', 4, {0, 4, 5}},
+        {'L', 6, {0, 4, 5}},    // the others pinned: the newcomer goes
+        {'H', 7, {0, 4, 5, 7}}, // the allowance does not limit the high class
+        {'H', 8, {4, 5, 7, 8}}, // over the budget, the low class pinned: the oldest high goes
+        {'U', 5, {4, 5, 7, 8}},
+        {'U', 4, {4, 5, 7, 8}},
+        {'L', 9, {5, 7, 8, 9}}, // over both: the least recently used low frame goes
+    };
+    VF::VideoFrameCache cache(4 * kFrameBytes, true, 2 * kFrameBytes);
+    for (const auto& [op, index, expected] : steps)
+    {
+        SCOPED_TRACE(index);
+        const Guid key = KeyFor(index);
+        if (op == 'P')
+            cache.RegisterDependencyOnFrame(key);
+        if (op == 'U')
+            cache.UnregisterDependencyOnFrame(key);
+        if (op == 'R' && !cache.RetrieveFromCache(key))
+            ADD_FAILURE() << "not held";
+        if (op == 'H' || op == 'L')
+            cache.InsertIntoCache(MakeTagged(uint8_t(index)), key, op == 'H' ? 10 : 0);
+        Keys held;
+        for (uint32_t i = 0; i < 10; ++i)
+            if (cache.GetCachedPriority(KeyFor(i)))
+                held.push_back(i);
+        EXPECT_EQ(held, expected);
+    }
+    EXPECT_EQ(std::tuple(cache.GetCachedPriority(KeyFor(9)), cache.GetCachedPriority(KeyFor(8)),
+                         cache.GetStatistics().mLowPriorityBytes),
+              std::tuple(std::optional<int32_t>(0), std::optional<int32_t>(10), 2 * kFrameBytes));
+    // Lowering the allowance evicts at once; the shared cache's default is a few HD frames.
+    cache.SetLowPriorityByteBudget(kFrameBytes);
+    EXPECT_FALSE(cache.GetCachedPriority(KeyFor(5)));
+    EXPECT_EQ(VF::VideoFrameCache::GetDefaultLowPriorityByteBudget(size_t{4} << 30), 32u << 20);
+    EXPECT_EQ(VF::SharedVideoFrameCache::GetInstance().GetLowPriorityByteBudget(),
+              VF::VideoFrameCache::GetDefaultLowPriorityByteBudget(
+                  VF::SharedVideoFrameCache::GetInstance().GetByteBudget()));
+}
+
+TEST_F(SharedVideoFrameCacheTest, ConcurrentUseKeepsTheClassesAccountedAndWithinBounds)
+{
+    // Four threads insert both classes over shared keys, pinning some; afterwards the byte
+    // counts match the frames held and both limits hold.
+    VF::VideoFrameCache cache(12 * kFrameBytes, true, 3 * kFrameBytes);
+    std::vector<std::thread> threads;
+    for (uint32_t t = 0; t < 4; ++t)
+        threads.emplace_back(
+            [&cache, t]
+            {
+                for (uint32_t i = 0; i < 2000; ++i)
+                {
+                    const Guid key = KeyFor((i * 7 + t) % 40);
+                    cache.RegisterDependencyOnFrame(key);
+                    cache.InsertIntoCache(MakeTagged(0), key, (i + t) % 3 == 0 ? 10 : 0);
+                    cache.RetrieveFromCache(KeyFor(i % 40));
+                    cache.UnregisterDependencyOnFrame(key);
+                }
+            });
+    for (std::thread& thread : threads)
+        thread.join();
+    uint64_t low = 0, all = 0;
+    for (uint32_t i = 0; i < 40; ++i)
+        if (const std::optional<int32_t> priority = cache.GetCachedPriority(KeyFor(i)))
+            (*priority < 10 ? low : all) += kFrameBytes;
+    const VF::FrameCacheStatistics s = cache.GetStatistics();
+    EXPECT_EQ(std::tuple(s.mBytes, s.mLowPriorityBytes), std::tuple(all + low, low));
+    EXPECT_TRUE(s.mBytes <= 12 * kFrameBytes && low <= 3 * kFrameBytes) << s.mBytes << " " << low;
 }
 
 TEST_F(SharedVideoFrameCacheTest, BudgetHoldsAfterEveryInsertion)

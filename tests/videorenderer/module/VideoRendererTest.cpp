@@ -1,12 +1,15 @@
 #include "ML/VideoRenderer.h"
 
+#include "../sources/ScriptedSources.h"
 #include "BrambleSupport/BrambleSupport.h"
 #include "ContractExpect.h"
 #include "ImporterHost/ImporterHost.h"
 #include "ML/RenderExecutors.h"
 #include "ML/RenderFrameQueue.h"
+#include "ML/RenderableVideoSources.h"
 #include "RecordingClient.h"
 #include "TestSource.h"
+#include "VF/SharedVideoFrameCache.h"
 #include "module/ModuleInternals.h"
 #include "mvxcore/debug/Contract.h"
 
@@ -284,6 +287,41 @@ TEST_F(VideoRendererTest, CancelWhilePrefetchIsInFlightReachesTheCallbackAsCance
     EXPECT_EQ(other->mPrefetch->mCancelCount.load(), 0);
     ML::VideoRenderer::Shutdown();
     EXPECT_EQ(mRecorder.Count(), 2u);
+}
+
+TEST_F(VideoRendererTest, SourceFramesGoIntoTheCacheAtTheRendersCachePriority)
+{
+    // An export reads its source frame at the low priority; playback of the same frame raises
+    // it to the high one, and a later export leaves it there.
+    const struct
+    {
+        std::int32_t mRender;
+        std::int32_t mCached;
+    } steps[] = {{VF::kCachePriority_Low, VF::kCachePriority_Low},
+                 {VF::kCachePriority_High, VF::kCachePriority_High},
+                 {VF::kCachePriority_Low, VF::kCachePriority_High}};
+    ML::VideoRenderer::Initialize();
+    VF::SharedVideoFrameCache::Clear();
+    const ML::Test::ScriptedSourceRef scripted = ML::Test::MakeScriptedSource();
+    scripted->mPrefetchWanted = scripted->mNewFrames = true;
+    const auto source = ML::CreateRenderableSource(
+        QRT::InterfaceRef<BE::Deprecated::IVideoSource>(scripted), {},
+        mvxmediatypes::kAlphaChannel_Straight, {}, false, false, mvxmediatypes::kFrameRate_Video25,
+        mvxmediatypes::kFieldType_Progressive, mvxmediatypes::kPixelAspectRatio_Square, {});
+    const MF::FrameTime time(TickTime::TicksToTime(0));
+    for (const auto& step : steps)
+    {
+        ML::CutlistRenderParams params = MakeParams(8, 8, time);
+        params.mCachePriority = step.mRender;
+        const unsigned int id = ML::GetNextRequestID();
+        ML::InitiateRender(source, time, params, id, mRecorder.Callback());
+        ASSERT_TRUE(WaitUntil([&] { return !mRecorder.Of(id).empty(); }));
+        EXPECT_EQ(mRecorder.Of(id)[0].mKind, Delivery::kComplete);
+        EXPECT_EQ(VF::SharedVideoFrameCache::GetInstance().GetCachedPriority(
+                      scripted->KeyFor(time.GetTime())),
+                  step.mCached);
+    }
+    ML::VideoRenderer::Shutdown();
 }
 
 } // namespace

@@ -227,6 +227,21 @@ TEST_F(RenderFrameQueueTest, RenderedFrameGoesToClientThenCompletionAndIsServedF
     ASSERT_TRUE(settings.mWaitable->WaitForSignal(std::chrono::seconds(20)));
     EXPECT_EQ(request.GetResult(), mRecorder.Get()[0].mFrame);
     EXPECT_EQ(client->mRecorder.Count() + mRecorder.Count(), 3u);
+    // Results go into the cache at the priority the request's class gives them.
+    std::size_t delivered = mRecorder.Count();
+    for (const auto& [priority, cachePriority] :
+         {std::pair{900u, VF::kCachePriority_High}, std::pair{810u, VF::kCachePriority_Low}})
+    {
+        auto ranked = MakeSettings(priority, NewProducer(priority), 64, 32,
+                                   mvxmediatypes::kPixelFormat_BGRA_4444_8u, priority);
+        ranked.mRenderFlags = ML::kRenderFlag_AlwaysCache;
+        ML::RenderFrameRequest probe = MakeRequest(ranked);
+        probe.ComputeKey(true);
+        Add(ranked);
+        ASSERT_TRUE(mRecorder.WaitForCount(++delivered));
+        EXPECT_EQ(VF::SharedVideoFrameCache::GetInstance().GetCachedPriority(probe.mKey),
+                  cachePriority);
+    }
 }
 
 TEST_F(RenderFrameQueueTest, AcceleratedRequestIsAnsweredByItsRendererOrCancelledAtOnce)

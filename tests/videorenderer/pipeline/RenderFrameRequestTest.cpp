@@ -167,6 +167,15 @@ TEST_F(RenderFrameRequestTest, RenderParamsCarryRequestFieldsAndProviderFieldTyp
     EXPECT_EQ(std::tuple(params.mQuality, params.mSecondaryQuality), std::tuple(4u, 4u));
     EXPECT_EQ(std::tuple(params.mCutlistChoiceBit, params.mCutlistParameter, params.mRenderFlags),
               std::tuple(1u, 77, 24u));
+    // The priority class gives the cache priority of the frames the render reads and makes.
+    for (const auto& [priority, cachePriority] :
+         {std::pair{1000u, VF::kCachePriority_High}, std::pair{811u, VF::kCachePriority_High},
+          std::pair{810u, VF::kCachePriority_Low}, std::pair{0u, VF::kCachePriority_Low}})
+    {
+        settings.mPriority = priority;
+        MakeRequest(settings).BuildRenderParams(true, params);
+        EXPECT_EQ(params.mCachePriority, cachePriority) << priority;
+    }
 
     // A provider's field type replaces the request's, unless it is "as source".
     settings.mFieldType = 1;

@@ -15,9 +15,10 @@ using PrefetchRef = QRT::InterfaceRef<IRenderableNodePrefetch>;
 class MediaNodePrefetcherTest : public PrefetchFixture
 {
 protected:
-    static PrefetchRef Make(const VideoSourceRef& inSource, std::int64_t inTicks)
+    static PrefetchRef Make(const VideoSourceRef& inSource, std::int64_t inTicks,
+                            std::int32_t inCachePriority = VF::kCachePriority_High)
     {
-        return CreateMediaNodePrefetcher(inSource, Ticks(inTicks), {}, {}, {});
+        return CreateMediaNodePrefetcher(inSource, Ticks(inTicks), {}, {}, {}, inCachePriority);
     }
     PrefetchRef Make(std::int64_t inTicks) const { return Make(VideoSourceRef(mSource), inTicks); }
     // Two started handles for one time of inSource.

@@ -36,7 +36,7 @@ protected:
         const ScriptedSourceRef& source = inSource ? inSource : mSource;
         EnqueueVideoSourcePrefetch(Ticks(inTicks), VideoSourceRef(source), {}, {}, {},
                                    inNullKey ? Guid() : source->KeyFor(Ticks(inTicks)),
-                                   ioLog.Callback());
+                                   VF::kCachePriority_High, ioLog.Callback());
     }
 
     CallbackLog mLog;

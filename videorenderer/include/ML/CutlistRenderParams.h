@@ -12,6 +12,7 @@
 #include "MF/FrameTime.h"
 #include "QRT/InterfaceRef.h"
 #include "QRT/QRTUnknown.h"
+#include "VF/FrameCachePriority.h"
 #include "mvxmediatypes/FrameRate.h"
 #include "mvxmediatypes/PixelAspectRatio.h"
 #include "mvxmediatypes/PixelFormat.h"
@@ -60,6 +61,14 @@ struct CutlistRenderParams : public MF::FrameTime
     // The request's render flags (8: always cache; 16: cache when the cache
     // range is not empty).
     std::uint32_t mRenderFlags = 0;
+    // The shared frame cache's priority for the frames this render reads ahead
+    // and renders: high for playback, scrubbing and the renders of the render
+    // queue's normal class, which come back to their frames; low for a render
+    // that passes over its frames once (an export), so that its frames are
+    // evicted first and held only within the cache's low-priority allowance.
+    // Not part of any frame or request hash: it changes what is kept, not
+    // what is made.
+    std::int32_t mCachePriority = VF::kCachePriority_High;
 };
 
 } // namespace ML

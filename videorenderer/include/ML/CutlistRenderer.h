@@ -46,7 +46,8 @@ public:
     // The frame of inProducer at inLocalFrameTime, from the shared cache when
     // its hash is cached, else produced; conformed to the output. Empty when
     // the producer fails. With inInsertIntoCache the conformed frame is cached
-    // under the producer's hash. Without a producer: the black frame.
+    // under the producer's hash at the parameters' cache priority. Without a
+    // producer: the black frame.
     static QRT::InterfaceRef<MF::IVideoFrame> RenderFrameFromCutlist(
         const QRT::InterfaceRef<IRenderableNodeProducer>& inProducer,
         const CutlistRenderParams& inParams, const MF::FrameTime& inLocalFrameTime,

@@ -39,6 +39,7 @@
 #include "QRT/Param.h"
 #include "QRT/WaitableObject.h"
 #include "QRT/WeakReference.h"
+#include "VF/FrameCachePriority.h"
 #include "mvxmediatypes/FrameRate.h"
 #include "mvxmediatypes/PixelAspectRatio.h"
 #include "mvxmediatypes/PixelFormat.h"
@@ -210,6 +211,14 @@ public:
     std::int32_t GetOutputWidth() const { return mOutputRect.Width(); }
     std::int32_t GetOutputHeight() const { return mOutputRect.Height(); }
     bool IsNormalPriority() const { return mPriority >= kRenderPriority_Normal; }
+    // The shared frame cache's priority for the request's frames (its result
+    // and, through the render parameters, the source frames it reads ahead):
+    // high above kRenderPriority_CacheHigh, low at and below it.
+    std::int32_t GetCachePriority() const
+    {
+        return mPriority > kRenderPriority_CacheHigh ? VF::kCachePriority_High
+                                                     : VF::kCachePriority_Low;
+    }
 
     mvxmediatypes::TickTime mTime;
     mvxmediatypes::FrameRate mFrameRate;

@@ -221,10 +221,8 @@ QRT::Result RenderFrameQueueImpl::Render(QueueEntry& ioEntry, bool inRegistered)
                 renderMilliseconds = static_cast<std::int32_t>(elapsed * 1000.0);
                 frame->SetRenderTime(static_cast<std::uint32_t>(renderMilliseconds));
                 if (ShouldCache(request))
-                    VF::SharedVideoFrameCache::InsertIntoCache(
-                        frame, request.mKey,
-                        request.mPriority > kRenderPriority_CacheHigh ? VF::kCachePriority_High
-                                                                      : VF::kCachePriority_Low);
+                    VF::SharedVideoFrameCache::InsertIntoCache(frame, request.mKey,
+                                                               request.GetCachePriority());
                 status = kResult_Rendered;
             }
         }

@@ -221,6 +221,7 @@ void RenderFrameRequest::BuildRenderParams(bool /*inFlag*/, CutlistRenderParams&
     }
     outParams.mCutlistChoiceBit = mCutlistChoice & 1u;
     outParams.mRenderFlags = mRenderFlags;
+    outParams.mCachePriority = GetCachePriority();
 
     // Half a frame is one frame at twice the frame rate.
     const std::int64_t ticksPerFrame = mFrameRate.GetTicksPerFrame();

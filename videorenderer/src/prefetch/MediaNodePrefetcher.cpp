@@ -11,6 +11,7 @@
 #include <map>
 #include <memory>
 #include <mutex>
+#include <optional>
 #include <utility>
 
 namespace ML
@@ -47,6 +48,7 @@ struct SharedRead
     MF::BinaryData mBinaryData;
     BE::ColorProfile mColorProfile;
     Guid mKey;
+    std::int32_t mCachePriority = VF::kCachePriority_High;
     // Set while the read runs on the source's asynchronous-read interface;
     // empty once it is queued on the video source prefetcher.
     AsyncRef mAsync;
@@ -79,7 +81,7 @@ struct SharedRead
     void Enqueue(const std::shared_ptr<SharedRead>& inSelf)
     {
         EnqueueVideoSourcePrefetch(
-            mTime, mSource, mRequest, mBinaryData, mColorProfile, mKey,
+            mTime, mSource, mRequest, mBinaryData, mColorProfile, mKey, mCachePriority,
             [inSelf](QRT::Result inStatus)
             {
                 if (QRT::Succeeded(inStatus) &&
@@ -127,6 +129,16 @@ bool ReleaseKeyLocked(KeyTable& ioKeys, const Guid& inKey)
     return true;
 }
 
+// A frame that a handle of a higher cache priority takes from the cache goes
+// back in at that priority. Called without any lock: the insertion notifies.
+void RaiseCachePriority(const FrameRef& inFrame, const Guid& inKey, std::int32_t inPriority)
+{
+    const std::optional<std::int32_t> cached =
+        VF::SharedVideoFrameCache::GetInstance().GetCachedPriority(inKey);
+    if (cached && *cached < inPriority)
+        VF::SharedVideoFrameCache::InsertIntoCache(inFrame, inKey, inPriority);
+}
+
 // The prefetch handle over one frame of a back-end video source.
 //
 // Owned by the render request that collected it (and by whoever else holds a
@@ -140,7 +152,8 @@ class MediaNodePrefetcher : public QRT::Implements<IRenderableNodePrefetch>
 public:
     MediaNodePrefetcher(SourceRef inSource, AsyncRef inAsync, TickTime inTime,
                         const BE::VideoFrameRequest& inRequest, const MF::BinaryData& inBinaryData,
-                        const BE::ColorProfile& inColorProfile, const Guid& inKey)
+                        const BE::ColorProfile& inColorProfile, const Guid& inKey,
+                        std::int32_t inCachePriority)
         : mSource(std::move(inSource))
         , mAsync(std::move(inAsync))
         , mTime(inTime)
@@ -148,6 +161,7 @@ public:
         , mBinaryData(inBinaryData)
         , mColorProfile(inColorProfile)
         , mKey(inKey)
+        , mCachePriority(inCachePriority)
     {
     }
 
@@ -170,7 +184,10 @@ public:
             // A frame cached already needs no read.
             if (FrameRef cached = VF::SharedVideoFrameCache::RetrieveFromCache(mKey))
             {
-                mFrame = std::move(cached);
+                mFrame = cached;
+                const Guid key = mKey;
+                guard.unlock();
+                RaiseCachePriority(cached, key, mCachePriority);
                 return QRT::kResult_Success;
             }
         }
@@ -255,12 +272,16 @@ public:
         FrameRef frame;
         if (!key.IsNil())
             frame = VF::SharedVideoFrameCache::RetrieveFromCache(key);
-        if (!frame && source)
+        if (frame)
+        {
+            RaiseCachePriority(frame, key, mCachePriority);
+        }
+        else if (source)
         {
             source->GetVideoFrame(mTime, mRequest, mBinaryData, mColorProfile,
                                   BE::Deprecated::kFrameRequestFlag_NoBlock, frame);
             if (frame && !key.IsNil())
-                VF::SharedVideoFrameCache::InsertIntoCache(frame, key, VF::kCachePriority_High);
+                VF::SharedVideoFrameCache::InsertIntoCache(frame, key, mCachePriority);
         }
 
         guard.lock();
@@ -394,6 +415,7 @@ private:
         read->mBinaryData = mBinaryData;
         read->mColorProfile = mColorProfile;
         read->mKey = mKey;
+        read->mCachePriority = mCachePriority;
         return read;
     }
 
@@ -450,6 +472,7 @@ private:
     const MF::BinaryData mBinaryData;
     const BE::ColorProfile mColorProfile;
     Guid mKey;
+    const std::int32_t mCachePriority;
     bool mCacheDependency = false;
     bool mRegistered = false;
     // Set once the prefetch has ended (frame taken, read over, or inert).
@@ -462,9 +485,11 @@ private:
 
 } // namespace
 
-QRT::InterfaceRef<IRenderableNodePrefetch> CreateMediaNodePrefetcher(
-    const SourceRef& inSource, TickTime inTime, const BE::VideoFrameRequest& inRequest,
-    const MF::BinaryData& inBinaryData, const BE::ColorProfile& inColorProfile)
+QRT::InterfaceRef<IRenderableNodePrefetch>
+CreateMediaNodePrefetcher(const SourceRef& inSource, TickTime inTime,
+                          const BE::VideoFrameRequest& inRequest,
+                          const MF::BinaryData& inBinaryData,
+                          const BE::ColorProfile& inColorProfile, std::int32_t inCachePriority)
 {
     MVX_INPUT_CONTRACT(inSource != nullptr);
     AsyncRef async = QRT::QueryRef<BE::Deprecated::IAsyncVideoSource>(inSource);
@@ -474,7 +499,8 @@ QRT::InterfaceRef<IRenderableNodePrefetch> CreateMediaNodePrefetcher(
         return {};
     const Guid key = inSource->GetFrameKey(inTime, inRequest, inBinaryData, inColorProfile);
     return QRT::Allocated<MediaNodePrefetcher>::Create<IRenderableNodePrefetch>(
-        inSource, std::move(async), inTime, inRequest, inBinaryData, inColorProfile, key);
+        inSource, std::move(async), inTime, inRequest, inBinaryData, inColorProfile, key,
+        inCachePriority);
 }
 
 void FlushMediaNodePrefetchRegistry()

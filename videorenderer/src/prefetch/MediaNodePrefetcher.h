@@ -13,6 +13,11 @@
 // read themselves; all others are read through the video source prefetcher
 // (VideoSourcePrefetcher.h). Frames travel through the shared video frame
 // cache, on which a handle holds a dependency on its key while it lives.
+// A handle carries the cache priority of the render that made it: the frame
+// it reads goes into the cache at that priority (the read shared by several
+// handles at the priority of the handle that started it), and a handle that
+// takes a frame cached at a lower priority than its own puts it back at its
+// own, so that frames an export read keep for the playback that wants them.
 //
 // Threads: handles may be created, started, polled and cancelled from any
 // thread; one module-wide lock serialises the key table and the start and
@@ -39,13 +44,15 @@ namespace ML
 // it (with the clip's binary data and colour profile), or an empty reference
 // when no prefetch is needed: the source neither wants the time prefetched
 // (IsPrefetchWanted) nor answers an enabled asynchronous-read interface. The
-// handle is not started; the caller calls InitiatePrefetch.
+// handle is not started; the caller calls InitiatePrefetch. inCachePriority
+// is the shared frame cache's priority for the frame (CutlistRenderParams::
+// mCachePriority of the render).
 // Input contract: "inSource != nullptr".
 QRT::InterfaceRef<IRenderableNodePrefetch>
 CreateMediaNodePrefetcher(const QRT::InterfaceRef<BE::Deprecated::IVideoSource>& inSource,
                           mvxmediatypes::TickTime inTime, const BE::VideoFrameRequest& inRequest,
                           const MF::BinaryData& inBinaryData,
-                          const BE::ColorProfile& inColorProfile);
+                          const BE::ColorProfile& inColorProfile, std::int32_t inCachePriority);
 
 // Module shutdown: under the key table's lock, drops every key reference and
 // empties the table. Handles alive at that point stay usable: their later

@@ -31,6 +31,7 @@ struct PrefetchJob
     MF::BinaryData mBinaryData;
     BE::ColorProfile mColorProfile;
     mvxcore::utility::Guid mFrameKey;
+    std::int32_t mCachePriority = VF::kCachePriority_High;
     VideoSourcePrefetchCallback mCallback;
     // Names this job among its source's jobs, so that an enqueue whose task
     // could not be posted takes back exactly the job it added.
@@ -113,7 +114,7 @@ void RunNextJob(const SourceRef& inSource)
         job.mSource->GetVideoFrame(job.mTime, job.mRequest, job.mBinaryData, job.mColorProfile,
                                    BE::Deprecated::kFrameRequestFlag_Read, frame);
     if (QRT::Succeeded(status) && !job.mFrameKey.IsNil() && frame)
-        VF::SharedVideoFrameCache::InsertIntoCache(frame, job.mFrameKey, VF::kCachePriority_High);
+        VF::SharedVideoFrameCache::InsertIntoCache(frame, job.mFrameKey, job.mCachePriority);
     if (job.mCallback)
         job.mCallback(status);
 }
@@ -125,6 +126,7 @@ void EnqueueVideoSourcePrefetch(mvxmediatypes::TickTime inTime, const SourceRef&
                                 const MF::BinaryData& inBinaryData,
                                 const BE::ColorProfile& inColorProfile,
                                 const mvxcore::utility::Guid& inFrameKey,
+                                std::int32_t inCachePriority,
                                 VideoSourcePrefetchCallback inCallback)
 {
     const ExecutorRef videoQueue = LoadExecutor(sVideoSourcePrefetcherQueue);
@@ -146,6 +148,7 @@ void EnqueueVideoSourcePrefetch(mvxmediatypes::TickTime inTime, const SourceRef&
                         inBinaryData,
                         inColorProfile,
                         inFrameKey,
+                        inCachePriority,
                         std::move(inCallback),
                         0};
         QRT::CriticalSectionLock lock(table.mLock, "VideoSourcePrefetcher::Enqueue");

@@ -29,6 +29,7 @@
 #include "mvxmediatypes/TickTime.h"
 
 #include <cstddef>
+#include <cstdint>
 
 #include <boost/function.hpp>
 
@@ -42,18 +43,17 @@ using VideoSourcePrefetchCallback = boost::function<void(QRT::Result)>;
 
 // Queues a read of the frame at inTime of inSource (the source's frame request
 // with kFrameRequestFlag_Read). A frame read successfully goes into the shared
-// video frame cache under inFrameKey with priority VF::kCachePriority_High,
-// unless inFrameKey is the null Guid; then inCallback (may be empty) is called
-// with the status.
+// video frame cache under inFrameKey with inCachePriority (VF::kCachePriority_High
+// for reads that playback and scrubbing come back to, VF::kCachePriority_Low
+// for one-pass renders), unless inFrameKey is the null Guid; then inCallback
+// (may be empty) is called with the status.
 // Input contracts: "sVideoSourcePrefetcherQueue != NULL && sImageSourcePrefetcherQueue != NULL",
 // "inSource != nullptr".
-void EnqueueVideoSourcePrefetch(mvxmediatypes::TickTime inTime,
-                                const QRT::InterfaceRef<BE::Deprecated::IVideoSource>& inSource,
-                                const BE::VideoFrameRequest& inRequest,
-                                const MF::BinaryData& inBinaryData,
-                                const BE::ColorProfile& inColorProfile,
-                                const mvxcore::utility::Guid& inFrameKey,
-                                VideoSourcePrefetchCallback inCallback);
+void EnqueueVideoSourcePrefetch(
+    mvxmediatypes::TickTime inTime, const QRT::InterfaceRef<BE::Deprecated::IVideoSource>& inSource,
+    const BE::VideoFrameRequest& inRequest, const MF::BinaryData& inBinaryData,
+    const BE::ColorProfile& inColorProfile, const mvxcore::utility::Guid& inFrameKey,
+    std::int32_t inCachePriority, VideoSourcePrefetchCallback inCallback);
 
 // Removes the queued read of inSource whose frame key is inFrameKey, if it has
 // not started yet, and calls its callback with kResult_Cancelled on the calling

@@ -73,7 +73,7 @@ QRT::InterfaceRef<MF::IVideoFrame> CutlistRenderer::RenderFrameFromCutlist(
     if (conformed && inInsertIntoCache && hashed)
     {
         conformed->MarkShared(1);
-        VF::SharedVideoFrameCache::InsertIntoCache(conformed, hash, VF::kCachePriority_High);
+        VF::SharedVideoFrameCache::InsertIntoCache(conformed, hash, inParams.mCachePriority);
     }
     return conformed;
 }
@@ -94,6 +94,8 @@ QRT::Guid CutlistRenderer::GetBlackFrameHash(const CutlistRenderParams& inParams
 QRT::InterfaceRef<MF::IVideoFrame>
 CutlistRenderer::GetBlackFrame(const CutlistRenderParams& inParams)
 {
+    // Black frames stay at the high priority whatever the render: there are
+    // few of them and every render of their size asks for them again.
     const QRT::Guid hash = GetBlackFrameHash(inParams);
     if (auto cached = VF::SharedVideoFrameCache::RetrieveFromCache(hash))
         return cached;

@@ -121,8 +121,8 @@ public:
         // the time after the conversion by frame number.
         const TickTime time = SourceTime(inTime.GetTime());
         mSource->PrefetchVideoFrame(time, request, mBinaryData);
-        QRT::InterfaceRef<IRenderableNodePrefetch> prefetch =
-            CreateMediaNodePrefetcher(mSource, time, request, mBinaryData, mColorProfile);
+        QRT::InterfaceRef<IRenderableNodePrefetch> prefetch = CreateMediaNodePrefetcher(
+            mSource, time, request, mBinaryData, mColorProfile, inParams.mCachePriority);
         if (prefetch)
             ioPrefetches.push_back(std::move(prefetch));
     }

@@ -13,12 +13,27 @@
 //   on nobody writes it; writers take VF::MakeWriteableVideoFrame.
 // - The cache holds at most its byte budget of frames (a frame counts its
 //   GetDataSize). After each insertion it evicts until the budget holds:
-//   frames of the lowest priority first (the renderer uses 0 and 10), least
-//   recently used first within a priority (a retrieve or a re-insertion makes
-//   a frame recently used). Frames whose key has a registered dependency are
-//   never evicted; only they may keep the cache above its budget, and when the
-//   last dependency goes the budget is restored. A single frame larger than
-//   the whole budget is not stored.
+//   frames of the lowest priority first, least recently used first within a
+//   priority (a retrieve or a re-insertion makes a frame recently used).
+//   Frames whose key has a registered dependency are never evicted; only they
+//   may keep the cache above its budget, and when the last dependency goes the
+//   budget is restored. A single frame larger than the whole budget is not
+//   stored.
+// - Priorities (VF/FrameCachePriority.h): frames that will be asked for again
+//   go in at kCachePriority_High; frames of one pass over the material at
+//   kCachePriority_Low. The low class (every priority below High) is also held
+//   to a small allowance of its own, so that an export keeps only the few
+//   recent frames that its neighbours may ask for again (a frame blend, a
+//   field filter) instead of filling the budget with frames nobody comes back
+//   to: when the low class exceeds its allowance, its least recently used
+//   unpinned frames go even while the whole budget has room. A pinned frame
+//   of the low class stays until its dependency goes, so that a read-ahead
+//   frame still reaches the render that waits for it.
+// - The renderer's policy: read-ahead frames, rendered frames and black
+//   frames of playback, scrubbing, plug-in and prefetch renders (requests of
+//   priority above 810) go in at High; the results of requests of priority
+//   810 and below, and every frame of a render whose parameters carry
+//   kCachePriority_Low (the command-line renderer's one-pass exports), at Low.
 // - Eviction and Clear only drop the cache's reference: a frame held elsewhere
 //   stays valid.
 // - Threads: every function may be called from any thread at once. Keys are
@@ -39,10 +54,12 @@
 //   stores nothing and every retrieve misses. Insertion still marks the frame
 //   shared and still calls the notification, so that whoever waits for the
 //   key hears of the frame at once instead of at its next poll.
-// - Default budget: a quarter of physical memory, at most 4 GiB.
+// - Default budget: a quarter of physical memory, at most 4 GiB; default
+//   low-priority allowance 32 MiB, at most an eighth of the budget.
 
 #include "MF/IVideoFrame.h"
 #include "QRT/InterfaceRef.h"
+#include "VF/FrameCachePriority.h"
 #include "mvxcore/utility/Guid.h"
 
 #include <array>
@@ -54,14 +71,11 @@
 #include <map>
 #include <memory>
 #include <mutex>
+#include <optional>
 #include <unordered_map>
 
 namespace VF
 {
-
-// Priorities the renderer uses.
-inline constexpr int32_t kCachePriority_Low = 0;
-inline constexpr int32_t kCachePriority_High = 10;
 
 using FrameCacheNotification = std::function<void(const mvxcore::utility::Guid&)>;
 
@@ -72,16 +86,22 @@ struct FrameCacheStatistics
     uint64_t mInsertions = 0; // insertions that stored a frame
     uint64_t mRefused = 0;    // insertions not stored (disabled, larger than the budget)
     uint64_t mEvictions = 0;
-    uint64_t mBytes = 0;  // bytes of the frames held now
-    uint64_t mFrames = 0; // frames held now
+    uint64_t mBytes = 0;            // bytes of the frames held now
+    uint64_t mFrames = 0;           // frames held now
+    uint64_t mLowPriorityBytes = 0; // bytes of the low class held now
 };
 
 class VideoFrameCache
 {
 public:
-    // Budget from the machine's memory; enabled unless VF_DISABLE_FRAME_CACHE=1.
+    // Allowance of the low class that means "the whole budget".
+    static constexpr size_t kWholeBudget = SIZE_MAX;
+
+    // Budget and allowance from the machine's memory; enabled unless
+    // VF_DISABLE_FRAME_CACHE=1.
     VideoFrameCache();
-    VideoFrameCache(size_t inByteBudget, bool inEnabled);
+    VideoFrameCache(size_t inByteBudget, bool inEnabled,
+                    size_t inLowPriorityByteBudget = kWholeBudget);
     ~VideoFrameCache();
     VideoFrameCache(const VideoFrameCache&) = delete;
     VideoFrameCache& operator=(const VideoFrameCache&) = delete;
@@ -100,6 +120,8 @@ public:
     void UnregisterDependencyOnFrame(const mvxcore::utility::Guid& inKey);
     // Registered dependencies on inKey.
     uint32_t GetDependencyCount(const mvxcore::utility::Guid& inKey) const;
+    // The priority of the frame held under inKey, or none. Diagnostics and tests.
+    std::optional<int32_t> GetCachedPriority(const mvxcore::utility::Guid& inKey) const;
 
     // Replaces the notification function (an empty function: none).
     void SetNotificationFunction(FrameCacheNotification inFunction);
@@ -108,11 +130,16 @@ public:
     void Clear();
     void SetByteBudget(size_t inBytes);
     size_t GetByteBudget() const noexcept;
+    // The low class's allowance (kWholeBudget: only the budget limits it).
+    void SetLowPriorityByteBudget(size_t inBytes);
+    size_t GetLowPriorityByteBudget() const noexcept;
     bool IsEnabled() const noexcept { return mEnabled; }
     FrameCacheStatistics GetStatistics() const noexcept;
 
     // A quarter of physical memory, at most 4 GiB.
     static size_t GetDefaultByteBudget();
+    // 32 MiB, at most an eighth of inByteBudget.
+    static size_t GetDefaultLowPriorityByteBudget(size_t inByteBudget) noexcept;
 
 private:
     static constexpr size_t kShardCount = 16;
@@ -150,12 +177,17 @@ private:
                            QRT::InterfaceRef<MF::IVideoFrame>& outFrame) noexcept;
     // The shard's best victim, or false when it has none. Requires its mutex.
     static bool FindVictimLocked(const Shard& inShard, Victim& ioVictim);
-    // Evicts until the budget holds or only pinned frames are left.
+    // True while the budget or the low class's allowance is exceeded.
+    bool IsOverBudget() const noexcept;
+    // Evicts until the budget and the allowance hold or only pinned frames are
+    // left (of the low class, for the allowance).
     void EvictToBudget();
 
     const bool mEnabled;
     std::atomic<size_t> mByteBudget;
+    std::atomic<size_t> mLowPriorityByteBudget;
     std::atomic<size_t> mBytes{0};
+    std::atomic<size_t> mLowPriorityBytes{0};
     std::atomic<uint64_t> mFrames{0};
     std::atomic<uint64_t> mUseClock{0};
     std::atomic<uint64_t> mHits{0};
