@@ -277,8 +277,8 @@ std::int32_t IR_PackYUVPlanes(const void* inSrc, std::int32_t inSrcRowBytes,
     {
         for (std::int32_t y = 0; y < inHeight; ++y)
             HWY_DYNAMIC_DISPATCH(PackRow444)
-            (row(src, inSrcRowBytes, y), row(outY, inYRowBytes, y), row(outCb, inCbRowBytes, y),
-             row(outCr, inCrRowBytes, y), inWidth, k, vuya);
+        (row(src, inSrcRowBytes, y), row(outY, inYRowBytes, y), row(outCb, inCbRowBytes, y),
+         row(outCr, inCrRowBytes, y), inWidth, k, vuya);
         return kIR_NoError;
     }
     for (std::int32_t y = 0; y < inHeight; y += 2)
