@@ -37,13 +37,15 @@ inline void Fill(MF::IVideoFrame& ioFrame, const Bgra& inColor)
                         inColor.data(), 4);
 }
 
-// True when inFrame is BGRA_4444_8u and every pixel has the bytes inColor;
+// True when inFrame is BGRA_4444_8u or VUYA_4444_8u and every pixel has the
+// four bytes inColor;
 // otherwise reports the first differing pixel.
 inline bool IsFilledWith(const FrameRef& inFrame, const Bgra& inColor)
 {
-    if (!inFrame || inFrame->GetPixelFormat() != mvxmediatypes::kPixelFormat_BGRA_4444_8u)
+    if (!inFrame || (inFrame->GetPixelFormat() != mvxmediatypes::kPixelFormat_BGRA_4444_8u &&
+                     inFrame->GetPixelFormat() != mvxmediatypes::kPixelFormat_VUYA_4444_8u))
     {
-        ADD_FAILURE() << "no BGRA_4444_8u frame";
+        ADD_FAILURE() << "no BGRA_4444_8u or VUYA_4444_8u frame";
         return false;
     }
     const QRT::ParamRect bounds = inFrame->GetBounds();

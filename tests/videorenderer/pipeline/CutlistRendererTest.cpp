@@ -74,6 +74,9 @@ TEST_F(CutlistRendererTest, SegmentGivesProducerNodeTimeAndHashAndOutsideOneCach
     EXPECT_EQ(first->GetBounds(), QRT::ParamRect(0, 0, 8, 4));
     ASSERT_EQ(ML::CutlistRenderer::GetCutlistFrameHash(hash, mCutlistRef, mParams), 0);
     EXPECT_EQ(hash, ML::CutlistRenderer::GetBlackFrameHash(mParams));
+    // Y'CbCr black is video-range black with neutral chroma (V, U, Y, A).
+    mParams.mPixelFormat = mvxmediatypes::kPixelFormat_VUYA_4444_8u;
+    EXPECT_TRUE(IsFilledWith(ML::CutlistRenderer::GetBlackFrame(mParams), {128, 128, 16, 0}));
 
     const CutlistRef failing = QRT::Allocated<FailingCutlist>::CreateInstance();
     EXPECT_EQ(ML::CutlistRenderer::GetProducerForCutlist(failing, mParams, producer, local),

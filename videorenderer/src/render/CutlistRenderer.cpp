@@ -6,6 +6,7 @@
 #include "QRT/Param.h"
 #include "VF/SharedVideoFrameCache.h"
 #include "VF/VideoFrame.h"
+#include "VF/VideoFrameManipulators.h"
 #include "render/FramePixels.h"
 
 #include <cstring>
@@ -101,6 +102,11 @@ CutlistRenderer::GetBlackFrame(const CutlistRenderParams& inParams)
         return cached;
     auto frame = VF::CreateVideoFrame(inParams.mPixelFormat, inParams.mWidth, inParams.mHeight,
                                       inParams.mPixelAspectRatio, true, true);
+    // Cleared memory is transparent black in RGB; in Y'CbCr it is a green
+    // below black, so those frames are filled with transparent black instead.
+    if (frame && inParams.mPixelFormat.IsYUV() &&
+        QRT::Failed(VF::VideoFrameManipulators::FillWithColor(frame, 0x00000000u)))
+        frame.Reset();
     if (frame)
     {
         frame->MarkShared(1);
