@@ -38,8 +38,7 @@ inline void Fill(MF::IVideoFrame& ioFrame, const Bgra& inColor)
 }
 
 // True when inFrame is BGRA_4444_8u or VUYA_4444_8u and every pixel has the
-// four bytes inColor;
-// otherwise reports the first differing pixel.
+// four bytes inColor; otherwise reports the first differing pixel.
 inline bool IsFilledWith(const FrameRef& inFrame, const Bgra& inColor)
 {
     if (!inFrame || (inFrame->GetPixelFormat() != mvxmediatypes::kPixelFormat_BGRA_4444_8u &&
