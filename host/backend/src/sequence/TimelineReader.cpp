@@ -119,21 +119,7 @@ SequenceRef TimelineReader::Build(std::size_t inIndex)
     mChain.push_back(entry.mName);
 
     SequenceSettings settings;
-    if (node.Has("rate"))
-        settings.mFrameRate = ReadRate(node.Child("rate"));
-    if (node.Has("size"))
-    {
-        const auto [width, height] = node.Pair("size", 1, kMaxFrameDimension, "frame size");
-        settings.mWidth = static_cast<std::int32_t>(width);
-        settings.mHeight = static_cast<std::int32_t>(height);
-    }
-    if (node.Has("par"))
-    {
-        const auto [num, den] = node.Pair("par", 1, UINT32_MAX, "pixel aspect ratio");
-        settings.mPixelAspectRatio =
-            mt::PixelAspectRatio(static_cast<std::uint32_t>(num), static_cast<std::uint32_t>(den));
-    }
-    settings.mFieldType = node.Name("field", kFieldTypes, settings.mFieldType);
+    ReadPictureKeys(node, settings);
 
     SequenceBuilder builder(entry.mName, settings);
     for (const Node& track : node.Elements("tracks"))

@@ -160,21 +160,7 @@ StreamSettings ReadStream(const Node& inNode)
 {
     CheckKeys(inNode.Value(), inNode.Path(), {"rate", "size", "par", "field", "alpha"});
     StreamSettings stream;
-    if (inNode.Has("rate"))
-        stream.mFrameRate = ReadRate(inNode.Child("rate"));
-    if (inNode.Has("size"))
-    {
-        const auto [width, height] = inNode.Pair("size", 1, kMaxFrameDimension, "frame size");
-        stream.mWidth = static_cast<std::int32_t>(width);
-        stream.mHeight = static_cast<std::int32_t>(height);
-    }
-    if (inNode.Has("par"))
-    {
-        const auto [num, den] = inNode.Pair("par", 1, UINT32_MAX, "pixel aspect ratio");
-        stream.mPixelAspectRatio =
-            mt::PixelAspectRatio(static_cast<std::uint32_t>(num), static_cast<std::uint32_t>(den));
-    }
-    stream.mFieldType = inNode.Name("field", kFieldTypes, stream.mFieldType);
+    ReadPictureKeys(inNode, stream);
     stream.mAlpha = inNode.Name("alpha", kAlphaChannels, stream.mAlpha);
     return stream;
 }

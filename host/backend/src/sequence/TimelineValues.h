@@ -220,6 +220,28 @@ private:
 };
 
 mvxmediatypes::FrameRate ReadRate(const Node& inNode);
+
+// The picture keys a sequence and a stream share ("rate", "size", "par",
+// "field"), each read into ioSettings when present.
+template <typename Settings>
+void ReadPictureKeys(const Node& inNode, Settings& ioSettings)
+{
+    if (inNode.Has("rate"))
+        ioSettings.mFrameRate = ReadRate(inNode.Child("rate"));
+    if (inNode.Has("size"))
+    {
+        const auto [width, height] = inNode.Pair("size", 1, kMaxFrameDimension, "frame size");
+        ioSettings.mWidth = static_cast<std::int32_t>(width);
+        ioSettings.mHeight = static_cast<std::int32_t>(height);
+    }
+    if (inNode.Has("par"))
+    {
+        const auto [num, den] = inNode.Pair("par", 1, UINT32_MAX, "pixel aspect ratio");
+        ioSettings.mPixelAspectRatio = mvxmediatypes::PixelAspectRatio(
+            static_cast<std::uint32_t>(num), static_cast<std::uint32_t>(den));
+    }
+    ioSettings.mFieldType = inNode.Name("field", kFieldTypes, ioSettings.mFieldType);
+}
 // A constant (a number, or [x, y] for points) or a list of keys, every value
 // within [inLow, inHigh]; the curve's default and dimension come from inDefault.
 KeyframeCurve ReadCurve(const Node& inNode, const KeyframeCurve& inDefault,
