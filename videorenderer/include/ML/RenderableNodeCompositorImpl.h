@@ -63,7 +63,8 @@ public:
     // in the compositor's.
     void GetStillRanges(mvxmediatypes::TickTime inStart, mvxmediatypes::TickTime inEnd,
                         MF::TickTimeRangeList& ioRanges) const override;
-    // Forwarded to the input when there is exactly one.
+    // Forwarded to the input when there is exactly one, in its time; the
+    // times are answered in the compositor's.
     void GetSmartRenderTimes(mvxmediatypes::TickTime inStart, mvxmediatypes::TickTime inEnd,
                              const mvxmediatypes::FrameRate& inFrameRate, bool inFlag,
                              std::set<mvxmediatypes::TickTime>& ioTimes) const override;

@@ -60,9 +60,9 @@ QRT::InterfaceRef<MF::IRenderableNode> RenderableNodeCompositorImpl::GetSelfRefe
     return QRT::InterfaceRef<MF::IRenderableNode>(this);
 }
 
-void RenderableNodeCompositorImpl::AddTrackInput(const QRT::InterfaceRef<MF::IRenderableNode>& inNode,
-                                                 mvxmediatypes::TickTime inOffset,
-                                                 std::uint32_t inTrackIndex)
+void RenderableNodeCompositorImpl::AddTrackInput(
+    const QRT::InterfaceRef<MF::IRenderableNode>& inNode, mvxmediatypes::TickTime inOffset,
+    std::uint32_t inTrackIndex)
 {
     AddInput(inNode, inOffset);
     mTrackIndices.push_back(inTrackIndex);
@@ -128,18 +128,22 @@ void RenderableNodeCompositorImpl::GetStillRanges(mvxmediatypes::TickTime inStar
     }
 }
 
-void RenderableNodeCompositorImpl::GetSmartRenderTimes(mvxmediatypes::TickTime inStart,
-                                                       mvxmediatypes::TickTime inEnd,
-                                                       const mvxmediatypes::FrameRate& inFrameRate,
-                                                       bool inFlag,
-                                                       std::set<mvxmediatypes::TickTime>& ioTimes) const
+void RenderableNodeCompositorImpl::GetSmartRenderTimes(
+    mvxmediatypes::TickTime inStart, mvxmediatypes::TickTime inEnd,
+    const mvxmediatypes::FrameRate& inFrameRate, bool inFlag,
+    std::set<mvxmediatypes::TickTime>& ioTimes) const
 {
     if (GetInputs().size() != 1)
         return;
     const auto& [node, offset] = GetInputs().front();
-    if (const auto provider = QRT::QueryRef<IRenderableNodeProducerProvider>(node))
-        provider->GetSmartRenderTimes(inStart + offset, inEnd + offset, inFrameRate, inFlag,
-                                      ioTimes);
+    const auto provider = QRT::QueryRef<IRenderableNodeProducerProvider>(node);
+    if (!provider)
+        return;
+    // Asked in the input's time, answered in the compositor's, as the still ranges.
+    std::set<mvxmediatypes::TickTime> times;
+    provider->GetSmartRenderTimes(inStart - offset, inEnd - offset, inFrameRate, inFlag, times);
+    for (const mvxmediatypes::TickTime time : times)
+        ioTimes.insert(time + offset);
 }
 
 // --- CompositorProducer ----------------------------------------------------------------
@@ -168,8 +172,8 @@ QRT::Result CompositorProducer::CompositeLayers(const MF::FrameTime& inTime,
                                     result, inParams);
         else if (layer.mFirstFieldMotion.mOpacity == 1.0f &&
                  layer.mSecondFieldMotion.mOpacity == 1.0f)
-            result = ApplyMotion(frame, layer.mFirstFieldMotion, layer.mSecondFieldMotion,
-                                 inParams);
+            result =
+                ApplyMotion(frame, layer.mFirstFieldMotion, layer.mSecondFieldMotion, inParams);
         else
             // The bottom layer keeps its opacity: a faded layer over nothing
             // stays faded. Without a lower frame no blend mode applies.

@@ -46,6 +46,11 @@ mvxmediatypes::AlphaChannel NewFrameAlpha(PixelFormat inFormat)
                : mvxmediatypes::kAlphaChannel_Straight;
 }
 
+bool FrameAlreadyConformsToOutput(const FrameRef& inFrame, const CutlistRenderParams& inParams)
+{
+    return CutlistRenderer::FrameAlreadyConformsToOutput(inFrame, inParams);
+}
+
 IR_PixelFormat ReadFormatOf(const MF::IVideoFrame& inFrame)
 {
     return GetImageRendererFormat(inFrame.GetPixelFormat(), inFrame.GetAlphaChannel());
@@ -138,15 +143,15 @@ QRT::Result DrawPass(const MF::IVideoFrame& inUpper, const QRT::ParamRect& inUpp
     const auto quality = static_cast<std::int32_t>(inQuality);
     const QRT::Result status =
         !inHasLowerFrame || inRecord.mBlendMode == kIR_BlendMode_Normal
-            ? IR_Motion(source.mBase, source.mRowBytes, sourceFormat, source.mWidth,
-                        source.mHeight, destination.mBase, destination.mRowBytes,
-                        destinationFormat, destination.mWidth, destination.mHeight, &matrix,
-                        inRecord.mOpacity, quality, inFieldSelector, inHasLowerFrame)
-            : IR_MotionWithBlendMode(source.mBase, source.mRowBytes, sourceFormat,
-                                     source.mWidth, source.mHeight, destination.mBase,
-                                     destination.mRowBytes, destinationFormat, destination.mWidth,
-                                     destination.mHeight, &matrix, inRecord.mOpacity, quality,
-                                     inFieldSelector, inHasLowerFrame, inRecord.mBlendMode);
+            ? IR_Motion(source.mBase, source.mRowBytes, sourceFormat, source.mWidth, source.mHeight,
+                        destination.mBase, destination.mRowBytes, destinationFormat,
+                        destination.mWidth, destination.mHeight, &matrix, inRecord.mOpacity,
+                        quality, inFieldSelector, inHasLowerFrame)
+            : IR_MotionWithBlendMode(source.mBase, source.mRowBytes, sourceFormat, source.mWidth,
+                                     source.mHeight, destination.mBase, destination.mRowBytes,
+                                     destinationFormat, destination.mWidth, destination.mHeight,
+                                     &matrix, inRecord.mOpacity, quality, inFieldSelector,
+                                     inHasLowerFrame, inRecord.mBlendMode);
     ioDestination.AlphaChanged();
     if (QRT::Succeeded(status))
         ioDestination.GrowVisibleContentRect(MapRect(inUpperContent, matrix));
@@ -169,8 +174,7 @@ FrameRef CompositeLayer(const FrameRef& inFrame, const MotionRecord& inFirstFiel
                         const CutlistRenderParams& inRenderParams)
 {
     MVX_INPUT_CONTRACT(inFrame);
-    MVX_INPUT_CONTRACT(!inLowerFrame ||
-                       CutlistRenderer::FrameAlreadyConformsToOutput(inLowerFrame, inRenderParams));
+    MVX_INPUT_CONTRACT(!inLowerFrame || FrameAlreadyConformsToOutput(inLowerFrame, inRenderParams));
     // A layer that holds nothing leaves the picture below as it is; it is
     // tested before any conversion so that it costs nothing.
     const QRT::ParamRect content = inFrame->GetVisibleContentRect();
@@ -185,7 +189,8 @@ FrameRef CompositeLayer(const FrameRef& inFrame, const MotionRecord& inFirstFiel
     // A conversion to another size draws the whole converted frame.
     const QRT::ParamRect upperContent =
         upper->GetBounds() == inFrame->GetBounds() ? content : upper->GetBounds();
-    const FrameRef lower = inLowerFrame ? PrepareForDrawing(inLowerFrame, inRenderParams) : FrameRef();
+    const FrameRef lower =
+        inLowerFrame ? PrepareForDrawing(inLowerFrame, inRenderParams) : FrameRef();
     if (inLowerFrame && !lower)
         return {};
 
@@ -203,10 +208,11 @@ FrameRef CompositeLayer(const FrameRef& inFrame, const MotionRecord& inFirstFiel
         const bool oneFieldOfProgressive =
             !mvxmediatypes::IsInterlaced(upper->GetFieldType()) &&
             inRenderParams.mSingleField != 0 &&
-            inRenderParams.mQuality < static_cast<std::uint32_t>(mvxmediatypes::kRenderQuality_Medium);
-        destination->SetFieldType(
-            oneFieldOfProgressive ? mvxmediatypes::kFieldType_Progressive
-                                  : static_cast<mvxmediatypes::FieldType>(inRenderParams.mFieldType));
+            inRenderParams.mQuality <
+                static_cast<std::uint32_t>(mvxmediatypes::kRenderQuality_Medium);
+        destination->SetFieldType(oneFieldOfProgressive ? mvxmediatypes::kFieldType_Progressive
+                                                        : static_cast<mvxmediatypes::FieldType>(
+                                                              inRenderParams.mFieldType));
         if (lower && QRT::Failed(VF::VideoFrameManipulators::CopyFrame(
                          lower, destination, QualityOf(inRenderParams.mQuality))))
             return {};
@@ -223,10 +229,14 @@ FrameRef CompositeLayer(const FrameRef& inFrame, const MotionRecord& inFirstFiel
         return QRT::Succeeded(DrawPass(*upper, upperContent, *destination, inRecord, inField,
                                        hasLower, inRenderParams.mQuality));
     };
-    const bool drawn = onePass ? pass(inFirstFieldMotion, kIR_Field_All)
-                               : pass(inFirstFieldMotion, kIR_Field_First) &&
-                                     pass(inSecondFieldMotion, kIR_Field_Second);
-    return drawn ? destination : FrameRef();
+    if (onePass)
+        return pass(inFirstFieldMotion, kIR_Field_All) ? destination : FrameRef();
+    // Two fields drawn apart make an interlaced picture, also in a lower frame
+    // that was progressive.
+    destination->SetFieldType(static_cast<mvxmediatypes::FieldType>(inRenderParams.mFieldType));
+    return pass(inFirstFieldMotion, kIR_Field_First) && pass(inSecondFieldMotion, kIR_Field_Second)
+               ? destination
+               : FrameRef();
 }
 
 FrameRef ApplyMotion(const FrameRef& inFrame, const MotionRecord& inFirstFieldMotion,
@@ -235,7 +245,7 @@ FrameRef ApplyMotion(const FrameRef& inFrame, const MotionRecord& inFirstFieldMo
 {
     if (SameGeometry(inFirstFieldMotion, inSecondFieldMotion) &&
         SameGeometry(inFirstFieldMotion, kIdentityMotionRecord) &&
-        CutlistRenderer::FrameAlreadyConformsToOutput(inFrame, inRenderParams))
+        FrameAlreadyConformsToOutput(inFrame, inRenderParams))
         return inFrame;
     MotionRecord first = inFirstFieldMotion;
     MotionRecord second = inSecondFieldMotion;
@@ -247,8 +257,9 @@ FrameRef ApplyMotion(const FrameRef& inFrame, const MotionRecord& inFirstFieldMo
     return CompositeLayer(inFrame, first, second, {}, inRenderParams);
 }
 
-QRT::Result CompositeFrameAtOffset(const FrameRef& inSourceFrame, const FrameRef& inDestinationFrame,
-                                   std::int32_t inX, std::int32_t inY)
+QRT::Result CompositeFrameAtOffset(const FrameRef& inSourceFrame,
+                                   const FrameRef& inDestinationFrame, std::int32_t inX,
+                                   std::int32_t inY)
 {
     MVX_INPUT_CONTRACT(inSourceFrame != NULL);
     MVX_INPUT_CONTRACT(inDestinationFrame != NULL);
@@ -270,7 +281,8 @@ QRT::Result CompositeFrameAtOffset(const FrameRef& inSourceFrame, const FrameRef
     const QRT::ParamRect bounds = work->GetBounds();
     const std::int64_t left = std::max<std::int64_t>(0, inX);
     const std::int64_t top = std::max<std::int64_t>(0, inY);
-    const std::int64_t right = std::min<std::int64_t>(bounds.Width(), std::int64_t(inX) + sourceBounds.Width());
+    const std::int64_t right =
+        std::min<std::int64_t>(bounds.Width(), std::int64_t(inX) + sourceBounds.Width());
     const std::int64_t bottom =
         std::min<std::int64_t>(bounds.Height(), std::int64_t(inY) + sourceBounds.Height());
     QRT::Result status = QRT::kResult_Success;
@@ -282,10 +294,10 @@ QRT::Result CompositeFrameAtOffset(const FrameRef& inSourceFrame, const FrameRef
                                  (top - inY) * source->GetRowBytes() + (left - inX) * pixelBytes;
         auto* destinationBase = static_cast<std::byte*>(work->GetWritableBaseAddress()) +
                                 top * work->GetRowBytes() + left * pixelBytes;
-        status = IR_Composite(sourceBase, source->GetRowBytes(), destinationBase,
-                              work->GetRowBytes(), format, static_cast<std::int32_t>(right - left),
-                              static_cast<std::int32_t>(bottom - top), 1.0f,
-                              kOffsetCompositeQuality);
+        status =
+            IR_Composite(sourceBase, source->GetRowBytes(), destinationBase, work->GetRowBytes(),
+                         format, static_cast<std::int32_t>(right - left),
+                         static_cast<std::int32_t>(bottom - top), 1.0f, kOffsetCompositeQuality);
         work->AlphaChanged();
     }
     if (QRT::Succeeded(status) && staged)
@@ -294,9 +306,8 @@ QRT::Result CompositeFrameAtOffset(const FrameRef& inSourceFrame, const FrameRef
     inDestinationFrame->AlphaChanged();
     const QRT::ParamRect content = inSourceFrame->GetVisibleContentRect();
     if (QRT::Succeeded(status) && !content.IsEmpty())
-        inDestinationFrame->GrowVisibleContentRect(
-            QRT::ParamRect(content.mLeft + inX, content.mTop + inY, content.mRight + inX,
-                           content.mBottom + inY));
+        inDestinationFrame->GrowVisibleContentRect(QRT::ParamRect(
+            content.mLeft + inX, content.mTop + inY, content.mRight + inX, content.mBottom + inY));
     return status;
 }
 

@@ -46,10 +46,10 @@ CompositeLayer(const QRT::InterfaceRef<MF::IVideoFrame>& inFrame,
 // inFrame drawn through the geometry of the two records alone (normal blend,
 // full opacity) into a new frame of the request; inFrame itself when both
 // records are the identity and the frame already conforms to the output.
-QRT::InterfaceRef<MF::IVideoFrame>
-ApplyMotion(const QRT::InterfaceRef<MF::IVideoFrame>& inFrame,
-            const MotionRecord& inFirstFieldMotion, const MotionRecord& inSecondFieldMotion,
-            const CutlistRenderParams& inRenderParams);
+QRT::InterfaceRef<MF::IVideoFrame> ApplyMotion(const QRT::InterfaceRef<MF::IVideoFrame>& inFrame,
+                                               const MotionRecord& inFirstFieldMotion,
+                                               const MotionRecord& inSecondFieldMotion,
+                                               const CutlistRenderParams& inRenderParams);
 
 // Composites all of inSourceFrame over inDestinationFrame (not shared) with
 // its top-left corner at (inX, inY), clipped to the destination, at full
