@@ -18,7 +18,6 @@
 #include "render/VideoFrameCompositeUtilities.h"
 
 #include <cstddef>
-#include <functional>
 #include <map>
 #include <string>
 
@@ -168,65 +167,43 @@ protected:
     ML::CutlistRenderParams mParams = vrtest::MakeParams(8, 4);
 };
 
-TEST(MotionRecordTest, LayoutIdentityAndComparisons)
+TEST(MotionRecordTest, FieldOffsetsAndWhichFieldsEachComparisonReads)
 {
+    using R = ML::MotionRecord;
+    // Per field: its offset, and whether SameGeometry and SameMotion still hold
+    // when only that field differs from the identity.
     const struct
     {
-        std::size_t mOffset;
-        std::size_t mExpected;
-    } offsets[] = {
-        {offsetof(ML::MotionRecord, mAnchorX), 0},
-        {offsetof(ML::MotionRecord, mAnchorY), 4},
-        {offsetof(ML::MotionRecord, mPositionX), 8},
-        {offsetof(ML::MotionRecord, mPositionY), 12},
-        {offsetof(ML::MotionRecord, mScaleX), 16},
-        {offsetof(ML::MotionRecord, mScaleY), 20},
-        {offsetof(ML::MotionRecord, mRotation), 24},
-        {offsetof(ML::MotionRecord, mReserved1), 32},
-        {offsetof(ML::MotionRecord, mReserved2), 36},
-        {offsetof(ML::MotionRecord, mReserved3), 40},
-        {offsetof(ML::MotionRecord, mMediaPixelAspect), 48},
-        {offsetof(ML::MotionRecord, mMediaWidth), 52},
-        {offsetof(ML::MotionRecord, mMediaHeight), 56},
-        {offsetof(ML::MotionRecord, mReserved4), 60},
-        {offsetof(ML::MotionRecord, mBlendMode), 64},
-        {offsetof(ML::MotionRecord, mOpacity), 68},
+        std::size_t mOffset, mExpected;
+        bool mSameGeometry, mSameMotion;
+    } fields[] = {
+        {offsetof(R, mAnchorX), 0, false, false},
+        {offsetof(R, mAnchorY), 4, false, false},
+        {offsetof(R, mPositionX), 8, false, false},
+        {offsetof(R, mPositionY), 12, false, false},
+        {offsetof(R, mScaleX), 16, false, false},
+        {offsetof(R, mScaleY), 20, false, false},
+        {offsetof(R, mRotation), 24, false, false},
+        {offsetof(R, mReserved1), 32, false, false},
+        {offsetof(R, mReserved2), 36, true, true},
+        {offsetof(R, mReserved3), 40, false, false},
+        {offsetof(R, mMediaPixelAspect), 48, true, true},
+        {offsetof(R, mMediaWidth), 52, false, false},
+        {offsetof(R, mMediaHeight), 56, false, false},
+        {offsetof(R, mReserved4), 60, true, true},
+        {offsetof(R, mBlendMode), 64, true, false},
+        {offsetof(R, mOpacity), 68, true, false},
     };
-    EXPECT_EQ(sizeof(ML::MotionRecord), 72u);
-    for (std::size_t index = 0; index < std::size(offsets); ++index)
-        EXPECT_EQ(offsets[index].mOffset, offsets[index].mExpected) << "field " << index;
+    EXPECT_EQ(sizeof(R), 72u);
     EXPECT_EQ(ML::kIdentityMotionRecord.mBlendMode, 18u);
-    EXPECT_EQ(ML::kIdentityMotionRecord.mOpacity, 1.0f);
-
-    const struct
+    for (const auto& field : fields)
     {
-        const char* mName;
-        std::function<void(ML::MotionRecord&)> mChange;
-        bool mSameGeometry;
-    } changes[] = {
-        {"anchor", [](auto& r) { r.mAnchorY = 0.f; }, false},
-        {"position", [](auto& r) { r.mPositionX = 0.f; }, false},
-        {"scale", [](auto& r) { r.mScaleY = 2.f; }, false},
-        {"rotation", [](auto& r) { r.mRotation = 90.0; }, false},
-        {"reserved 1", [](auto& r) { r.mReserved1 = 0.f; }, false},
-        {"reserved 2", [](auto& r) { r.mReserved2 = 1; }, true},
-        {"reserved 3", [](auto& r) { r.mReserved3 = 1.0; }, false},
-        {"media aspect", [](auto& r) { r.mMediaPixelAspect = 1.f; }, true},
-        {"media size", [](auto& r) { r.mMediaHeight = 4; }, false},
-        {"reserved 4", [](auto& r) { r.mReserved4 = 1; }, true},
-        {"blend mode", [](auto& r) { r.mBlendMode = kIR_BlendMode_Screen; }, true},
-        {"opacity", [](auto& r) { r.mOpacity = 0.5f; }, true},
-    };
-    for (const auto& change : changes)
-    {
-        SCOPED_TRACE(change.mName);
-        ML::MotionRecord record;
-        change.mChange(record);
-        EXPECT_EQ(ML::SameGeometry(record, ML::kIdentityMotionRecord), change.mSameGeometry);
-        const bool blendOrOpacity =
-            std::string(change.mName) == "blend mode" || std::string(change.mName) == "opacity";
-        EXPECT_EQ(ML::SameMotion(record, ML::kIdentityMotionRecord),
-                  change.mSameGeometry && !blendOrOpacity);
+        SCOPED_TRACE(field.mExpected);
+        EXPECT_EQ(field.mOffset, field.mExpected);
+        R record;
+        reinterpret_cast<unsigned char*>(&record)[field.mOffset + 3] ^= 0x08;
+        EXPECT_EQ(ML::SameGeometry(record, ML::kIdentityMotionRecord), field.mSameGeometry);
+        EXPECT_EQ(ML::SameMotion(record, ML::kIdentityMotionRecord), field.mSameMotion);
     }
 }
 
