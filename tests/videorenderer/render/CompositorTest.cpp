@@ -299,6 +299,12 @@ TEST_F(CompositorTest, ConformingIdentityLayerPassesThroughAndEmptyContentKeepsT
     const MF::IVideoFrame* painted = nullptr;
     layer->mProducer->mPaint = [&](MF::IVideoFrame& ioFrame) { painted = &ioFrame; };
     EXPECT_EQ(Render(MakeCompositor({{NodeRef(layer.Get())}}), mParams).Get(), painted);
+    // A faded layer alone keeps its opacity (over nothing, its alpha is halved).
+    ML::MotionRecord half;
+    half.mOpacity = 0.5f;
+    const auto alone = MakeLayer(kBlue, {{mParams.GetFirstFieldTime(), half}});
+    const FrameRef halved = Render(MakeCompositor({{NodeRef(alone.Get())}}), mParams);
+    EXPECT_NEAR(PixelAt(*halved, 3, 2)[3], 128, 1);
 
     const FrameRef frame = vrtest::MakeFrame(8, 4);
     EXPECT_EQ(ML::ApplyMotion(frame, ML::kIdentityMotionRecord, ML::kIdentityMotionRecord, mParams),

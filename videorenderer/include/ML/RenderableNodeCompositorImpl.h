@@ -109,7 +109,9 @@ public:
     const std::vector<Layer>& GetLayers() const { return mLayers; }
 
     // The layers composited bottom-up; the black frame without layers. A
-    // failing layer answers its status and discards the layers drawn so far.
+    // failing layer answers its status and discards the layers drawn so far;
+    // a failed draw answers kResult_RenderFailed. The bottom layer is drawn
+    // alone through its geometry and opacity (ApplyMotion when it is opaque).
     // When only one field is needed, an interlaced result is reduced to it.
     QRT::Result ProduceFrame(const MF::FrameTime& inTime, const CutlistRenderParams& inParams,
                              QRT::InterfaceRef<MF::IVideoFrame>& outFrame) override;

@@ -5,6 +5,7 @@
 #include "ML/CutlistRenderer.h"
 #include "ML/IRenderableNodeIntrinsicParameterProvider.h"
 #include "ML/RenderFlags.h"
+#include "ML/RenderStatus.h"
 #include "QRT/Allocated.h"
 #include "QRT/Exception.h"
 #include "QRT/Hash.h"
@@ -179,6 +180,9 @@ QRT::Result CompositorProducer::CompositeLayers(const MF::FrameTime& inTime,
             // stays faded. Without a lower frame no blend mode applies.
             result = CompositeLayer(frame, layer.mFirstFieldMotion, layer.mSecondFieldMotion, {},
                                     inParams);
+        // A failed draw discards the composite rather than delivering part of it.
+        if (!result)
+            return kResult_RenderFailed;
     }
     outFrame = std::move(result);
     return QRT::kResult_Success;
