@@ -83,17 +83,17 @@ QRT::InterfaceRef<LayerNode> MakeLayer(const Bgra& inColor,
     return node;
 }
 
-struct LayerSpec
+struct LayerInput
 {
     NodeRef mNode;
     std::int64_t mOffset = 0;
     std::uint32_t mTrack = 0;
 };
 
-NodeRef MakeCompositor(const std::vector<LayerSpec>& inLayers)
+NodeRef MakeCompositor(const std::vector<LayerInput>& inLayers)
 {
     auto compositor = ML::RenderableNodeCompositorImpl::Create();
-    for (const LayerSpec& layer : inLayers)
+    for (const LayerInput& layer : inLayers)
         compositor->AddTrackInput(layer.mNode, Ticks(layer.mOffset), layer.mTrack);
     compositor->MakeImmutable();
     return compositor->GetSelfReference();
@@ -216,7 +216,7 @@ TEST_F(CompositorTest, FlagsAreTheInputsAndWithoutInputsTheBlackFrameIsRendered)
     } cases[] = {{{}, 92}, {{255}, 92}, {{92 | 1, 84}, 84}, {{84 | 8, 1}, 0}};
     for (const auto& testCase : cases)
     {
-        std::vector<LayerSpec> layers;
+        std::vector<LayerInput> layers;
         for (const std::uint32_t flags : testCase.mInputFlags)
             layers.push_back({graphtest::MakeLeaf("Leaf", flags)});
         EXPECT_EQ(MakeCompositor(layers)->GetRenderFlags(), testCase.mExpected);
