@@ -103,6 +103,13 @@ QRT::InterfaceRef<MF::IRenderableNode> RenderableNodeClipImpl::GetSelfReference(
     return QRT::InterfaceRef<MF::IRenderableNode>(this);
 }
 
+void RenderableNodeClipImpl::MixKindIntoHash(QRT::HashValue& ioHash) const
+{
+    RenderableNodeCommonImpl::MixKindIntoHash(ioHash);
+    QRT::MixHash::MixInString(ioHash, std::string_view("TimeTransform::"));
+    mTransform->MixIntoHash(ioHash);
+}
+
 std::uint32_t RenderableNodeClipImpl::OperatorFlags() const
 {
     std::uint32_t flags = kRenderFlagMask_Operators;

@@ -81,6 +81,10 @@ public:
     QRT::ImmutableString GetNodeType() const override;
     QRT::InterfaceRef<MF::IRenderableNode> GetSelfReference();
 
+    // The type, then the time transform: clips that play other parts of
+    // their input (another in point, say) are not interchangeable, so their
+    // hashes differ even where every key is equal.
+    void MixKindIntoHash(QRT::HashValue& ioHash) const override;
     std::uint32_t ComputeRenderFlags() const override;
     QRT::InterfaceRef<MF::ITimeTransform> GetTimeTransform() const override;
 
