@@ -4,6 +4,7 @@
 #include "ML/IRenderableNodeOperatorProvider.h"
 #include "MediaNodeTestSupport.h"
 #include "VF/VideoFrame.h"
+#include "graph/ClipTimeTransforms.h"
 #include "graph/RenderableNodeClipImpl.h"
 
 namespace graphtest
@@ -124,6 +125,35 @@ TEST(ClipNodeTest, ClipTimeMapsToMediaTime)
     }
 }
 
+TEST(ClipNodeTest, TimeTransformsMapBothWays)
+{
+    using ML::CreateRemapTimeTransform;
+    const auto remap = [](std::vector<BE::CurveKey> inKeys)
+    { return CreateRemapTimeTransform(BE::KeyframeCurve::Scalar(0, std::move(inKeys))); };
+    const struct
+    {
+        const char* mName;
+        ML::TimeTransformRef mTransform;
+        TickTime mOuter, mInner, mInverse;
+    } cases[] = {
+        {"remap rising", remap({Key(0, 0.08), Key(8, 0.4)}), Frames(2), Frames(4), Frames(2)},
+        {"remap falling", remap({Key(0, 0.32), Key(8, 0)}), Frames(2), Frames(6), Frames(2)},
+        {"remap turning", remap({Key(0, 0), Key(4, 0.4), Key(8, 0)}), Frames(2), Frames(5),
+         mt::kTime_Invalid},
+        {"chain",
+         ML::CreateMultiTimeTransform(
+             {MF::CreateTimeTransform(2), remap({Key(0, 0), Key(8, 0.32)})}),
+         Frames(2), Frames(4), Frames(2)},
+        {"hold", ML::CreateHoldTimeTransform(Frames(3)), Frames(7), Frames(3), mt::kTime_Invalid},
+    };
+    for (const auto& c : cases)
+    {
+        SCOPED_TRACE(c.mName);
+        EXPECT_EQ(c.mTransform->Transform(c.mOuter), c.mInner);
+        EXPECT_EQ(c.mTransform->InverseTransform(c.mInner), c.mInverse);
+    }
+}
+
 TEST(ClipNodeTest, ClipsOfOneMediaShareFramesAndEffectsChangeThem)
 {
     const BE::MediaRef moving = Pattern("pattern:moving?size=64x36");
@@ -230,22 +260,22 @@ TEST(ClipNodeTest, IntrinsicParametersEvaluateMotion)
     held.mFrameHold = {Frames(2), true, false};
     ML::MotionRecord identity = ML::kIdentityMotionRecord;
     identity.mMediaPixelAspect = 1.0f;
-    ML::MotionRecord expectedMove = identity;
-    expectedMove.mPositionX = 0.75f;
-    expectedMove.mPositionY = 0.25f;
-    expectedMove.mAnchorX = expectedMove.mAnchorY = 0.75f;
-    expectedMove.mScaleX = expectedMove.mScaleY = 0.5f;
-    expectedMove.mRotation = 30;
-    expectedMove.mOpacity = 0.5f;
-    expectedMove.mBlendMode = kIR_BlendMode_Multiply;
-    expectedMove.mMediaWidth = 32;
-    expectedMove.mMediaHeight = 18;
-    ML::MotionRecord slid = identity;
-    slid.mPositionX = 1.0f;
-    slid.mMediaWidth = 32;
-    slid.mMediaHeight = 18;
-    ML::MotionRecord heldSlide = slid;
-    heldSlide.mPositionX = 0.75f;
+    // A moved media's record: its geometry, opacity, blend mode and size.
+    const auto recordOf = [&](float inX, float inY, float inAnchor, float inScale,
+                              double inRotation, float inOpacity, IR_BlendMode inBlend)
+    {
+        ML::MotionRecord record = identity;
+        record.mPositionX = inX;
+        record.mPositionY = inY;
+        record.mAnchorX = record.mAnchorY = inAnchor;
+        record.mScaleX = record.mScaleY = inScale;
+        record.mRotation = inRotation;
+        record.mOpacity = inOpacity;
+        record.mBlendMode = inBlend;
+        record.mMediaWidth = 32;
+        record.mMediaHeight = 18;
+        return record;
+    };
     const struct
     {
         const char* mName;
@@ -254,9 +284,12 @@ TEST(ClipNodeTest, IntrinsicParametersEvaluateMotion)
         ML::MotionRecord mRecord;
     } cases[] = {
         {"untouched", Item(media), 3, identity},
-        {"moved, scaled, rotated", Item(media, {}, moved), 3, expectedMove},
-        {"sliding", Item(media, {}, sliding), 4, slid},
-        {"held with filters", Item(media, held, sliding), 6, heldSlide},
+        {"moved, scaled, rotated", Item(media, {}, moved), 3,
+         recordOf(0.75f, 0.25f, 0.75f, 0.5f, 30, 0.5f, kIR_BlendMode_Multiply)},
+        {"sliding", Item(media, {}, sliding), 4,
+         recordOf(1.0f, 0.5f, 0.5f, 1, 0, 1, kIR_BlendMode_Normal)},
+        {"held with filters", Item(media, held, sliding), 6,
+         recordOf(0.75f, 0.5f, 0.5f, 1, 0, 1, kIR_BlendMode_Normal)},
     };
     for (const auto& c : cases)
     {
