@@ -17,8 +17,6 @@
 #include "factory/CutlistFactory.h"
 #include "mvxmediatypes/PixelFormat.h"
 
-#include <gtest/gtest.h>
-
 #include <cmath>
 #include <cstdint>
 #include <cstdlib>
@@ -27,6 +25,8 @@
 #include <sstream>
 #include <string>
 #include <vector>
+
+#include <gtest/gtest.h>
 
 namespace ML
 {
@@ -125,8 +125,7 @@ std::vector<FrameLine> RenderTimeline(const std::string& inPath)
                 MF::FrameTime::Make(mt::TickTime::FromFrame(frame, settings.mFrameRate),
                                     mt::kFieldType_Progressive, mt::kTime_Zero));
             params.mWidth = params.mFullFrameWidth = static_cast<std::uint32_t>(settings.mWidth);
-            params.mHeight = params.mFullFrameHeight =
-                static_cast<std::uint32_t>(settings.mHeight);
+            params.mHeight = params.mFullFrameHeight = static_cast<std::uint32_t>(settings.mHeight);
             params.mPixelAspectRatio = params.mFullFramePixelAspectRatio =
                 settings.mPixelAspectRatio;
             params.mPixelFormat = mt::kPixelFormat_BGRA_4444_8u;
@@ -190,8 +189,8 @@ TEST_P(GoldenFramesTest, FramesMatchTheirGoldenLines)
         }
         ASSERT_EQ(rendered[i].mMeans.size(), golden[i].mMeans.size());
         for (std::size_t m = 0; m < golden[i].mMeans.size(); ++m)
-            EXPECT_NEAR(rendered[i].mMeans[m], golden[i].mMeans[m], kFloatTolerance) << "block "
-                                                                                     << m;
+            EXPECT_NEAR(rendered[i].mMeans[m], golden[i].mMeans[m], kFloatTolerance)
+                << "block " << m;
     }
 }
 

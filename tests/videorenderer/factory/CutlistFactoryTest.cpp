@@ -2,18 +2,19 @@
 // segments fall, what their trees are, which edits change which hashes, the
 // other operations, and the factory's publication by the module.
 
+#include "factory/CutlistFactory.h"
+
 #include "BE/Sequence.h"
 #include "BE/TimelineFile.h"
 #include "MF/RenderableCutlistFactory.h"
 #include "ML/RenderFlags.h"
 #include "ML/VideoRenderer.h"
 #include "QRT/Allocated.h"
-#include "factory/CutlistFactory.h"
-
-#include <gtest/gtest.h>
 
 #include <string>
 #include <vector>
+
+#include <gtest/gtest.h>
 
 namespace ML
 {
@@ -35,8 +36,8 @@ TickTime Frames(std::int64_t inFrames)
 // A 64x36 sequence at 25 frames per second of the given tracks (JSON).
 BE::SequenceRef Sequence(const std::string& inTracks)
 {
-    const std::string text = R"({"sequences": [{"name": "S", "size": [64, 36], "tracks": [)" +
-                             inTracks + "]}]}";
+    const std::string text =
+        R"({"sequences": [{"name": "S", "size": [64, 36], "tracks": [)" + inTracks + "]}]}";
     const BE::TimelineLoadResult loaded = BE::ParseTimeline(text, "test.json", ".");
     EXPECT_EQ(loaded.mError, "");
     return loaded.mMain;
@@ -63,7 +64,8 @@ std::vector<Segment> Segments(const CutlistRef& inCutlist)
     {
         TickTime start, end, offset;
         Segment segment{};
-        EXPECT_EQ(inCutlist->GetSegment(i, start, end, offset, segment.mHash), QRT::kResult_Success);
+        EXPECT_EQ(inCutlist->GetSegment(i, start, end, offset, segment.mHash),
+                  QRT::kResult_Success);
         QRT::InterfaceRef<MF::IRenderableNode> node;
         EXPECT_EQ(inCutlist->GetNodeByHash(segment.mHash, node), QRT::kResult_Success);
         segment.mLayers = node->GetInputCount();
@@ -119,10 +121,14 @@ TEST_F(CutlistFactoryTest, SegmentsFallWhereTheSetOfActiveItemsChanges)
         {"two overlapping clips",
          R"({"items": [)" + Item(0, 20) + R"(]}, {"items": [)" + Item(10, 30) + "]}", all,
          "0-10/1 10-20/2 20-30/1"},
-        {"a range starting inside a clip", R"({"items": [)" + Item(0, 20) + "]}",
-         {{Frames(5), kTime_Max}}, "5-20/1"},
-        {"two ranges", R"({"items": [)" + Item(0, 40) + "]}",
-         {{Frames(5), Frames(10)}, {Frames(30), Frames(35)}}, "5-10/1 30-35/1"},
+        {"a range starting inside a clip",
+         R"({"items": [)" + Item(0, 20) + "]}",
+         {{Frames(5), kTime_Max}},
+         "5-20/1"},
+        {"two ranges",
+         R"({"items": [)" + Item(0, 40) + "]}",
+         {{Frames(5), Frames(10)}, {Frames(30), Frames(35)}},
+         "5-10/1 30-35/1"},
         {"a still without an end",
          R"({"items": [{"start": 0, "end": "100f", "media": {"pattern": "pattern:bars"}}]})", all,
          "0-100/1"},
@@ -139,8 +145,8 @@ TEST_F(CutlistFactoryTest, SegmentsFallWhereTheSetOfActiveItemsChanges)
 TEST_F(CutlistFactoryTest, EditsChangeTheHashesOfTheSegmentsTheyTouchOnly)
 {
     // Track 0: A [0, 20) and B [40, 60); track 1: C [10, 30).
-    const std::string base = R"({"items": [)" + Item(0, 20) + "," + Item(40, 60) +
-                             R"(]}, {"items": [)";
+    const std::string base =
+        R"({"items": [)" + Item(0, 20) + "," + Item(40, 60) + R"(]}, {"items": [)";
     const auto hashes = [&](const std::string& inTrack1)
     {
         std::vector<QRT::Guid> result;
