@@ -6,8 +6,9 @@
 #include "ML/RenderStatus.h"
 #include "QRT/Hash.h"
 #include "VF/VideoFrame.h"
+#include "VF/VideoFrameManipulators.h"
 #include "mvxcore/debug/Contract.h"
-#include "render/FramePixels.h"
+#include "render/VideoFrameCompositeUtilities.h"
 
 #include <algorithm>
 #include <utility>
@@ -17,6 +18,9 @@ namespace ML
 
 namespace
 {
+
+// The colour a frame with alpha is flattened onto.
+constexpr std::uint32_t kOpaqueBlack = 0xFF000000u;
 
 std::uint32_t NonNegative(std::int32_t inValue)
 {
@@ -400,11 +404,15 @@ void RenderFrameRequest::Render(QRT::InterfaceRef<MF::IVideoFrame>& outFrame,
 
     if (frame && mCompositeOnBlack && frame->HasAlpha())
     {
-        frame = VF::MakeWriteableVideoFrame(
-            frame, static_cast<mvxmediatypes::RenderQuality>(params.mQuality));
-        const QRT::Result status = CompositeFrameOnBlack(*frame);
+        // Opaque black of the frame's own format, size and alpha kind, with
+        // the frame composited over it.
+        QRT::InterfaceRef<MF::IVideoFrame> black = frame->CreateEmptyFrame(false);
+        QRT::Result status = VF::VideoFrameManipulators::FillWithColor(black, kOpaqueBlack);
+        if (QRT::Succeeded(status))
+            status = CompositeFrameAtOffset(frame, black, 0, 0);
         if (QRT::Failed(status))
             throw RenderRequestException(status);
+        frame = std::move(black);
     }
     outFrame = std::move(frame);
 }

@@ -45,18 +45,4 @@ QRT::Result ConvertFramePixels(const QRT::InterfaceRef<MF::IVideoFrame>& inSourc
                            destination.Height(), static_cast<std::int32_t>(inQuality));
 }
 
-QRT::Result CompositeFrameOnBlack(MF::IVideoFrame& ioFrame)
-{
-    const std::uint32_t format =
-        GetImageRendererFormat(ioFrame.GetPixelFormat(), ioFrame.GetAlphaChannel());
-    if (!IR_IsValidPixelFormat(format))
-        return kResult_RenderFailed;
-    const QRT::ParamRect bounds = ioFrame.GetBounds();
-    const QRT::Result status =
-        IR_CompositeToBlack(ioFrame.GetWritableBaseAddress(), ioFrame.GetRowBytes(), format,
-                            bounds.Width(), bounds.Height(), 1.0f);
-    ioFrame.AlphaChanged();
-    return status;
-}
-
 } // namespace ML

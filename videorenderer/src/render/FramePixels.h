@@ -1,9 +1,9 @@
 #pragma once
 
 // Pixel work on whole frames that the render pipeline needs around the node
-// graph: converting (and scaling) one frame into another for conforming, and
-// flattening a frame with alpha onto black. Thin adaptors from frames to the
-// image renderer's IR_* calls.
+// graph: the image renderer's reading of a frame's format, and converting
+// (and scaling) one frame into another for conforming. Thin adaptors from
+// frames to the image renderer's IR_* calls.
 //
 // Plain functions; callable from any thread at once on different frames. A
 // destination is never a shared frame.
@@ -28,8 +28,5 @@ std::uint32_t GetImageRendererFormat(mvxmediatypes::PixelFormat inFormat,
 QRT::Result ConvertFramePixels(const QRT::InterfaceRef<MF::IVideoFrame>& inSource,
                                const QRT::InterfaceRef<MF::IVideoFrame>& inDestination,
                                std::uint32_t inQuality);
-
-// Composites inFrame (not shared) onto black at full opacity, in place.
-QRT::Result CompositeFrameOnBlack(MF::IVideoFrame& ioFrame);
 
 } // namespace ML
