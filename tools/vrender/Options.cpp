@@ -18,9 +18,7 @@ namespace mt = mvxmediatypes;
 
 constexpr char kDefaultOutputPattern[] = "out/frames/frame_%05d.png";
 constexpr std::string_view kPatternPrefix = "pattern:";
-constexpr char kDemoMedia[] = "pattern:moving?size=1280x720";
 constexpr char kDemoOutputPattern[] = "out/demo/frame_%05d.png";
-constexpr std::int64_t kDemoFrameCount = 50;
 
 std::string Quoted(std::string_view inText)
 {
@@ -51,7 +49,7 @@ std::optional<std::uint64_t> ParseUnsigned(std::string_view inText)
 }
 
 // The raster formats, which can be rendered to and written out.
-std::string RenderableFormatNames()
+std::string RasterFormatNames()
 {
     std::string names;
     for (const mt::PixelFormat format : mt::GetPixelFormatCatalogue())
@@ -65,17 +63,13 @@ std::string RenderableFormatNames()
     return names;
 }
 
-// The names of a ", "-separated list.
-std::vector<std::string_view> SplitNames(std::string_view inList)
+bool IsFilterOption(std::string_view inName)
 {
-    std::vector<std::string_view> names;
-    while (!inList.empty())
-    {
-        const std::size_t comma = inList.find(", ");
-        names.push_back(inList.substr(0, comma));
-        inList = comma == std::string_view::npos ? std::string_view() : inList.substr(comma + 2);
-    }
-    return names;
+    static const std::set<std::string_view> kFilters = {
+        "--reverse-field-dominance", "--field-reverse", "--deinterlace", "--remove-flicker",
+        "--interlace-consecutive",   "--frame-blend",   "--scale",       "--speed",
+        "--remove-pulldown"};
+    return kFilters.contains(inName);
 }
 
 // Parses the options after the command into ioResult; stops at the first
@@ -83,11 +77,10 @@ std::vector<std::string_view> SplitNames(std::string_view inList)
 class OptionParser
 {
 public:
-    OptionParser(std::span<const std::string_view> inArguments, ParsedCommandLine& ioResult,
-                 bool inTakesMedia)
+    OptionParser(std::span<const std::string_view> inArguments, ParsedCommandLine& ioResult)
         : mArguments(inArguments)
         , mResult(ioResult)
-        , mTakesMedia(inTakesMedia)
+        , mTakesMedia(ioResult.mCommand != Command::kDemo)
     {
     }
 
@@ -118,8 +111,11 @@ public:
         if (!mResult.Succeeded())
             return;
         if (mTakesMedia && !mHaveMedia)
-            return Fail("source: no media given (an image file, a .y4m file or a pattern: "
-                        "text such as pattern:bars)");
+            return Fail(mResult.mCommand == Command::kRender
+                            ? "render: no timeline file given (a .json timeline, see "
+                              "docs/timeline-format.md)"
+                            : "source: no media given (an image file, a .y4m file or a pattern: "
+                              "text such as pattern:bars)");
         Finish();
     }
 
@@ -207,12 +203,14 @@ private:
                 filters.mFrameBlend = true;
             return;
         }
-        if (name == "--quiet" || name == "--y4m" || name == "--overwrite")
+        if (name == "--quiet" || name == "--y4m" || name == "--overwrite" || name == "--keep-going")
         {
             if (inlineValue)
                 return Fail(std::string(name) + " takes no value");
             if (name == "--quiet")
                 options.mQuiet = true;
+            else if (name == "--keep-going")
+                options.mKeepGoing = true;
             else if (name == "--overwrite")
                 options.mOverwrite = true;
             else
@@ -330,10 +328,10 @@ private:
             const std::optional<mt::PixelFormat> format = mt::PixelFormatFromName(*value);
             if (!format)
                 return Fail(prefix + "unknown pixel format " + Quoted(*value) + " (one of " +
-                            RenderableFormatNames() + ")");
+                            RasterFormatNames() + ")");
             if (!format->IsRaster() || format->IsPlanar())
                 return Fail(prefix + Quoted(*value) + " cannot be rendered to (one of " +
-                            RenderableFormatNames() + ")");
+                            RasterFormatNames() + ")");
             options.mPixelFormat = *format;
         }
         else if (name == "--field")
@@ -432,7 +430,16 @@ private:
         RenderOptions& options = mResult.mOptions;
         // A pattern text is an argument like any other: a mistake in it is
         // found here, before the renderer starts.
-        if (mTakesMedia && options.mMedia.starts_with(kPatternPrefix))
+        const bool isSource = mResult.mCommand == Command::kSource;
+        if (!isSource)
+            for (const std::string& seen : mSeen)
+                if (IsFilterOption(seen))
+                    return Fail(seen + " applies to vrender source only (a timeline sets it on "
+                                       "the clip)");
+        // A timeline is rendered at any size and ratio without a scaler.
+        if (!isSource)
+            options.mFilters.mScale = false;
+        if (isSource && options.mMedia.starts_with(kPatternPrefix))
         {
             const BE::PatternParseResult pattern = BE::ParsePatternSettings(options.mMedia);
             if (!pattern.Succeeded())
@@ -626,154 +633,51 @@ ParsedCommandLine ParseCommandLine(std::span<const std::string_view> inArguments
                 return result;
             }
         }
-        if (!rest.empty())
+        if (!rest.empty() && rest[0] == "--demo")
+            result.mOptions.mBuiltInTimeline = true;
+        else if (!rest.empty())
             result.mOptions.mMedia = std::string(rest[0]);
         if (rest.size() > 1)
             result.mError = "info: unexpected argument " + Quoted(rest[1]) +
-                            " (info prints the built-in example cutlist, or one timeline file)";
+                            " (info prints the built-in example cutlist, one timeline file, or the "
+                            "demo timeline "
+                            "with --demo)";
     }
     else if (command == "demo")
     {
         result.mCommand = Command::kDemo;
         result.mOptions = MakeDemoOptions();
-        OptionParser parser(rest, result, false);
+        OptionParser parser(rest, result);
         parser.Run();
     }
-    else if (command == "source")
+    else if (command == "source" || command == "render")
     {
-        result.mCommand = Command::kSource;
-        OptionParser parser(rest, result, true);
+        result.mCommand = command == "source" ? Command::kSource : Command::kRender;
+        OptionParser parser(rest, result);
         parser.Run();
     }
     else if (command.starts_with("-"))
-        result.mError = "a command comes first: source, info, demo or help (got option " +
+        result.mError = "a command comes first: render, source, info, demo or help (got option " +
                         Quoted(command) + ")";
     else
         result.mError =
-            "unknown command " + Quoted(command) + " (commands: source, info, demo, help)";
+            "unknown command " + Quoted(command) + " (commands: render, source, info, demo, help)";
     return result;
 }
 
 RenderOptions MakeDemoOptions()
 {
     RenderOptions options;
-    options.mMedia = kDemoMedia;
-    options.mStart = 0;
-    options.mCount = kDemoFrameCount;
+    options.mBuiltInTimeline = true;
     options.mOutputPath = kDemoOutputPattern;
     // out/demo/ is the demo's own: a second demo replaces the first.
     options.mOverwrite = true;
     return options;
 }
 
-std::string GetUsageText()
+std::string RenderableFormatNames()
 {
-    std::string text = R"(vrender: renders video frames through the VideoRenderer module.
-
-Usage:
-  vrender                       render the built-in demo (a moving pattern, 50 frames
-                                at 1280x720) into out/demo/, replacing an earlier demo
-  vrender source MEDIA [options]
-                                render frames of one media source
-  vrender info                  print the built-in example cutlist (colours as
-                                0xAARRGGBB)
-  vrender info TIMELINE         print a timeline file (.json): its sequences,
-                                tracks, items and media
-  vrender demo [options]        the demo, with options as for source
-  vrender --help                this text
-
-MEDIA is an image file (.png, .jpg), a Y4M file (.y4m), or a generated pattern:
-  pattern:KIND[?KEY=VALUE&...]  KIND bars, solid, gradient (still pictures) or
-                                moving (a new picture every frame); keys
-                                size=WxH, rate=R, field=progressive|upper|lower,
-                                par=N:D, alpha=none|straight|premultiplied,
-                                opacity=0..255, matte=RRGGBB, color=RRGGBB (solid),
-                                from=RRGGBB and to=RRGGBB (gradient)
-  e.g. pattern:moving?size=1920x1080&rate=50
-
-Options:
-  --frames A:B        frames A to B, both included
-  --start N           first frame (default 0)
-  --count N           number of frames (default: the whole file; 1 for a still
-                      image or a still pattern; 50 for pattern:moving, which
-                      has no end)
-  --size WxH          output size (default: the source's)
-  --par N:D           output pixel aspect ratio (default: the source's)
-  --format NAME       pixel format to render in (default BGRA_4444_8u), one of
-)";
-    // The format names, wrapped under the option's description.
-    const std::string names = RenderableFormatNames();
-    std::string line = "                     ";
-    for (const std::string_view name : SplitNames(names))
-    {
-        if (line.size() + name.size() + 2 > 78)
-        {
-            text += line + "\n";
-            line = "                     ";
-        }
-        line += " ";
-        line += name;
-        line += ",";
-    }
-    line.back() = '\n';
-    text += line;
-    text += R"(  --field F           progressive, upper or lower (default: the source's)
-  --rate R            frame rate of the frame grid and of Y4M output, e.g. 25,
-                      30000/1001, 29.97 (default: the source's, a pattern's
-                      rate= included; 25 for still images)
-  --quality Q         0 (draft) to 5 (best, the default)
-  -o PATTERN          numbered PNG files, e.g. out/frame_%05d.png
-                      (default out/frames/frame_%05d.png); the number is the
-                      source frame's: --frames 10:19 writes frame_00010.png
-                      to frame_00019.png
-  -o FILE.y4m         a Y4M file
-  -o -, --y4m         a Y4M stream on standard output, e.g.
-                      vrender source pattern:moving --y4m > out.y4m
-  --output-dir DIR    PNG files DIR/frame_00000.png, ...
-  -y, --overwrite     replace PNG files of the same pattern from an earlier
-                      render and remove its frames outside the new range
-                      (without it, such files stop the render; files that do
-                      not match the pattern are never touched)
-  --chroma C          Y4M chroma: 420 (default) or 444
-  -j, --jobs N        frames in flight, 1 to 64 (default: twice the cores)
-  --memory SIZE       memory the frames in flight may take, e.g. 512M or 4G
-                      (default: half the physical memory); fewer frames are
-                      kept in flight when they need more
-  -q, --quiet         no progress bar (warnings and errors still show)
-  -h, --help          this text
-
-PNG files are 8-bit for 8-bit formats and 16-bit for deeper ones (16u, 32f),
-RGBA when the frame has alpha that is not opaque, else RGB.
-
-Filters, stacked on the source in this order:
-  --remove-pulldown P       remove 2:3 pulldown; P is the cadence phase of
-                            frame 0: AA, BB, BC, CD or DD (replaces the
-                            field filters below)
-  --reverse-field-dominance treat the source's field order as swapped
-  --field-reverse           deliver the fields in the requested order
-  --deinterlace             keep one field and rebuild the other
-  --remove-flicker          vertical flicker filter
-  --interlace-consecutive   interlace each two consecutive frames (not for
-                            still sources: ignored with a warning)
-  --scale WxH               scale to WxH with pixel-aspect correction (--par
-                            also brings in the scaler)
-  --speed S                 re-time by S (0.5 slow motion, -1 reverse) with
-                            frame mixing, or frame blending with --frame-blend
-                            (not for still sources: ignored with a warning)
-
-Ctrl-C or SIGTERM cancels the frames in flight and stops within a second,
-leaving only complete files.
-
-Exit status:
-  0    every frame was written
-  1    a failure while rendering: unreadable media (also a FIFO or device), a
-       frame that failed, a frame too large for the memory budget, an output
-       that cannot be written or that would replace an earlier render
-  2    bad arguments (the message names the argument and the problem)
-  130  cancelled with Ctrl-C (SIGINT)
-  143  cancelled with SIGTERM
-)";
-    return text;
+    return RasterFormatNames();
 }
 
 std::vector<std::string> GetStillSourceWarnings(const RenderOptions& inOptions)

@@ -26,7 +26,8 @@ namespace vrender
 enum class Command
 {
     kHelp,   // print the usage
-    kDemo,   // the built-in demo (no arguments, or "demo")
+    kDemo,   // the built-in demo timeline (no arguments, or "demo")
+    kRender, // render frames of a timeline file
     kSource, // render frames of one media source
     kInfo,   // print a cutlist
 };
@@ -78,8 +79,10 @@ struct FilterOptions
 
 struct RenderOptions
 {
-    // The media: a file path or a "pattern:" text.
+    // The media (a file path or a "pattern:" text), or the timeline file.
     std::string mMedia;
+    // Render the built-in demo timeline instead of mMedia.
+    bool mBuiltInTimeline = false;
     // First frame and number of frames; unset means the whole media (or the
     // default length of endless media).
     std::optional<std::int64_t> mStart;
@@ -112,6 +115,9 @@ struct RenderOptions
     // remove its frames outside the new range. Without it such files stop
     // the render before anything is written.
     bool mOverwrite = false;
+    // --keep-going: a frame that fails is reported and written black, and
+    // the render goes on; the exit status is still 1.
+    bool mKeepGoing = false;
     FilterOptions mFilters;
 };
 
@@ -128,12 +134,15 @@ struct ParsedCommandLine
 // Parses the arguments after the program name.
 ParsedCommandLine ParseCommandLine(std::span<const std::string_view> inArguments);
 
-// The options of the built-in demo: the moving pattern at 1280x720, 50
-// frames, PNG files in out/demo/, replacing those of an earlier demo.
+// The options of the built-in demo: the demo timeline (DemoTimeline.h) as
+// PNG files in out/demo/, replacing those of an earlier demo.
 RenderOptions MakeDemoOptions();
 
 // The text of --help.
 std::string GetUsageText();
+
+// The names of the pixel formats --format takes, ", "-separated.
+std::string RenderableFormatNames();
 
 // Warnings for the options that cannot apply to a still source (a still
 // image or a still pattern): "--speed does not apply to a still source

@@ -20,6 +20,7 @@
 #include <chrono>
 #include <cinttypes>
 #include <cmath>
+#include <functional>
 #include <map>
 #include <memory>
 #include <new>
@@ -63,6 +64,8 @@ struct FrameResult
     bool mCancelled = false;
     // Empty on success.
     std::string mError;
+    // With --keep-going: why the frame was written black; empty otherwise.
+    std::string mFailure;
 };
 
 // State shared between the loop and the callbacks, which run on the module's
@@ -70,30 +73,28 @@ struct FrameResult
 // late callback never reaches freed state.
 struct SharedState
 {
-    SharedState(std::int64_t inFirst, BE::VideoSourceRef inMedia, SourceRef inSource,
-                std::unique_ptr<FrameWriter> inWriter, RenderPlan inPlan,
-                QRT::InterfaceRef<MF::ITimeTransform> inTimeTransform, std::string inMediaNote)
+    SharedState(std::int64_t inFirst, std::unique_ptr<FrameWriter> inWriter, RenderPlan inPlan,
+                RenderInput inInput, bool inKeepGoing)
         : mWindow(inFirst)
-        , mMedia(std::move(inMedia))
-        , mSource(std::move(inSource))
+        , mSource(std::move(inInput.mSource))
         , mWriter(std::move(inWriter))
         , mPlan(inPlan)
-        , mTimeTransform(std::move(inTimeTransform))
-        , mMediaNote(std::move(inMediaNote))
+        , mTimeTransform(std::move(inInput.mTimeTransform))
+        , mExplainFailure(std::move(inInput.mExplainFailure))
+        , mKeepGoing(inKeepGoing)
     {
     }
 
     OrderingWindow<FrameResult> mWindow;
-    // The media under mSource, which may know why a read failed.
-    const BE::VideoSourceRef mMedia;
     const SourceRef mSource;
     const std::unique_ptr<FrameWriter> mWriter;
     const RenderPlan mPlan;
     // Output time to media time (--speed); empty when frames are not re-timed.
     const QRT::InterfaceRef<MF::ITimeTransform> mTimeTransform;
-    // What opening the media noted about damage it works around (a Y4M file
-    // whose last frame is cut short); empty for sound media.
-    const std::string mMediaNote;
+    // Why a frame came without a picture.
+    const std::function<std::string(std::int64_t)> mExplainFailure;
+    // A failed frame is written black and the render goes on.
+    const bool mKeepGoing;
 };
 
 // The delivered frame in the stream's size and in the render's format, or
@@ -171,6 +172,21 @@ SourceRef StackFilters(SourceRef inSource, const FilterOptions& inFilters,
     return source;
 }
 
+// An opaque black frame of the stream: what --keep-going writes in place of
+// a frame that failed.
+FrameRef MakeStandInFrame(const RenderPlan& inPlan)
+{
+    const StreamInfo& stream = inPlan.mStream;
+    FrameRef frame;
+    if (QRT::Failed(VF::CreateVideoFrame(mt::kPixelFormat_BGRA_4444_8u, stream.mWidth,
+                                         stream.mHeight, stream.mPixelAspectRatio, false, false,
+                                         frame)) ||
+        QRT::Failed(VF::VideoFrameManipulators::FillWithColor(frame, 0xFF000000u)))
+        return {};
+    frame->SetFieldType(stream.mFieldType);
+    return frame;
+}
+
 // Runs on the encoder pool: finishes one delivered frame.
 FrameResult FinishFrame(SharedState& inState, std::int64_t inIndex, FrameRef inFrame,
                         bool inCancelled, int inStatus)
@@ -183,25 +199,22 @@ FrameResult FinishFrame(SharedState& inState, std::int64_t inIndex, FrameRef inF
         result.mCancelled = true;
         return result;
     }
-    if (inStatus < 0)
-    {
-        result.mError = name + ": the render failed (status " + StatusText(inStatus) + ")";
-        return result;
-    }
     try
     {
-        // Success without a frame: the source could not render this time.
-        // In media with a damaged frame, that frame is the cause.
-        if (!inFrame)
+        std::string failure;
+        if (inStatus < 0)
+            failure = "the render failed (status " + StatusText(inStatus) + ")";
+        else if (!inFrame)
+            // Success without a frame: the source could not render this time.
+            failure = inState.mExplainFailure(inIndex);
+        if (!failure.empty())
         {
-            // The decoder's reason for this frame, else what opening the media
-            // noted about damage it works around.
-            std::string cause = BE::GetLastReadFailure(inState.mMedia);
-            if (cause.empty())
-                cause = inState.mMediaNote.empty() ? std::string("the source delivered no frame")
-                                                   : inState.mMediaNote;
-            result.mError = name + ": " + cause;
-            return result;
+            if (!inState.mKeepGoing || !(inFrame = MakeStandInFrame(inState.mPlan)))
+            {
+                result.mError = name + ": " + failure;
+                return result;
+            }
+            result.mFailure = name + ": " + failure;
         }
         std::string problem;
         const FrameRef frame = ConformToStream(inFrame, inState.mPlan, *inState.mWriter, problem);
@@ -230,7 +243,6 @@ FrameResult FinishFrame(SharedState& inState, std::int64_t inIndex, FrameRef inF
     return result;
 }
 
-// A speed as the user writes it ("-2", "0.5").
 std::string FormatSpeed(double inSpeed)
 {
     char text[32];
@@ -376,6 +388,11 @@ public:
             if (!mState->mWriter->Finish(error))
                 Fail(error);
         }
+        if (mError.empty() && mFailedFrames > 0)
+            mError = mFailedFrames == 1
+                         ? mFirstFailure + " (written black)"
+                         : std::to_string(mFailedFrames) +
+                               " frames failed and were written black; the first, " + mFirstFailure;
         RenderOutcome outcome;
         outcome.mFramesWritten = mWritten;
         outcome.mSeconds = mProgress.GetElapsedSeconds();
@@ -467,6 +484,14 @@ private:
         std::string error;
         if (!writer.Commit(ioResult.mEncoded, error))
             return Fail(error);
+        if (!ioResult.mFailure.empty())
+        {
+            mProgress.Clear();
+            std::fprintf(mEnvironment.mProgress, "vrender: %s; written black\n",
+                         ioResult.mFailure.c_str());
+            if (mFailedFrames++ == 0)
+                mFirstFailure = ioResult.mFailure;
+        }
         ++mWritten;
         if (mEnvironment.mFramesWritten)
             mEnvironment.mFramesWritten->store(mWritten);
@@ -497,6 +522,9 @@ private:
     // Frame index to request identifier of the requests not yet taken.
     std::map<std::int64_t, unsigned int> mInFlight;
     std::int64_t mWritten = 0;
+    // Frames written black with --keep-going, and the first one's reason.
+    std::int64_t mFailedFrames = 0;
+    std::string mFirstFailure;
     bool mStopping = false;
     bool mCancelled = false;
     bool mAbandoned = false;
@@ -542,8 +570,8 @@ bool PlanRender(const RenderOptions& inOptions, const SourceFacts& inSource,
     // own sampling (planar 4:2:0, or 4:4:4 Y'CbCr): a source that has it
     // hands its samples over unconverted. Filters work in BGRA.
     const bool asStored = inOptions.mOutputKind != OutputKind::kPngSequence &&
-                          !inOptions.mFilters.Any() && stream.mWidth == inSource.mWidth &&
-                          stream.mHeight == inSource.mHeight;
+                          !inSource.mComposited && !inOptions.mFilters.Any() &&
+                          stream.mWidth == inSource.mWidth && stream.mHeight == inSource.mHeight;
     plan.mPixelFormat = inOptions.mPixelFormat.value_or(!asStored ? mt::kPixelFormat_BGRA_4444_8u
                                                         : inOptions.mChroma == Y4MChroma::k420
                                                             ? mt::kPixelFormat_YUV_420_8u_Planar
@@ -634,6 +662,30 @@ bool PlanRender(const RenderOptions& inOptions, const SourceFacts& inSource,
     return true;
 }
 
+RenderOutcome RunRenderLoop(RenderInput inInput, const RenderPlan& inPlan,
+                            const RenderOptions& inOptions, const RenderEnvironment& inEnvironment)
+{
+    RenderOutcome outcome;
+    outcome.mExitCode = 1;
+    std::unique_ptr<FrameWriter> writer = CreateWriter(inOptions, inEnvironment);
+    if (!writer->Begin(inPlan.mStream, outcome.mError))
+        return outcome;
+    auto state = std::make_shared<SharedState>(inPlan.mFirst, std::move(writer), inPlan,
+                                               std::move(inInput), inOptions.mKeepGoing);
+    const ExecutorRef encoders =
+        mvxcore::threads::CreateThreadPoolExecutor(mvxcore::threads::GetCPUCoreCount());
+
+    RenderLoop loop(state, encoders, inEnvironment);
+    outcome = loop.Run();
+    if (!loop.WasAbandoned())
+    {
+        // Every frame has been delivered; the pool only has to wind down.
+        encoders->BeginShutdown();
+        encoders->WaitForRunningTasks();
+    }
+    return outcome;
+}
+
 RenderOutcome RunRender(const RenderOptions& inOptions, const RenderEnvironment& inEnvironment)
 {
     RenderOutcome outcome;
@@ -658,35 +710,28 @@ RenderOutcome RunRender(const RenderOptions& inOptions, const RenderEnvironment&
 
     // The adaptor declares what the source says of itself, so frames are
     // sampled on the source's own time line whatever the output rate.
-    SourceRef source = ML::CreateRenderableSource(
+    RenderInput input;
+    input.mSource = ML::CreateRenderableSource(
         media, MF::BinaryData(), media->GetAlphaChannel(), media->GetMatteColor(), false, false,
         media->GetFrameRate(), media->GetFieldType(), media->GetPixelAspectRatio(),
         media->GetColorProfile());
-    if (!source)
+    if (!input.mSource)
     {
         outcome.mError = "'" + inOptions.mMedia + "': the renderer cannot wrap this media";
         return outcome;
     }
-
-    std::unique_ptr<FrameWriter> writer = CreateWriter(inOptions, inEnvironment);
-    if (!writer->Begin(plan.mStream, outcome.mError))
-        return outcome;
-    QRT::InterfaceRef<MF::ITimeTransform> timeTransform;
-    source = StackFilters(source, inOptions.mFilters, facts, plan.mMediaStart, timeTransform);
-    auto state = std::make_shared<SharedState>(plan.mFirst, media, source, std::move(writer), plan,
-                                               timeTransform, opened.mMessage);
-    const ExecutorRef encoders =
-        mvxcore::threads::CreateThreadPoolExecutor(mvxcore::threads::GetCPUCoreCount());
-
-    RenderLoop loop(state, encoders, inEnvironment);
-    outcome = loop.Run();
-    if (!loop.WasAbandoned())
+    input.mSource = StackFilters(input.mSource, inOptions.mFilters, facts, plan.mMediaStart,
+                                 input.mTimeTransform);
+    // The decoder's reason for a frame, else what opening the media noted
+    // about damage it works around.
+    input.mExplainFailure = [media, note = opened.mMessage](std::int64_t)
     {
-        // Every frame has been delivered; the pool only has to wind down.
-        encoders->BeginShutdown();
-        encoders->WaitForRunningTasks();
-    }
-    return outcome;
+        std::string cause = BE::GetLastReadFailure(media);
+        if (cause.empty())
+            cause = note.empty() ? std::string("the source delivered no frame") : note;
+        return cause;
+    };
+    return RunRenderLoop(std::move(input), plan, inOptions, inEnvironment);
 }
 
 } // namespace vrender

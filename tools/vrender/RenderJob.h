@@ -17,7 +17,10 @@
 // be up (ML::VideoRenderer::Initialize) for the whole call.
 
 #include "FrameWriters.h"
+#include "MF/TimeTransform.h"
+#include "ML/IRenderableSource.h"
 #include "Options.h"
+#include "QRT/InterfaceRef.h"
 #include "mvxmediatypes/FieldType.h"
 #include "mvxmediatypes/FrameRate.h"
 #include "mvxmediatypes/PixelAspectRatio.h"
@@ -26,6 +29,7 @@
 #include <atomic>
 #include <cstdint>
 #include <cstdio>
+#include <functional>
 #include <string>
 
 namespace vrender
@@ -42,6 +46,9 @@ struct SourceFacts
     mvxmediatypes::PixelAspectRatio mPixelAspectRatio;
     // kTime_Max for media without an end.
     mvxmediatypes::TickTime mDuration = mvxmediatypes::kTime_Max;
+    // Frames are composited (a sequence): they are made in BGRA whatever the
+    // output takes.
+    bool mComposited = false;
 };
 
 // Frames of endless media rendered when no range is given.
@@ -113,6 +120,29 @@ struct RenderEnvironment
     std::atomic<std::int64_t>* mFramesWritten = nullptr;
 };
 
+// What the loop renders: the source, the mapping of output time to the
+// source's time when frames are re-timed, and why a frame failed.
+struct RenderInput
+{
+    QRT::InterfaceRef<ML::IRenderableSource> mSource;
+    // Empty when frames are not re-timed.
+    QRT::InterfaceRef<MF::ITimeTransform> mTimeTransform;
+    // Why frame N came without a picture, naming the file where it can.
+    // Called on the encoder pool, any number at once.
+    std::function<std::string(std::int64_t)> mExplainFailure;
+};
+
+// Renders the frames of inPlan from inInput.mSource and writes them as
+// inOptions says (the loop of the header comment).
+RenderOutcome RunRenderLoop(RenderInput inInput, const RenderPlan& inPlan,
+                            const RenderOptions& inOptions, const RenderEnvironment& inEnvironment);
+
+// `vrender source`: one media source with the filters of inOptions.
 RenderOutcome RunRender(const RenderOptions& inOptions, const RenderEnvironment& inEnvironment);
+
+// `vrender render` and the demo: a timeline file, or the built-in demo
+// timeline, through the cutlist factory and the cutlist source.
+RenderOutcome RunTimelineRender(const RenderOptions& inOptions,
+                                const RenderEnvironment& inEnvironment);
 
 } // namespace vrender

@@ -17,6 +17,8 @@
 
 #include "BE/TimelineFile.h"
 #include "CutlistInfo.h"
+#include "DemoTimeline.h"
+#include "MF/RenderableCutlistFactory.h"
 #include "ML/RenderExecutors.h"
 #include "ML/VideoRenderer.h"
 #include "Options.h"
@@ -130,27 +132,49 @@ public:
     RendererSession& operator=(const RendererSession&) = delete;
 };
 
-// Prints the timeline file inPath; each missing media file is warned of once.
+// Prints the timeline file inPath (the demo timeline when inPath is empty):
+// its sequences, then the cutlist the factory builds of its main sequence.
+// Each missing media file is warned of once.
 int RunTimelineInfo(const std::string& inPath)
 {
-    const BE::TimelineLoadResult loaded = BE::LoadTimelineFile(inPath);
+    const BE::TimelineLoadResult loaded =
+        inPath.empty()
+            ? BE::ParseTimeline(vrender::GetDemoTimelineText(), vrender::kDemoTimelineName, ".")
+            : BE::LoadTimelineFile(inPath);
     if (!loaded.Succeeded())
     {
         std::fprintf(stderr, "vrender: %s\n", loaded.mError.c_str());
         return 2;
     }
-    for (const std::string& missing : loaded.mMissingFiles)
-        std::fprintf(stderr, "vrender: warning: %s: media file not found; it plays as offline\n",
-                     missing.c_str());
-    const std::string text = vrender::DescribeSequence(loaded.mMain);
+    if (!inPath.empty())
+        for (const std::string& missing : loaded.mMissingFiles)
+            std::fprintf(stderr,
+                         "vrender: warning: %s: media file not found; it plays as offline\n",
+                         missing.c_str());
+    std::string text = vrender::DescribeSequence(loaded.mMain);
+    {
+        RendererSession session;
+        QRT::InterfaceRef<MF::IRenderableCutlist> cutlist;
+        const auto factory = MF::GetCutlistFactory();
+        if (!factory ||
+            QRT::Failed(factory->CreateSequenceCutlist(
+                loaded.mMain, QRT::ImmutableString::CreateDynamic(loaded.mMain->GetName()),
+                cutlist)) ||
+            !cutlist)
+        {
+            std::fprintf(stderr, "vrender: the renderer could not build the sequence's cutlist\n");
+            return 1;
+        }
+        text += "\n" + vrender::DescribeCutlist(*cutlist);
+    }
     std::fwrite(text.data(), 1, text.size(), stdout);
     return 0;
 }
 
-int RunInfo(const std::string& inTimeline)
+int RunInfo(const vrender::RenderOptions& inOptions)
 {
-    if (!inTimeline.empty())
-        return RunTimelineInfo(inTimeline);
+    if (!inOptions.mMedia.empty() || inOptions.mBuiltInTimeline)
+        return RunTimelineInfo(inOptions.mMedia);
     RendererSession session;
     const auto cutlist = vrender::CreateExampleCutlist();
     const std::string text = vrender::DescribeCutlist(*cutlist);
@@ -158,8 +182,9 @@ int RunInfo(const std::string& inTimeline)
     return 0;
 }
 
-int RunRender(const vrender::RenderOptions& inOptions, bool inDemo)
+int RunRender(const vrender::RenderOptions& inOptions, vrender::Command inCommand)
 {
+    const bool demo = inCommand == vrender::Command::kDemo;
     if (inOptions.mOutputKind == vrender::OutputKind::kY4MStream && isatty(STDOUT_FILENO))
     {
         std::fprintf(stderr, "vrender: standard output is a terminal; redirect the Y4M stream "
@@ -170,15 +195,16 @@ int RunRender(const vrender::RenderOptions& inOptions, bool inDemo)
     environment.mShowProgress = !inOptions.mQuiet && isatty(STDERR_FILENO);
     environment.mCancel = &sCancelRequested;
     environment.mFramesWritten = &sFramesWritten;
-    if (inDemo)
-        std::fprintf(stderr, "vrender: rendering the demo (%s, %lld frames)\n",
-                     inOptions.mMedia.c_str(),
-                     static_cast<long long>(inOptions.mCount.value_or(0)));
+    if (demo)
+        std::fprintf(stderr, "vrender: rendering %s (vrender info --demo prints it)\n",
+                     vrender::kDemoTimelineName);
 
     vrender::RenderOutcome outcome;
     {
         RendererSession session;
-        outcome = vrender::RunRender(inOptions, environment);
+        outcome = inCommand == vrender::Command::kSource
+                      ? vrender::RunRender(inOptions, environment)
+                      : vrender::RunTimelineRender(inOptions, environment);
     }
     if (outcome.mExitCode == 130)
     {
@@ -194,7 +220,7 @@ int RunRender(const vrender::RenderOptions& inOptions, bool inDemo)
     const std::string summary =
         vrender::FormatSummary(outcome.mFramesWritten, outcome.mSeconds, outcome.mWhere);
     std::fprintf(stderr, "%s\n", summary.c_str());
-    if (inDemo && outcome.mFramesWritten > 0 &&
+    if (demo && outcome.mFramesWritten > 0 &&
         inOptions.mOutputKind == vrender::OutputKind::kPngSequence)
     {
         const std::int64_t first = inOptions.mStart.value_or(0);
@@ -231,11 +257,11 @@ int main(int inArgc, char** inArgv)
             return 0;
         }
         case vrender::Command::kInfo:
-            return RunInfo(parsed.mOptions.mMedia);
+            return RunInfo(parsed.mOptions);
         case vrender::Command::kDemo:
-            return RunRender(parsed.mOptions, true);
+        case vrender::Command::kRender:
         case vrender::Command::kSource:
-            return RunRender(parsed.mOptions, false);
+            return RunRender(parsed.mOptions, parsed.mCommand);
         }
     }
     catch (const std::exception& inException)

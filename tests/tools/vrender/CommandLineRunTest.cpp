@@ -164,8 +164,8 @@ TEST_F(CommandLineRunTest, HelpNamesEveryFormatTheExitCodesAndTheNumbering)
     for (const char* text :
          {"Exit status:\n  0 ", "\n  1 ", "\n  2    bad arguments", "\n  130  cancelled",
           "\n  143  cancelled", "--frames 10:19 writes frame_00010.png",
-          "1 for a still\n                      image "
-          "or a still pattern; 50 for pattern:moving"})
+          "1\n                      for a still image or a still pattern; 50 for\n"
+          "                      pattern:moving"})
         EXPECT_NE(help.mOut.find(text), std::string::npos) << text;
 }
 

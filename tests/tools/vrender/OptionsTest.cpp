@@ -35,7 +35,8 @@ auto Fields(const RenderOptions& inOptions)
                     inOptions.mJobs, inOptions.mQuiet, filters.mRemovePulldown,
                     filters.mReverseFieldDominance, filters.mFieldReverse, filters.mDeinterlace,
                     filters.mRemoveFlicker, filters.mInterlaceConsecutive, filters.mScale,
-                    filters.mSpeed, filters.mFrameBlend, inOptions.mOverwrite);
+                    filters.mSpeed, filters.mFrameBlend, inOptions.mOverwrite, inOptions.mKeepGoing,
+                    inOptions.mBuiltInTimeline);
 }
 
 // The words of inText, split at spaces.
@@ -120,9 +121,18 @@ TEST_F(OptionsTest, ArgumentsBecomeTheseOptions)
         EXPECT_EQ(Fields(parsed.mOptions), Fields(expected));
     }
     RenderOptions demo;
-    std::tie(demo.mMedia, demo.mStart, demo.mCount, demo.mOutputPath, demo.mOverwrite) =
-        std::tuple("pattern:moving?size=1280x720", 0, 50, "out/demo/frame_%05d.png", true);
+    std::tie(demo.mBuiltInTimeline, demo.mOutputPath, demo.mOverwrite) =
+        std::tuple(true, "out/demo/frame_%05d.png", true);
     EXPECT_EQ(Fields(Parse("").mOptions), Fields(demo));
+    // A timeline takes the output options; --par needs no scaler there.
+    const vrender::ParsedCommandLine render =
+        Parse("render t.json --par 10:11 --keep-going --frames 3:4");
+    RenderOptions rendered;
+    std::tie(rendered.mMedia, rendered.mPixelAspectRatio, rendered.mKeepGoing, rendered.mStart,
+             rendered.mCount, rendered.mOutputPath) =
+        std::tuple("t.json", mt::PixelAspectRatio(10, 11), true, 3, 2, "out/frames/frame_%05d.png");
+    EXPECT_EQ(render.mCommand, Command::kRender);
+    EXPECT_EQ(Fields(render.mOptions), Fields(rendered));
     // Asking for help wins over a mistake elsewhere.
     EXPECT_EQ(Parse("source x.png --size bad -h").mCommand, Command::kHelp);
 }
@@ -131,8 +141,12 @@ TEST_F(OptionsTest, RefusalsNameTheArgumentAndExitWithTwo)
 {
     // How each message begins; the program runs for a few of them.
     const std::pair<const char*, const char*> cases[] = {
-        {"render", "unknown command 'render' (commands: source, info, demo, help)"},
-        {"--size 10x10", "a command comes first: source, info, demo or help (got option '--size')"},
+        {"draw", "unknown command 'draw' (commands: render, source, info, demo, help)"},
+        {"--size 10x10",
+         "a command comes first: render, source, info, demo or help (got option '--size')"},
+        {"render", "render: no timeline file given (a .json timeline"},
+        {"render t.json --deinterlace", "--deinterlace applies to vrender source only"},
+        {"demo --speed 2", "--speed applies to vrender source only"},
         {"info a.json extra", "info: unexpected argument 'extra' (info prints the built-in"},
         {"demo media.png", "unexpected argument 'media.png'"},
         {"source", "source: no media given (an image file, a .y4m file or a pattern:"},
@@ -171,7 +185,7 @@ TEST_F(OptionsTest, RefusalsNameTheArgumentAndExitWithTwo)
     for (const auto& [args, error] : cases)
         EXPECT_THAT(Parse(args).mError, testing::StartsWith(error)) << args;
     for (const char* args :
-         {"render", "source m --size", "source m --chroma 444", "source pattern:nope"})
+         {"draw", "source m --size", "source m --chroma 444", "source pattern:nope"})
     {
         SCOPED_TRACE(args);
         const vrendertest::RunResult run = Run(Words(args));

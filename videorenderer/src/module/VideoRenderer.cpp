@@ -21,6 +21,7 @@
 #include "ML/RenderFrameQueue.h"
 #include "QRT/CriticalSection.h"
 #include "QRT/InterfaceRef.h"
+#include "factory/CutlistFactory.h"
 #include "module/ModuleInternals.h"
 #include "mvxcore/debug/Contract.h"
 #include "prefetch/MediaNodePrefetcher.h"
@@ -87,8 +88,9 @@ void BringModuleUpLocked()
     // plug-in table when its video-callbacks block is present. Joins start-up
     // with the legacy callbacks.
 
-    // Step: create the cutlist factory and publish it with
-    // MF::SetCutlistFactory. Joins start-up with the cutlist factory.
+    // Every renderable cutlist of the host is built by the module's factory
+    // from here on, until the last Shutdown withdraws it.
+    MF::SetCutlistFactory(CreateCutlistFactory());
 }
 
 // Steps of the last Shutdown, in order. The module lock is held.

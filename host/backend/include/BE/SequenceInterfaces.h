@@ -15,6 +15,7 @@
 //   IMediaStream       one video stream of a media
 //   IMediaDuration     the media's length (answered by the media)
 //   IStillRanges       where the media's picture does not change (the media)
+//   ISequenceOverlay   a cutlist laid over a sequence's own
 //
 // Every object is immutable once built (BE/Sequence.h), so every operation
 // may be called from any thread at once. References handed out keep the
@@ -184,6 +185,21 @@ public:
 
 protected:
     ~IStillRanges() = default;
+};
+
+// A cutlist that is rendered in place of a sequence's own wherever it has
+// segments (a part of the sequence rendered ahead, say); the sequence fills
+// the rest. Handed to the cutlist factory beside the sequence.
+class ISequenceOverlay : public QRT::QRTUnknown
+{
+public:
+    QRT_INTERFACE_ID("{2917b008-6311-47be-b3dd-21df65b53e78}");
+
+    // Sealed; empty when nothing is laid over the sequence.
+    virtual QRT::InterfaceRef<MF::IRenderableCutlist> GetOverlayCutlist() const = 0;
+
+protected:
+    ~ISequenceOverlay() = default;
 };
 
 } // namespace BE

@@ -1,0 +1,358 @@
+// CutlistFactory: the operations of MF::IRenderableCutlistFactory over the
+// back end's sequence objects.
+
+#include "factory/CutlistFactory.h"
+
+#include "BE/SequenceInterfaces.h"
+#include "ML/IMutableCutlist.h"
+#include "ML/RenderFlags.h"
+#include "ML/RenderableNodeCompositorImpl.h"
+#include "QRT/Allocated.h"
+#include "QRT/Exception.h"
+#include "factory/CutlistMerge.h"
+#include "factory/SegmentSweep.h"
+#include "graph/SequenceNodes.h"
+
+#include <algorithm>
+#include <map>
+#include <utility>
+#include <vector>
+
+namespace ML
+{
+namespace
+{
+
+using mvxmediatypes::kTime_Max;
+using mvxmediatypes::kTime_Min;
+using mvxmediatypes::kTime_Zero;
+using mvxmediatypes::TickTime;
+using NodeRef = QRT::InterfaceRef<MF::IRenderableNode>;
+using CutlistRef = QRT::InterfaceRef<MF::IRenderableCutlist>;
+
+template <class T>
+T& Require(const QRT::InterfaceRef<T>& inRef)
+{
+    if (!inRef)
+        throw QRT::NullInterfaceException();
+    return *inRef.Get();
+}
+
+// The picture a sequence's nodes are built for: the sequence's settings when
+// it answers them, else the defaults at a frame rate of 1.
+struct BuildContext
+{
+    BE::SequenceSettings mSettings;
+    bool mHasSettings = false;
+};
+
+BuildContext ContextOf(const QRT::InterfaceRef<QRT::QRTUnknown>& inSequence)
+{
+    BuildContext context;
+    if (const auto settings = QRT::QueryRef<BE::ISequenceSettings>(inSequence))
+    {
+        context.mSettings = settings->GetSequenceSettings();
+        context.mHasSettings = true;
+    }
+    else
+    {
+        context.mSettings.mFrameRate = mvxmediatypes::FrameRate::Create(1, 1);
+    }
+    return context;
+}
+
+// One track of a sweep: its index, mute and items.
+struct TrackItems
+{
+    std::uint32_t mTrackIndex = 0;
+    bool mMuted = false;
+    std::vector<QRT::InterfaceRef<BE::ITrackItem>> mItems;
+    // The items' identifiers within their sequence ("MediaNode::ClipID").
+    std::vector<std::int32_t> mClipIDs;
+};
+
+// The work of one factory operation: the trees of one sequence and of the
+// sequences it nests, every item's clip subtree and every nested cutlist
+// built once.
+class TreeBuilder
+{
+public:
+    CutlistRef BuildTrackGroup(const BE::ITrackGroup& inGroup, const BuildContext& inContext,
+                               const MF::TickTimeRangeList& inRanges,
+                               const QRT::ImmutableString& inName)
+    {
+        std::vector<TrackItems> tracks;
+        std::vector<SweepTrack> sweep;
+        std::int32_t clipID = 0;
+        for (std::size_t index = 0; index < inGroup.GetTrackCount(); ++index)
+        {
+            BE::IVideoTrack& track = Require(inGroup.GetTrack(index));
+            TrackItems& items = tracks.emplace_back();
+            items.mTrackIndex = track.GetTrackIndex();
+            items.mMuted = track.GetTrackSettings().mMuted;
+            SweepTrack& swept = sweep.emplace_back();
+            for (std::size_t item = 0; item < track.GetItemCount(); ++item)
+            {
+                auto ref = track.GetItem(item);
+                const BE::TrackItemSettings& settings = Require(ref).GetSettings();
+                swept.push_back({settings.mStart, settings.mEnd});
+                items.mItems.push_back(std::move(ref));
+                items.mClipIDs.push_back(clipID++);
+            }
+        }
+
+        const QRT::InterfaceRef<IMutableCutlist> cutlist = CreateMutableCutlist(inName);
+        // Ranges are swept one by one into one cutlist; sealing orders the
+        // segments and lets an earlier range's segment win where two overlap.
+        for (const MF::TickTimeRange& range : inRanges)
+        {
+            for (const SweptSegment& segment : SweepSegments(sweep, range.first, range.second))
+            {
+                TickTime origin = kTime_Max;
+                for (const ActiveItem& active : segment.mActive)
+                    origin = std::min(origin, sweep[active.mTrack][active.mItem].mStart);
+                const QRT::InterfaceRef<RenderableNodeCompositorImpl> compositor =
+                    RenderableNodeCompositorImpl::Create();
+                for (const ActiveItem& active : segment.mActive)
+                {
+                    const TrackItems& track = tracks[active.mTrack];
+                    compositor->AddTrackInput(ClipSubtree(track, active.mItem, inContext),
+                                              sweep[active.mTrack][active.mItem].mStart - origin,
+                                              track.mTrackIndex);
+                }
+                compositor->MakeImmutable();
+                cutlist->AddSegment(segment.mStart, segment.mEnd, segment.mStart - origin,
+                                    compositor->GetSelfReference());
+            }
+        }
+        cutlist->MakeImmutable();
+        return cutlist;
+    }
+
+    CutlistRef BuildSequence(const QRT::InterfaceRef<BE::ISequence>& inSequence,
+                             const MF::TickTimeRangeList& inRanges,
+                             const QRT::ImmutableString& inName)
+    {
+        BE::ISequence& sequence = Require(inSequence);
+        const BuildContext context = ContextOf(inSequence);
+        if (sequence.GetTrackGroupCount() == 0)
+        {
+            const QRT::InterfaceRef<IMutableCutlist> empty = CreateMutableCutlist(inName);
+            empty->MakeImmutable();
+            return empty;
+        }
+        return BuildTrackGroup(Require(sequence.GetTrackGroup(0)), context, inRanges, inName);
+    }
+
+    // The clip node of one item over its media node.
+    NodeRef ClipSubtree(const TrackItems& inTrack, std::size_t inItem,
+                        const BuildContext& inContext)
+    {
+        const QRT::InterfaceRef<BE::ITrackItem>& item = inTrack.mItems[inItem];
+        const auto found = mClips.find(item.Get());
+        if (found != mClips.end())
+            return found->second;
+
+        MediaNodeSetup media;
+        media.mMedia = Require(item).GetMedia();
+        media.mTrackItem = item;
+        media.mSequence = inContext.mSettings;
+        media.mHasSequence = inContext.mHasSettings;
+        media.mClipID = inTrack.mClipIDs[inItem];
+        media.mMuted = inTrack.mMuted;
+        media.mNestedCutlist = NestedCutlist(Require(media.mMedia));
+
+        ClipNodeSetup clip;
+        clip.mTrackItem = item;
+        clip.mInput = CreateMediaNode(media);
+        clip.mTrackID = inTrack.mTrackIndex;
+        NodeRef node = CreateClipNode(clip);
+        mClips.emplace(item.Get(), node);
+        return node;
+    }
+
+    // The whole cutlist of a nested-sequence media (empty for other media).
+    // Sequences are immutable and built bottom-up, so nesting has no cycles.
+    CutlistRef NestedCutlist(const BE::ISequenceMedia& inMedia)
+    {
+        const QRT::InterfaceRef<BE::ISequence> nested = inMedia.GetNestedSequence();
+        if (!nested)
+            return {};
+        const auto found = mNested.find(nested.Get());
+        if (found != mNested.end())
+            return found->second;
+        CutlistRef cutlist = BuildSequence(nested, {{kTime_Min, kTime_Max}},
+                                           QRT::ImmutableString::CreateDynamic(nested->GetName()));
+        mNested.emplace(nested.Get(), cutlist);
+        return cutlist;
+    }
+
+private:
+    std::map<const BE::ITrackItem*, NodeRef> mClips;
+    std::map<const BE::ISequence*, CutlistRef> mNested;
+};
+
+const MF::TickTimeRangeList kWholeTime{{kTime_Min, kTime_Max}};
+
+CutlistRef SealOneSegment(TickTime inStart, TickTime inEnd, const NodeRef& inInput)
+{
+    const QRT::InterfaceRef<RenderableNodeCompositorImpl> compositor =
+        RenderableNodeCompositorImpl::Create();
+    compositor->AddTrackInput(inInput, kTime_Zero, 0);
+    compositor->MakeImmutable();
+    const QRT::InterfaceRef<IMutableCutlist> cutlist = CreateMutableCutlist(QRT::ImmutableString());
+    cutlist->AddSegment(inStart, inEnd, kTime_Zero, compositor->GetSelfReference());
+    cutlist->MakeImmutable();
+    return cutlist;
+}
+
+class CutlistFactory : public QRT::Implements<MF::IRenderableCutlistFactory>
+{
+public:
+    QRT::Result CreateSequenceCutlist(const MF::HostObjectRef& inSequence,
+                                      const QRT::ImmutableString& inName,
+                                      CutlistRef& outCutlist) override
+    {
+        return CreateSequenceCutlistForRanges(inSequence, kWholeTime, inName, outCutlist);
+    }
+
+    QRT::Result CreateSequenceCutlistForRanges(const MF::HostObjectRef& inSequence,
+                                               const MF::TickTimeRangeList& inRanges,
+                                               const QRT::ImmutableString& inName,
+                                               CutlistRef& outCutlist) override
+    {
+        outCutlist.Reset();
+        const auto sequence = QRT::QueryRef<BE::ISequence>(inSequence);
+        if (!sequence)
+            return QRT::kResult_NotFound;
+        outCutlist = TreeBuilder().BuildSequence(sequence, inRanges, inName);
+        return QRT::kResult_Success;
+    }
+
+    QRT::Result CreateTrackGroupCutlist(const MF::HostObjectRef& inTrackGroup,
+                                        const QRT::ImmutableString& inName,
+                                        CutlistRef& outCutlist) override
+    {
+        return CreateTrackGroupCutlistForRanges(inTrackGroup, kWholeTime, inName, outCutlist);
+    }
+
+    QRT::Result CreateTrackGroupCutlistForRanges(const MF::HostObjectRef& inTrackGroup,
+                                                 const MF::TickTimeRangeList& inRanges,
+                                                 const QRT::ImmutableString& inName,
+                                                 CutlistRef& outCutlist) override
+    {
+        outCutlist.Reset();
+        const auto group = QRT::QueryRef<BE::ITrackGroup>(inTrackGroup);
+        if (!group)
+            return QRT::kResult_NotFound;
+        // A group alone does not know its sequence: its nodes are built for
+        // the default picture, which the render parameters then conform.
+        outCutlist =
+            TreeBuilder().BuildTrackGroup(*group, ContextOf(inTrackGroup), inRanges, inName);
+        return QRT::kResult_Success;
+    }
+
+    QRT::Result CreateTrackItemCutlist(const MF::HostObjectRef& inTrackItem,
+                                       CutlistRef& outCutlist) override
+    {
+        outCutlist.Reset();
+        const auto item = QRT::QueryRef<BE::ITrackItem>(inTrackItem);
+        if (!item)
+            return QRT::kResult_NotFound;
+        TrackItems track;
+        track.mItems.push_back(item);
+        track.mClipIDs.push_back(0);
+        const BE::TrackItemSettings& settings = item->GetSettings();
+        const NodeRef clip = TreeBuilder().ClipSubtree(track, 0, ContextOf(inTrackItem));
+        outCutlist = SealOneSegment(settings.mStart, settings.mEnd, clip);
+        return QRT::kResult_Success;
+    }
+
+    QRT::Result CreateMediaCutlist(const MF::HostObjectRef& inMedia,
+                                   CutlistRef& outCutlist) override
+    {
+        outCutlist.Reset();
+        const auto media = QRT::QueryRef<BE::ISequenceMedia>(inMedia);
+        if (!media)
+            return QRT::kResult_NotFound;
+        MediaNodeSetup setup;
+        setup.mMedia = media;
+        setup.mSequence.mPixelAspectRatio = mvxmediatypes::kPixelAspectRatio_Square;
+        setup.mSequence.mFrameRate = mvxmediatypes::kFrameRate_Zero;
+        setup.mNestedCutlist = TreeBuilder().NestedCutlist(*media);
+        const NodeRef node = CreateMediaNode(setup);
+        TickTime duration = kTime_Max;
+        if ((node->GetRenderFlags() & kRenderFlag_TimeInvariant) == 0)
+            duration = Require(QRT::QueryRef<BE::IMediaDuration>(inMedia)).GetDuration();
+        outCutlist = SealOneSegment(kTime_Zero, duration, node);
+        return QRT::kResult_Success;
+    }
+
+    // Preview nodes are made from the host's preview objects, which this
+    // host does not have: no object answers their interfaces.
+    QRT::Result CreatePreviewCutlist(const MF::HostObjectRef& /*inPreview*/,
+                                     CutlistRef& outCutlist) override
+    {
+        outCutlist.Reset();
+        return QRT::kResult_NotFound;
+    }
+
+    QRT::Result CreatePreviewSourceCutlist(const MF::HostObjectRef& /*inPreviewSource*/,
+                                           CutlistRef& outCutlist) override
+    {
+        outCutlist.Reset();
+        return QRT::kResult_NotFound;
+    }
+
+    QRT::Result CreateMergedCutlist(const std::vector<CutlistRef>& inCutlists,
+                                    const QRT::ImmutableString& inName,
+                                    CutlistRef& outCutlist) override
+    {
+        outCutlist.Reset();
+        if (std::none_of(inCutlists.begin(), inCutlists.end(),
+                         [](const CutlistRef& inCutlist) { return bool(inCutlist); }))
+            return QRT::kResult_NotFound;
+        // Folded from the first: what is merged so far wins over the next.
+        const QRT::InterfaceRef<IMutableCutlist> empty = CreateMutableCutlist(inName);
+        empty->MakeImmutable();
+        CutlistRef merged = empty;
+        for (const CutlistRef& next : inCutlists)
+            if (next)
+                merged = MergeCutlists(*merged, *next, inName);
+        outCutlist = merged;
+        return QRT::kResult_Success;
+    }
+
+    QRT::Result CreateSequenceCutlistWithObject(const MF::HostObjectRef& inExtra,
+                                                const MF::HostObjectRef& inSequence,
+                                                const QRT::ImmutableString& inName,
+                                                CutlistRef& outCutlist) override
+    {
+        outCutlist.Reset();
+        const auto overlay = QRT::QueryRef<BE::ISequenceOverlay>(inExtra);
+        const auto sequence = QRT::QueryRef<BE::ISequence>(inSequence);
+        if (!overlay || !sequence)
+            return QRT::kResult_NotFound;
+        const CutlistRef own = TreeBuilder().BuildSequence(sequence, kWholeTime, inName);
+        const CutlistRef laid = overlay->GetOverlayCutlist();
+        outCutlist = laid ? MergeCutlists(*laid, *own, inName) : own;
+        return QRT::kResult_Success;
+    }
+
+    QRT::InterfaceRef<MF::IRenderableCutlistFactory> GetSelfReference()
+    {
+        return QRT::InterfaceRef<MF::IRenderableCutlistFactory>(this);
+    }
+
+protected:
+    ~CutlistFactory() = default;
+};
+
+} // namespace
+
+QRT::InterfaceRef<MF::IRenderableCutlistFactory> CreateCutlistFactory()
+{
+    return QRT::Allocated<CutlistFactory>::Create<MF::IRenderableCutlistFactory>();
+}
+
+} // namespace ML
