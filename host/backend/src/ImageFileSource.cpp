@@ -167,7 +167,7 @@ public:
     {
     }
 
-    std::string GetFailure()
+    std::string GetLastReadFailure() const override
     {
         std::lock_guard lock(mDecodeMutex);
         return mFailure;
@@ -260,7 +260,7 @@ private:
     const ImageKind mKind;
     // Guards mDecoded and mFailure; held across the decode so that one
     // thread decodes.
-    std::mutex mDecodeMutex;
+    mutable std::mutex mDecodeMutex;
     FrameRef mDecoded;
     // The reason the latest decode failed; empty once one succeeds.
     std::string mFailure;
@@ -270,8 +270,8 @@ private:
 
 std::string GetLastReadFailure(const VideoSourceRef& inSource)
 {
-    auto* image = dynamic_cast<ImageFileSource*>(inSource.Get());
-    return image ? image->GetFailure() : std::string();
+    const auto* source = dynamic_cast<const detail::VideoSourceBase*>(inSource.Get());
+    return source ? source->GetLastReadFailure() : std::string();
 }
 
 OpenStatus OpenImageFileSource(const std::string& inPath, VideoSourceRef& outSource)

@@ -128,6 +128,11 @@ public:
     std::string GetMediaPath() const override;
     QRT::InterfaceRef<Deprecated::IMediaInfo> GetMediaInfo() override;
 
+    // Why the latest frame read failed, naming the file and the reason;
+    // empty when it succeeded or the source keeps no reason
+    // (BE::GetLastReadFailure).
+    virtual std::string GetLastReadFailure() const { return {}; }
+
 protected:
     explicit VideoSourceBase(SourceDescription inDescription);
     ~VideoSourceBase() = default;

@@ -19,6 +19,7 @@
 #include "mvxcore/utility/Strings.h"
 
 #include <algorithm>
+#include <atomic>
 #include <cerrno>
 #include <charconv>
 #include <cstring>
@@ -232,19 +233,28 @@ class Y4MSource : public detail::VideoSourceBase
 public:
     Y4MSource(detail::SourceDescription inDescription, const Y4MHeader& inHeader,
               std::shared_ptr<FileDescriptor> inFile, std::vector<std::uint64_t> inOffsets,
-              std::int64_t inCutFrame)
+              std::int64_t inCutFrame, std::string inCutReason)
         : VideoSourceBase(std::move(inDescription))
         , mHeader(inHeader)
         , mFile(std::move(inFile))
         , mOffsets(std::move(inOffsets))
         , mCutFrame(inCutFrame)
+        , mCutReason(std::move(inCutReason))
     {
+    }
+
+    // The cut frame is the one read that fails for a reason the source
+    // knows; any other read that fails leaves no reason.
+    std::string GetLastReadFailure() const override
+    {
+        return mLastReadWasCut.load(std::memory_order_relaxed) ? mCutReason : std::string();
     }
 
 protected:
     QRT::Result ProduceFrame(std::int64_t inIndex, PixelFormat inFormat,
                              FrameRef& outFrame) override
     {
+        mLastReadWasCut.store(inIndex == mCutFrame, std::memory_order_relaxed);
         if (inIndex == mCutFrame)
             return kResult_MediaMalformed;
         const std::uint64_t offset = mOffsets[static_cast<std::size_t>(inIndex)];
@@ -391,6 +401,8 @@ private:
     const std::vector<std::uint64_t> mOffsets;
     // The index of the last frame when the file cuts it short, else -1.
     const std::int64_t mCutFrame;
+    const std::string mCutReason;
+    std::atomic<bool> mLastReadWasCut{false};
 };
 
 OpenStatus Fail(const std::string& inPath, QRT::Result inStatus, const std::string& inProblem)
@@ -492,7 +504,8 @@ OpenStatus OpenY4MSource(const std::string& inPath, VideoSourceRef& outSource)
     description.mColorProfile.mName = header.mHeight < kBT709MinimumHeight ? "BT.601" : "BT.709";
 
     outSource = QRT::Allocated<Y4MSource>::Create<Deprecated::IVideoSource>(
-        std::move(description), header, std::move(file), std::move(offsets), cutFrame);
+        std::move(description), header, std::move(file), std::move(offsets), cutFrame,
+        cut.empty() ? std::string() : inPath + ": " + cut);
     if (!cut.empty())
         return OpenStatus{QRT::kResult_Success, inPath + ": " + cut};
     return {};

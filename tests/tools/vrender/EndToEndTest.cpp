@@ -109,6 +109,28 @@ TEST_F(EndToEndTest, ACutLastFrameFailsAloneAndIsNamed)
     EXPECT_EQ(std::distance(fs::directory_iterator(out), fs::directory_iterator()), 4);
 }
 
+TEST_F(EndToEndTest, ATimelineClipThatFailsToReadFailsItsFrameOnly)
+{
+    // The clip's cut frame 4 falls on the sequence's frame 6.
+    const std::string clip = WriteNumberedClip(mDirectory / "cut.y4m", 5, 10).string();
+    const std::string timeline = (mDirectory / "t.json").string();
+    std::ofstream(timeline) << R"({"sequences": [{"name": "T", "size": [8, 8], "tracks": [
+        {"items": [{"start": 0, "end": "8f", "media": {"color": "#404040"}}]},
+        {"items": [{"start": "2f", "end": "7f", "media": {"file": "cut.y4m"}}]}]}]})";
+    const std::string reason = "frame 6: " + clip + ": frame 4 is truncated: 182 of 192 bytes";
+    const auto stopped = Run({"render", timeline, "-j", "1", "--chroma", "444", "-o", "-"});
+    EXPECT_EQ(stopped.mExitCode, 1);
+    EXPECT_EQ(stopped.mErr, "vrender: " + reason + "\n");
+    // The solid reads as 1 in the numbering, black as -1.
+    EXPECT_EQ(NumberFrames(stopped.mOut), (std::vector<int>{1, 1, 0, 1, 2, 3}));
+
+    const auto going = Run({"render", timeline, "--keep-going", "--chroma", "444", "-o", "-"});
+    EXPECT_EQ(going.mExitCode, 1);
+    EXPECT_EQ(going.mErr,
+              "vrender: " + reason + "; written black\nvrender: " + reason + " (written black)\n");
+    EXPECT_EQ(NumberFrames(going.mOut), (std::vector<int>{1, 1, 0, 1, 2, 3, -1, 1}));
+}
+
 TEST_F(EndToEndTest, AFrameLargerThanTheMemoryBudgetIsRefusedBeforeRendering)
 {
     const auto run =

@@ -48,9 +48,9 @@ OpenStatus OpenImageFileSource(const std::string& inPath, VideoSourceRef& outSou
 
 // Why the source's latest frame read failed, naming the file and the
 // decoder's reason ("<path>: IDAT: CRC error"), for sources that keep it
-// (still images); empty when that read succeeded, none failed, or the
-// source keeps no reason. Frame requests answer only a status; this is the
-// rest of the story for a message.
+// (still images, the cut last frame of a Y4M file); empty when that read
+// succeeded, none failed, or the source keeps no reason. Frame requests
+// answer only a status; this is the rest of the story for a message.
 std::string GetLastReadFailure(const VideoSourceRef& inSource);
 
 // A Y4M file (8-bit 4:2:0, 4:2:2 or 4:4:4; progressive, upper or lower field
