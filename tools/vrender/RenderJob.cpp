@@ -432,9 +432,14 @@ private:
         params.mPixelFormat = plan.mPixelFormat;
         params.mQuality = stream.mQuality;
         params.mSecondaryQuality = stream.mQuality;
-        params.mFullFrameWidth = stream.mWidth;
-        params.mFullFrameHeight = stream.mHeight;
+        // A view of a larger or smaller picture renders its media at the
+        // output's scale of it.
+        params.mFullFrameWidth = plan.mFullFrameWidth != 0 ? plan.mFullFrameWidth : stream.mWidth;
+        params.mFullFrameHeight =
+            plan.mFullFrameHeight != 0 ? plan.mFullFrameHeight : stream.mHeight;
         params.mFullFramePixelAspectRatio = stream.mPixelAspectRatio;
+        params.mHorizontalScale = double(stream.mWidth) / params.mFullFrameWidth;
+        params.mVerticalScale = double(stream.mHeight) / params.mFullFrameHeight;
         params.mFrameRate = stream.mFrameRate;
         params.mFieldType = static_cast<std::uint32_t>(stream.mFieldType);
         // One pass over the material: its frames are not asked for again,

@@ -81,6 +81,10 @@ struct RenderPlan
     mvxmediatypes::TickTime mMediaStart = mvxmediatypes::kTime_Zero;
     // The memory one frame in flight takes, as estimated for the budget.
     std::uint64_t mFrameBytes = 0;
+    // The picture the frames are a view of (a sequence's frame, which the
+    // output may show smaller or larger); 0 x 0 means the output's own.
+    std::uint32_t mFullFrameWidth = 0;
+    std::uint32_t mFullFrameHeight = 0;
 };
 
 // Resolves the options against the source and the machine: frame range

@@ -118,6 +118,9 @@ RenderOutcome RunTimelineRender(const RenderOptions& inOptions,
         return outcome;
     }
 
+    plan.mFullFrameWidth = facts.mWidth;
+    plan.mFullFrameHeight = facts.mHeight;
+
     RenderInput input;
     input.mSource = ML::CreateRenderableCutlistSource(provider, settings.mFrameRate, name);
     const mt::FrameRate rate = plan.mStream.mFrameRate;
