@@ -80,6 +80,7 @@ bench-compare: deps build/build.ninja
 	cmake --build build -j $(JOBS) --target vrender
 	bench/compare/sources.sh
 	CORES=$(JOBS) bench/compare/sources.sh
+	bench/compare/jobs.sh
 
 # Build the libraries and vrender (Release) and install them under $(PREFIX),
 # with the headers, the CMake package and videorenderer.pc.
