@@ -92,7 +92,7 @@ void HeldFrames::EndHold()
 
 void HeldFrames::TrimLocked()
 {
-    const std::size_t capacity = mHoldCount > 0 ? kHeldCapacity : kIdleCapacity;
+    const std::size_t capacity = std::min(kIdleCapacity + 2 * mHoldCount, kHeldCapacity);
     while (mFrames.size() > capacity)
         mFrames.pop_back();
 }
