@@ -1,11 +1,12 @@
-// Weighted sums of 8-bit planes against the exact weighted sum computed in double:
-// widths covering every vector tail on every instruction set, rows of their own
-// lengths and misalignments, the in-place form, more sources than the stack holds,
-// and the contract on the weights.
-
-#include "IR/PlaneAccumulate.h"
+// The kernels of 8-bit planes on every instruction set, with widths covering every
+// vector tail and rows of their own lengths and misalignments: weighted sums against
+// the exact weighted sum computed in double (also in place, with more sources than
+// the stack holds, and the contract on the weights), and halving against the exact
+// mean of each 2x2 block.
 
 #include "ContractExpect.h"
+#include "IR/PlaneAccumulate.h"
+#include "IR/PlaneHalve.h"
 
 #include <cmath>
 #include <random>
@@ -19,15 +20,17 @@ namespace
 
 constexpr std::uint8_t kPad = 0xA5;
 constexpr std::int32_t kHeight = 3;
+constexpr std::int32_t kWidths[] = {1, 2, 3, 7, 15, 16, 17, 31, 33, 63, 65, 130};
 
-// A plane of kHeight rows of inWidth samples, inSlack padding bytes after each row
+// A plane of inRows rows of inWidth samples, inSlack padding bytes after each row
 // and inMisalign bytes before the first.
 struct Plane
 {
-    Plane(std::int32_t inWidth, std::int32_t inSlack, std::int32_t inMisalign)
+    Plane(std::int32_t inWidth, std::int32_t inSlack, std::int32_t inMisalign,
+          std::int32_t inRows = kHeight)
         : rowBytes(inWidth + inSlack)
         , misalign(inMisalign)
-        , storage(static_cast<std::size_t>(rowBytes * kHeight + inMisalign), kPad)
+        , storage(static_cast<std::size_t>(rowBytes * inRows + inMisalign), kPad)
     {
     }
     std::uint8_t* Data() { return storage.data() + misalign; }
@@ -124,7 +127,7 @@ TEST_P(PlaneAccumulateTest, MatchesTheExactSumAtEveryTailOnEveryInstructionSet)
     {
         SCOPED_TRACE(hwy::TargetName(target));
         hwy::SetSupportedTargetsForTest(target);
-        for (std::int32_t width : {1, 2, 3, 7, 15, 16, 17, 31, 33, 63, 65, 130})
+        for (std::int32_t width : kWidths)
         {
             SCOPED_TRACE(testing::Message() << "width " << width);
             Check(GetParam(), width);
@@ -135,6 +138,41 @@ TEST_P(PlaneAccumulateTest, MatchesTheExactSumAtEveryTailOnEveryInstructionSet)
 
 INSTANTIATE_TEST_SUITE_P(Weights, PlaneAccumulateTest, ::testing::ValuesIn(kCases),
                          [](const auto& inInfo) { return std::string(inInfo.param.name); });
+
+TEST(PlaneHalveTest, EverySampleIsTheRoundedMeanOfItsBlockOnEveryInstructionSet)
+{
+    for (const std::int64_t target : hwy::SupportedAndGeneratedTargets())
+    {
+        SCOPED_TRACE(hwy::TargetName(target));
+        hwy::SetSupportedTargetsForTest(target);
+        for (std::int32_t width : kWidths)
+        {
+            SCOPED_TRACE(testing::Message() << "width " << width);
+            std::mt19937 random(static_cast<std::uint32_t>(width));
+            Plane source(2 * width, 3, width % 4, 2 * kHeight);
+            for (std::uint8_t& sample : source.storage)
+                sample = static_cast<std::uint8_t>(random());
+            Plane out(width, 5, 1);
+            ASSERT_EQ(IR_HalvePlane8(source.Data(), source.rowBytes, out.Data(), out.rowBytes,
+                                     width, kHeight),
+                      kIR_NoError);
+            for (std::int32_t y = 0; y < kHeight; ++y)
+            {
+                for (std::int32_t x = 0; x < width; ++x)
+                {
+                    const double mean =
+                        (source.At(2 * x, 2 * y) + source.At(2 * x + 1, 2 * y) +
+                         source.At(2 * x, 2 * y + 1) + source.At(2 * x + 1, 2 * y + 1)) /
+                        4.0;
+                    ASSERT_EQ(out.At(x, y), std::floor(mean + 0.5)) << "x " << x << " y " << y;
+                }
+                for (std::int32_t b = width; b < out.rowBytes; ++b)
+                    ASSERT_EQ(out.At(b, y), kPad) << "padding of row " << y;
+            }
+        }
+    }
+    hwy::SetSupportedTargetsForTest(0);
+}
 
 TEST(PlaneAccumulateContractTest, RejectsWeightsOutsideOneAndMissingPlanes)
 {
