@@ -139,8 +139,8 @@ TEST_F(PlanRenderTest, ReverseEndlessMediaEndsAtTimeZero)
 
 // Y4M output of the source's size without filters asks for the stream's own
 // sampling, so that a source with it hands its samples over; so does 4:2:0
-// output re-timing progressive frames, which blends 4:2:0 planes. Everything
-// else renders in BGRA unless --format says otherwise.
+// output re-timing or scaling progressive frames, which work on 4:2:0 planes.
+// Everything else renders in BGRA unless --format says otherwise.
 TEST_F(PlanRenderTest, Y4MWithoutFiltersAsksForTheStreamsSampling)
 {
     using K = vrender::OutputKind;
@@ -150,6 +150,7 @@ TEST_F(PlanRenderTest, Y4MWithoutFiltersAsksForTheStreamsSampling)
         kDeinterlace = 1,
         kSpeed = 2,
         kInterlacedSource = 4,
+        kScale = 8,
     };
     // (output, chroma, filters and source, output width, --format, expected)
     const std::tuple<K, vrender::Y4MChroma, int, std::uint32_t, std::optional<mt::PixelFormat>,
@@ -176,6 +177,7 @@ TEST_F(PlanRenderTest, Y4MWithoutFiltersAsksForTheStreamsSampling)
         std::tie(options.mOutputKind, options.mChroma, options.mPixelFormat) =
             std::tuple(kind, chroma, format);
         options.mFilters.mDeinterlace = (filters & kDeinterlace) != 0;
+        options.mFilters.mScale = (filters & kScale) != 0;
         if ((filters & kSpeed) != 0)
             std::tie(options.mFilters.mSpeed, options.mFilters.mFrameBlend) = std::pair(0.5, true);
         std::tie(options.mWidth, options.mHeight) = std::pair(width, width * 9 / 16);
