@@ -573,10 +573,21 @@ bool PlanRender(const RenderOptions& inOptions, const SourceFacts& inSource,
     }
     // A Y4M stream of the source's own size without filters asks for its
     // own sampling (planar 4:2:0, or 4:4:4 Y'CbCr): a source that has it
-    // hands its samples over unconverted. Filters work in BGRA.
-    const bool asStored = inOptions.mOutputKind != OutputKind::kPngSequence &&
-                          !inSource.mComposited && !inOptions.mFilters.Any() &&
-                          stream.mWidth == inSource.mWidth && stream.mHeight == inSource.mHeight;
+    // hands its samples over unconverted. Composited frames (a sequence)
+    // and filters work in BGRA, except that
+    // re-timing and scaling of progressive frames also work on 4:2:0 planes
+    // (and answer BGRA for what they cannot do so).
+    const bool sameSize = stream.mWidth == inSource.mWidth && stream.mHeight == inSource.mHeight;
+    FilterOptions others = inOptions.mFilters;
+    others.mSpeed.reset();
+    others.mScale = false;
+    const bool planarFilters =
+        inOptions.mFilters.Any() && !others.Any() && inOptions.mChroma == Y4MChroma::k420 &&
+        !mt::IsInterlaced(inSource.mFieldType) && !mt::IsInterlaced(stream.mFieldType);
+    const bool asStored =
+        inOptions.mOutputKind != OutputKind::kPngSequence && !inSource.mComposited &&
+        (!inOptions.mFilters.Any() ? sameSize
+                                   : planarFilters && (sameSize || inOptions.mFilters.mScale));
     plan.mPixelFormat = inOptions.mPixelFormat.value_or(!asStored ? mt::kPixelFormat_BGRA_4444_8u
                                                         : inOptions.mChroma == Y4MChroma::k420
                                                             ? mt::kPixelFormat_YUV_420_8u_Planar

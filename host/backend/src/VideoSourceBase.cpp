@@ -92,7 +92,7 @@ void HeldFrames::EndHold()
 
 void HeldFrames::TrimLocked()
 {
-    const std::size_t capacity = mHoldCount > 0 ? kHeldCapacity : kIdleCapacity;
+    const std::size_t capacity = std::min(kIdleCapacity + 2 * mHoldCount, kHeldCapacity);
     while (mFrames.size() > capacity)
         mFrames.pop_back();
 }
@@ -254,7 +254,9 @@ QRT::Result VideoSourceBase::GetVideoFrame(TickTime inTime, const VideoFrameRequ
     FrameRef frame = std::move(produced);
     const std::uint32_t width = inRequest.mWidth != 0 ? inRequest.mWidth : mDescription.mWidth;
     const std::uint32_t height = inRequest.mHeight != 0 ? inRequest.mHeight : mDescription.mHeight;
-    if (inRequest.mWidth != 0 && inRequest.mHeight != 0 &&
+    // Planar frames keep their own size: their planes are not scaled here,
+    // the consumer's scaler reduces them.
+    if (inRequest.mWidth != 0 && inRequest.mHeight != 0 && !format.IsPlanar() &&
         (width != mDescription.mWidth || height != mDescription.mHeight))
     {
         FrameRef scaled;

@@ -57,8 +57,11 @@ struct SourceDescription
 };
 
 // Frames a source delivered recently, by frame key, most recent first.
-// Without prefetch holds a few frames are kept; while holds are out, many
-// more, so that frames read ahead survive until they are taken.
+// Without prefetch holds a few frames are kept; while holds are out, two
+// more for each hold (up to kHeldCapacity in all): the frame the hold's read
+// ahead brings, and room for one whose hold ended before its render took it.
+// So read-ahead frames survive until they are taken, and the frames kept
+// follow the reads in flight rather than a fixed count.
 class HeldFrames : public std::enable_shared_from_this<HeldFrames>
 {
 public:

@@ -117,12 +117,14 @@ TEST_F(PatternSourceTest, NoBlockRequestsAnswerOnlyHeldFramesAndKeysTellFramesAp
     EXPECT_EQ(ReadFrame(source, FrameTime(3), frame, kFrameRequestFlag_NoBlock),
               QRT::kResult_Success);
     EXPECT_EQ(frame.Get(), read.Get());
-    // A prefetch hold keeps every frame read while it lasts; without holds only
-    // the four most recent frames stay.
+    // A prefetch hold keeps two more frames while it lasts (the six most recent of
+    // ten); without holds only the four most recent frames stay.
     BE::Deprecated::PrefetchHold hold = source->GetPrefetchHold();
     for (int index = 0; index < 10; ++index)
         ReadFrameOrFail(source, FrameTime(index));
-    EXPECT_EQ(ReadFrame(source, FrameTime(0), frame, kFrameRequestFlag_NoBlock),
+    EXPECT_EQ(ReadFrame(source, FrameTime(3), frame, kFrameRequestFlag_NoBlock),
+              BE::kResult_FrameNotReady);
+    EXPECT_EQ(ReadFrame(source, FrameTime(4), frame, kFrameRequestFlag_NoBlock),
               QRT::kResult_Success);
     hold.reset();
     EXPECT_EQ(ReadFrame(source, FrameTime(5), frame, kFrameRequestFlag_NoBlock),

@@ -241,9 +241,9 @@ TEST_F(Y4MSourceTest, ALastFrameCutShortKeepsTheCompleteFrames)
     }
 }
 
-// 4:2:0 files offer their planes as they are: a planar request gets the
-// file's samples in the frame's planes (padded rows or not), and no other
-// request is answered with a planar frame.
+// 4:2:0 files offer their planes as they are: a planar request (of any size)
+// gets the file's samples in the frame's planes (padded rows or not), and no
+// other request is answered with a planar frame.
 TEST_F(Y4MSourceTest, A420FileHandsItsPlanesOverUnconverted)
 {
     for (const auto& [width, height] : {std::pair(37, 9), std::pair(128, 2)})
@@ -265,9 +265,12 @@ TEST_F(Y4MSourceTest, A420FileHandsItsPlanesOverUnconverted)
         request.mPixelFormat = kPixelFormat_YUYV_422_8u;
         EXPECT_EQ(ReadFrameOrFail(source, TickTime::FromFrame(1, k25), request)->GetPixelFormat(),
                   kPixelFormat_VUYA_4444_8u);
+        // Also a planar request of another size: the planes keep the file's.
         request.mPixelFormat = kPixelFormat_YUV_420_8u_Planar;
+        std::tie(request.mWidth, request.mHeight) = std::pair(width / 2, height + 2);
         const FrameRef frame = ReadFrameOrFail(source, TickTime::FromFrame(1, k25), request);
         ASSERT_TRUE(frame && frame->GetPixelFormat() == request.mPixelFormat);
+        ASSERT_EQ(frame->GetBounds(), QRT::ParamRect(0, 0, width, height));
         ASSERT_EQ(frame->GetPlaneCount(), 3u);
         std::string read;
         for (std::uint32_t plane = 0; plane < 3; ++plane)

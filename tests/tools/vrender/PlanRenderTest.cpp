@@ -138,34 +138,53 @@ TEST_F(PlanRenderTest, ReverseEndlessMediaEndsAtTimeZero)
 }
 
 // Y4M output of the source's size without filters asks for the stream's own
-// sampling, so that a source with it hands its samples over; everything else
-// renders in BGRA unless --format says otherwise.
+// sampling, so that a source with it hands its samples over; so does 4:2:0
+// output re-timing or scaling progressive frames, which work on 4:2:0 planes.
+// Everything else renders in BGRA unless --format says otherwise.
 TEST_F(PlanRenderTest, Y4MWithoutFiltersAsksForTheStreamsSampling)
 {
     using K = vrender::OutputKind;
     const auto c420 = vrender::Y4MChroma::k420, c444 = vrender::Y4MChroma::k444;
-    // (output, chroma, deinterlace, output width, --format, expected)
-    const std::tuple<K, vrender::Y4MChroma, bool, std::uint32_t, std::optional<mt::PixelFormat>,
+    enum : int
+    {
+        kDeinterlace = 1,
+        kSpeed = 2,
+        kInterlacedSource = 4,
+        kScale = 8,
+    };
+    // (output, chroma, filters and source, output width, --format, expected)
+    const std::tuple<K, vrender::Y4MChroma, int, std::uint32_t, std::optional<mt::PixelFormat>,
                      mt::PixelFormat>
         cases[] = {
-            {K::kY4MStream, c420, false, 0, {}, mt::kPixelFormat_YUV_420_8u_Planar},
-            {K::kY4MFile, c420, false, 640, {}, mt::kPixelFormat_YUV_420_8u_Planar},
-            {K::kY4MStream, c444, false, 0, {}, mt::kPixelFormat_VUYA_4444_8u},
-            {K::kPngSequence, c420, false, 0, {}, mt::kPixelFormat_BGRA_4444_8u},
-            {K::kY4MStream, c420, true, 0, {}, mt::kPixelFormat_BGRA_4444_8u},
-            {K::kY4MStream, c420, false, 320, {}, mt::kPixelFormat_BGRA_4444_8u},
-            {K::kY4MStream, c420, false, 0, mt::kPixelFormat_BGRA_4444_16u,
+            {K::kY4MStream, c420, 0, 0, {}, mt::kPixelFormat_YUV_420_8u_Planar},
+            {K::kY4MFile, c420, 0, 640, {}, mt::kPixelFormat_YUV_420_8u_Planar},
+            {K::kY4MStream, c444, 0, 0, {}, mt::kPixelFormat_VUYA_4444_8u},
+            {K::kPngSequence, c420, 0, 0, {}, mt::kPixelFormat_BGRA_4444_8u},
+            {K::kY4MStream, c420, kDeinterlace, 0, {}, mt::kPixelFormat_BGRA_4444_8u},
+            {K::kY4MStream, c420, 0, 320, {}, mt::kPixelFormat_BGRA_4444_8u},
+            {K::kY4MStream, c420, 0, 0, mt::kPixelFormat_BGRA_4444_16u,
              mt::kPixelFormat_BGRA_4444_16u},
+            {K::kY4MStream, c420, kSpeed, 0, {}, mt::kPixelFormat_YUV_420_8u_Planar},
+            {K::kY4MStream, c444, kSpeed, 0, {}, mt::kPixelFormat_BGRA_4444_8u},
+            {K::kPngSequence, c420, kSpeed, 0, {}, mt::kPixelFormat_BGRA_4444_8u},
+            {K::kY4MStream, c420, kSpeed | kDeinterlace, 0, {}, mt::kPixelFormat_BGRA_4444_8u},
+            {K::kY4MStream, c420, kSpeed | kInterlacedSource, 0, {}, mt::kPixelFormat_BGRA_4444_8u},
         };
     for (std::size_t i = 0; i < std::size(cases); ++i)
     {
-        const auto& [kind, chroma, deinterlace, width, format, expected] = cases[i];
+        const auto& [kind, chroma, filters, width, format, expected] = cases[i];
         vrender::RenderOptions options;
         std::tie(options.mOutputKind, options.mChroma, options.mPixelFormat) =
             std::tuple(kind, chroma, format);
-        options.mFilters.mDeinterlace = deinterlace;
+        options.mFilters.mDeinterlace = (filters & kDeinterlace) != 0;
+        options.mFilters.mScale = (filters & kScale) != 0;
+        if ((filters & kSpeed) != 0)
+            std::tie(options.mFilters.mSpeed, options.mFilters.mFrameBlend) = std::pair(0.5, true);
         std::tie(options.mWidth, options.mHeight) = std::pair(width, width * 9 / 16);
-        EXPECT_EQ(Plan(options, Clip()).mPixelFormat, expected) << "case " << i;
+        vrender::SourceFacts source = Clip();
+        if ((filters & kInterlacedSource) != 0)
+            source.mFieldType = mt::kFieldType_UpperFirst;
+        EXPECT_EQ(Plan(options, source).mPixelFormat, expected) << "case " << i;
     }
 }
 

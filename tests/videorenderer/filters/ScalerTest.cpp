@@ -1,8 +1,10 @@
 // Scaler: pass-through of fitting frames, pixel aspect correction, field-correct
 // reduction, the nearest-field choice for progressive requests, odd interlaced
-// heights, and draft renders that keep a full-frame rendering whole.
+// heights, draft renders that keep a full-frame rendering whole, and requests for
+// 4:2:0 of 4:2:0 frames.
 
 #include "../sources/ScriptedSources.h"
+#include "IR/ImageRenderer.h"
 #include "ML/RenderableSourceFilters.h"
 
 namespace ML::Test
@@ -129,6 +131,60 @@ TEST_F(ScalerTest, DraftQualityKeepsAFullFrameRenderingAtTheRequestedTimeWhole)
         ASSERT_TRUE(frame);
         EXPECT_EQ(frame == source->LastFrame(), c.mWhole);
         EXPECT_EQ(frame->GetBounds().Height(), c.mWhole ? 1080 : 540);
+    }
+}
+
+// A 4:2:0 frame at exactly half its size in both directions has its planes halved
+// (from quality 3); converted to BGRA with the source's matrix when the reduced picture
+// reads Y'CbCr with the other one (BT.709 from 720 rows). Any other 4:2:0 reduction is
+// scaled as BGRA converted with the source's matrix.
+TEST_F(ScalerTest, A420FrameAtHalfSizeHasItsPlanesHalvedElseItIsScaledInBGRA)
+{
+    const Pixel codes = Marker(mT, 1); // Y, Cb, Cr as B, G, R
+    // The BGRA pixel of those codes through a matrix.
+    const auto bgra = [&](bool inMatrix601)
+    {
+        const std::uint8_t y[4] = {codes.mB, codes.mB, codes.mB, codes.mB};
+        Pixel pixel;
+        EXPECT_EQ(IR_ConvertYUV420Planes(y, 2, &codes.mG, 1, &codes.mR, 1, inMatrix601, &pixel, 4,
+                                         kIR_PixelFormat_BGRA_8u, 1, 1),
+                  kIR_NoError);
+        return pixel;
+    };
+    enum Answer
+    {
+        kPlanes,
+        kBGRA601,
+        kBGRA709
+    };
+    const struct
+    {
+        std::uint32_t mWidth, mHeight, mToWidth, mToHeight, mQuality;
+        Answer mAnswer;
+    } cases[] = {{8, 4, 4, 2, 4, kPlanes},      {8, 4, 4, 2, 2, kBGRA601},
+                 {8, 4, 6, 3, 4, kBGRA601},     {4, 800, 2, 400, 5, kBGRA709},
+                 {4, 1440, 2, 720, 3, kPlanes}, {6, 4, 3, 2, 4, kBGRA601}};
+    for (const auto& c : cases)
+    {
+        SCOPED_TRACE(testing::Message() << c.mWidth << "x" << c.mHeight << " to " << c.mToWidth
+                                        << "x" << c.mToHeight << " at " << c.mQuality);
+        const FrameRef frame = Render(
+            *ScaleAndPARCorrectSource(
+                MakeMarkedSource(Delivery::kProgressive, c.mWidth, c.mHeight)),
+            MF::FrameTime(mT),
+            MakeParams(c.mToWidth, c.mToHeight, c.mQuality, mt::kPixelFormat_YUV_420_8u_Planar));
+        ASSERT_TRUE(frame);
+        EXPECT_EQ(frame->GetBounds(),
+                  QRT::ParamRect(0, 0, std::int32_t(c.mToWidth), std::int32_t(c.mToHeight)));
+        if (c.mAnswer == kPlanes)
+        {
+            EXPECT_TRUE(PlanesAre(frame, codes));
+            continue;
+        }
+        ASSERT_EQ(frame->GetPixelFormat(), mt::kPixelFormat_BGRA_4444_8u);
+        const Pixel expected = bgra(c.mAnswer == kBGRA601);
+        EXPECT_TRUE(PixelsAre(
+            frame, [&](std::int32_t, std::int32_t) { return expected; }, 1));
     }
 }
 

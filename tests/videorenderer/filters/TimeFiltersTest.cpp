@@ -145,6 +145,48 @@ TEST_F(TimeFiltersTest, TimeBlendAtHalfSpeedBlendsTheTwoFieldsAroundEachOutputFi
     }
 }
 
+TEST_F(TimeFiltersTest, TimeBlendOfPlanarFramesMixesTheirCodesAndFallsBackToBGRA)
+{
+    // Progressive 4:2:0 upstream frames blend plane by plane, their codes mixed at every
+    // quality (frames 3 and 4: Y 104 and 136, Cb 64, Cr 6 and 8), halves rounded up; on the
+    // grid the upstream frame itself is the answer.
+    auto frames = MakeMarkedSource(Delivery::kProgressive);
+    const SourceRef blend = Blend(frames, 0.5);
+    const TickTime four = Ticks(4 * kFrame);
+    const struct
+    {
+        std::int64_t mOffset; // ticks after frame 3
+        std::uint32_t mQuality;
+        Pixel mExpected; // Y, Cb, Cr as B, G, R
+    } cases[] = {{kFrame / 4, 5, {112, 64, 7, 0}},
+                 {kFrame / 2, 5, {120, 64, 7, 0}},
+                 {3 * kFrame / 4, 3, {128, 64, 8, 0}}};
+    for (const auto& c : cases)
+    {
+        SCOPED_TRACE(c.mOffset);
+        const CutlistRenderParams params =
+            MakeParams(5, 3, c.mQuality, mt::kPixelFormat_YUV_420_8u_Planar);
+        EXPECT_TRUE(PlanesAre(Render(*blend, MF::FrameTime(Ticks(3 * kFrame + c.mOffset)), params),
+                              c.mExpected));
+    }
+    const CutlistRenderParams planar = MakeParams(5, 3, 5, mt::kPixelFormat_YUV_420_8u_Planar);
+    const FrameRef onGrid = Render(*blend, MF::FrameTime(four), planar);
+    EXPECT_TRUE(onGrid == frames->LastFrame());
+    EXPECT_TRUE(PlanesAre(onGrid, Marker(four, 1)));
+
+    // Upstream frames that are not 4:2:0 blend into 8-bit BGRA for a 4:2:0 request, the
+    // pixels a BGRA request gets.
+    const SourceRef interlaced = Blend(MakeMarkedSource(Delivery::kUpperFirst), 0.5);
+    const MF::FrameTime between(Ticks(3 * kFrame + kFrame / 4));
+    const FrameRef fallback =
+        Render(*interlaced, between, MakeParams(4, 6, 5, planar.mPixelFormat));
+    const FrameRef asked = Render(*interlaced, between, MakeParams(4, 6, 5));
+    ASSERT_TRUE(fallback && asked);
+    EXPECT_EQ(fallback->GetPixelFormat(), mt::kPixelFormat_BGRA_4444_8u);
+    EXPECT_TRUE(PixelsAre(fallback, [&](std::int32_t inX, std::int32_t inY)
+                          { return ReadPixel(*asked, inX, inY); }));
+}
+
 TEST_F(TimeFiltersTest, TimeBlendAtTwoAndAHalfAccumulatesEveryFieldInEachOutputFieldsSpan)
 {
     auto upper = MakeMarkedSource(Delivery::kUpperFirst);

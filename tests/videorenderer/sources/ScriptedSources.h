@@ -8,6 +8,8 @@
 // order) and renders frames whose slot-1 rows (0, 2, 4, ...) hold
 // Marker(first field time, 1) and slot-2 rows Marker(second field time, 2) of
 // the conformed time; with a gradient, channel R of row y is 10 * y instead.
+// Asked for planar 4:2:0, it renders a progressive time as a 4:2:0 frame
+// whose Y, Cb and Cr samples are the B, G and R of Marker(time, 1).
 // Its frames are marked shared, so a filter that writes into them fails its
 // contract.
 //
@@ -111,6 +113,44 @@ inline FrameRef MakeFrame(std::uint32_t inWidth, std::uint32_t inHeight,
                         &pixel, 4);
         }
     return frame;
+}
+
+// A planar 4:2:0 frame whose Y, Cb and Cr planes hold inPixel's B, G and R.
+inline FrameRef MakePlanarFrame(std::uint32_t inWidth, std::uint32_t inHeight, Pixel inPixel)
+{
+    FrameRef frame = VF::CreateVideoFrame(mt::kPixelFormat_YUV_420_8u_Planar, inWidth, inHeight,
+                                          mt::kPixelAspectRatio_Square, false, false);
+    const std::uint8_t samples[3] = {inPixel.mB, inPixel.mG, inPixel.mR};
+    for (std::uint32_t plane = 0; plane < 3; ++plane)
+    {
+        const std::uint32_t rows = plane == 0 ? inHeight : (inHeight + 1) / 2;
+        std::memset(frame->GetWritablePlaneBaseAddress(plane), samples[plane],
+                    std::size_t{rows} * static_cast<std::size_t>(frame->GetPlaneRowBytes(plane)));
+    }
+    return frame;
+}
+
+// Checks that every sample of the planes of a 4:2:0 frame is inPixel's B (Y), G (Cb), R (Cr).
+inline ::testing::AssertionResult PlanesAre(const FrameRef& inFrame, Pixel inPixel)
+{
+    if (!inFrame || inFrame->GetPixelFormat() != mt::kPixelFormat_YUV_420_8u_Planar)
+        return ::testing::AssertionFailure() << "no 4:2:0 frame";
+    const QRT::ParamRect bounds = inFrame->GetBounds();
+    const std::uint8_t samples[3] = {inPixel.mB, inPixel.mG, inPixel.mR};
+    for (std::uint32_t plane = 0; plane < 3; ++plane)
+    {
+        const std::int32_t width = plane == 0 ? bounds.Width() : (bounds.Width() + 1) / 2;
+        const std::int32_t height = plane == 0 ? bounds.Height() : (bounds.Height() + 1) / 2;
+        const auto* base = static_cast<const std::uint8_t*>(inFrame->GetPlaneBaseAddress(plane));
+        for (std::int32_t y = 0; y < height; ++y)
+            for (std::int32_t x = 0; x < width; ++x)
+                if (base[y * inFrame->GetPlaneRowBytes(plane) + x] != samples[plane])
+                    return ::testing::AssertionFailure()
+                           << "plane " << plane << " (" << x << ", " << y << ") is "
+                           << int(base[y * inFrame->GetPlaneRowBytes(plane) + x]) << ", not "
+                           << int(samples[plane]);
+    }
+    return ::testing::AssertionSuccess();
 }
 
 inline FrameRef MakeFilledFrame(std::uint32_t inWidth, std::uint32_t inHeight, Pixel inPixel)
@@ -332,14 +372,21 @@ public:
     {
         MF::FrameTime conformed;
         ConformFrameTime(inTime, inParams, conformed);
-        const FrameRef frame = MakeFrame(
-            mWidth != 0 ? mWidth : inParams.mWidth, mHeight != 0 ? mHeight : inParams.mHeight,
-            [&](std::int32_t, std::int32_t inY)
-            {
-                const std::int32_t slot = inY % 2 == 0 ? 1 : 2;
-                const TickTime time = conformed.GetFieldTime(slot);
-                return mGradient ? GradientMarker(time, slot, inY) : Marker(time, slot);
-            });
+        const std::uint32_t width = mWidth != 0 ? mWidth : inParams.mWidth;
+        const std::uint32_t height = mHeight != 0 ? mHeight : inParams.mHeight;
+        if (inParams.mPixelFormat == mt::kPixelFormat_YUV_420_8u_Planar &&
+            conformed.IsProgressive())
+            return Deliver(conformed,
+                           MakePlanarFrame(width, height, Marker(conformed.GetTime(), 1)),
+                           outFrame);
+        const FrameRef frame =
+            MakeFrame(width, height,
+                      [&](std::int32_t, std::int32_t inY)
+                      {
+                          const std::int32_t slot = inY % 2 == 0 ? 1 : 2;
+                          const TickTime time = conformed.GetFieldTime(slot);
+                          return mGradient ? GradientMarker(time, slot, inY) : Marker(time, slot);
+                      });
         Deliver(conformed, frame, outFrame);
     }
 

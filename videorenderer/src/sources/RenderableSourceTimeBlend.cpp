@@ -1,4 +1,5 @@
 #include "IR/ImageRenderer.h"
+#include "IR/PlaneAccumulate.h"
 #include "MF/SampleWeighting.h"
 #include "ML/RenderableSourceFilters.h"
 #include "QRT/Allocated.h"
@@ -259,6 +260,98 @@ private:
         const FrameRef model = inSources.begin()->second.mFrame;
         if (!model)
             return FrameRef();
+        CutlistRenderParams params = inParams;
+        if (params.mPixelFormat == mvxmediatypes::kPixelFormat_YUV_420_8u_Planar)
+        {
+            if (inTime.IsProgressive() && AllPlanarAtOutputSize(inSources, inParams))
+                if (FrameRef blended = BlendPlanes(inPlan, inTime, inParams, inSources))
+                    return blended;
+            // 4:2:0 is made only from 4:2:0: any other upstream frames blend
+            // into 8-bit BGRA, which a consumer of 4:2:0 converts.
+            params.mPixelFormat = mvxmediatypes::kPixelFormat_BGRA_4444_8u;
+        }
+        return BlendPixels(inPlan, inTime, params, inSources);
+    }
+
+    // Whether every upstream frame is planar 4:2:0 of the output's size and
+    // pixel aspect ratio.
+    static bool AllPlanarAtOutputSize(const std::map<TickTime, SampleSource>& inSources,
+                                      const CutlistRenderParams& inParams)
+    {
+        const QRT::ParamRect bounds(0, 0, static_cast<std::int32_t>(inParams.mWidth),
+                                    static_cast<std::int32_t>(inParams.mHeight));
+        for (const auto& [time, source] : inSources)
+            if (!source.mFrame ||
+                source.mFrame->GetPixelFormat() != mvxmediatypes::kPixelFormat_YUV_420_8u_Planar ||
+                source.mFrame->GetBounds() != bounds ||
+                source.mFrame->GetPixelAspectRatio() != inParams.mPixelAspectRatio)
+                return false;
+        return true;
+    }
+
+    // A progressive 4:2:0 output frame as the weighted sum of progressive
+    // planar upstream frames, plane by plane. The planes' codes are mixed at
+    // every quality, quality 5 included: gamma-encoded Y'CbCr has no
+    // linear-light form one plane at a time (IR_AccumulatePlane8). On the
+    // upstream grid the upstream frame itself is the answer. Empty when no
+    // sample has any weight.
+    FrameRef BlendPlanes(const BlendPlan& inPlan, const MF::FrameTime& inTime,
+                         const CutlistRenderParams& inParams,
+                         const std::map<TickTime, SampleSource>& inSources)
+    {
+        MF::WeightedSampleList list = inPlan.mSecondList;
+        if (!inPlan.mAccumulate)
+        {
+            const float w =
+                MF::CalculateSampleWeight(inTime.GetSecondFieldTime(), inPlan.mT2a, inPlan.mT2b);
+            list = {{{inPlan.mT2a, kSecondSlot}, 1.0 - static_cast<double>(w)},
+                    {{inPlan.mT2b, kSecondSlot}, static_cast<double>(w)}};
+        }
+        std::vector<const MF::IVideoFrame*> frames;
+        std::vector<double> weights;
+        for (const MF::WeightedSample& sample : list)
+        {
+            const FrameRef& frame = inSources.at(sample.first.first).mFrame;
+            if (sample.second == 1.0 && frame->GetFieldType() == inTime.GetFieldOrder())
+                return frame;
+            if (sample.second != 0.0)
+            {
+                frames.push_back(frame.Get());
+                weights.push_back(sample.second);
+            }
+        }
+        if (frames.empty())
+            return FrameRef();
+        FrameRef output = CreateFrameForParams(inParams, inSources.begin()->second.mFrame);
+        output->SetFieldType(inTime.GetFieldOrder());
+        std::vector<const std::uint8_t*> bases(frames.size());
+        std::vector<std::int32_t> rowBytes(frames.size());
+        const auto count = static_cast<std::int32_t>(frames.size());
+        for (std::uint32_t plane = 0; plane < 3; ++plane)
+        {
+            for (std::size_t k = 0; k < frames.size(); ++k)
+            {
+                bases[k] = static_cast<const std::uint8_t*>(frames[k]->GetPlaneBaseAddress(plane));
+                rowBytes[k] = frames[k]->GetPlaneRowBytes(plane);
+            }
+            const auto width =
+                static_cast<std::int32_t>(plane == 0 ? inParams.mWidth : (inParams.mWidth + 1) / 2);
+            const auto height = static_cast<std::int32_t>(plane == 0 ? inParams.mHeight
+                                                                     : (inParams.mHeight + 1) / 2);
+            auto* out = static_cast<std::uint8_t*>(output->GetWritablePlaneBaseAddress(plane));
+            ThrowIfFailed(IR_AccumulatePlane8(bases.data(), rowBytes.data(), weights.data(), count,
+                                              out, output->GetPlaneRowBytes(plane), width, height));
+        }
+        return output;
+    }
+
+    // The blend in the requested pixel format, or in float BGRA converted
+    // into it.
+    FrameRef BlendPixels(const BlendPlan& inPlan, const MF::FrameTime& inTime,
+                         const CutlistRenderParams& inParams,
+                         const std::map<TickTime, SampleSource>& inSources)
+    {
+        const FrameRef model = inSources.begin()->second.mFrame;
         FrameRef output = CreateFrameForParams(inParams, model);
         output->SetFieldType(inTime.GetFieldOrder());
         const mvxmediatypes::PixelFormat blendFormat = BlendFormatFor(output->GetPixelFormat());
