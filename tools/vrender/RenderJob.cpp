@@ -574,9 +574,9 @@ bool PlanRender(const RenderOptions& inOptions, const SourceFacts& inSource,
     // A Y4M stream of the source's own size without filters asks for its
     // own sampling (planar 4:2:0, or 4:4:4 Y'CbCr): a source that has it
     // hands its samples over unconverted. Composited frames (a sequence)
-    // and filters work in BGRA, except that
-    // re-timing and scaling of progressive frames also work on 4:2:0 planes
-    // (and answer BGRA for what they cannot do so).
+    // and filters work in BGRA, except that re-timing and scaling of
+    // progressive frames also work on 4:2:0 planes (and answer BGRA for what
+    // they cannot do so).
     const bool sameSize = stream.mWidth == inSource.mWidth && stream.mHeight == inSource.mHeight;
     FilterOptions others = inOptions.mFilters;
     others.mSpeed.reset();
