@@ -79,44 +79,38 @@ TEST(ClipNodeTest, ClipTimeMapsToMediaTime)
 {
     const BE::MediaRef moving = Pattern("moving");
     const NodeRef plain = ML::CreateMediaNode(MediaSetup(moving, {}));
-    const auto clip = [](auto inChange)
-    {
-        BE::ClipSettings settings;
-        inChange(settings);
-        return settings;
-    };
     const struct
     {
         const char* mName;
-        BE::ClipSettings mClip;
+        void (*mChange)(BE::ClipSettings&);
         double mClipFrame;
         TickTime mMediaTime;
     } cases[] = {
-        {"in point", clip([](auto& c) { c.mInPoint = Frames(2); }), 1, Frames(3)},
-        {"speed", clip([](auto& c) { c.mSpeed = 2; }), 2, Frames(4)},
-        {"reverse, first frame", clip([](auto& c) { c.mReverse = true; }), 0,
-         Frames(10) - Ticks(1)},
-        {"reverse", clip([](auto& c) { c.mReverse = true; }), 3, Frames(7) - Ticks(1)},
-        {"negative speed", clip([](auto& c) { c.mSpeed = -1; }), 3, Frames(7) - Ticks(1)},
+        {"in point", [](auto& c) { c.mInPoint = Frames(2); }, 1, Frames(3)},
+        {"speed", [](auto& c) { c.mSpeed = 2; }, 2, Frames(4)},
+        {"reverse, first frame", [](auto& c) { c.mReverse = true; }, 0, Frames(10) - Ticks(1)},
+        {"reverse", [](auto& c) { c.mReverse = true; }, 3, Frames(7) - Ticks(1)},
+        {"negative speed", [](auto& c) { c.mSpeed = -1; }, 3, Frames(7) - Ticks(1)},
         {"remapped backwards",
-         clip(
-             [](auto& c) {
-                 c.mTimeRemapping = BE::KeyframeCurve::Scalar(0, {Key(0, 0.32), Key(8, 0)});
-             }),
+         [](auto& c) {
+             c.mTimeRemapping = BE::KeyframeCurve::Scalar(0, {Key(0, 0.32), Key(8, 0)});
+         },
          2, Frames(6)},
-        {"frame hold", clip([](auto& c) { c.mFrameHold.mAt = Frames(4); }), 7, Frames(4)},
+        {"frame hold", [](auto& c) { c.mFrameHold.mAt = Frames(4); }, 7, Frames(4)},
     };
     for (const auto& c : cases)
     {
         SCOPED_TRACE(c.mName);
-        const BE::TrackItemRef item = Item(moving, c.mClip);
+        BE::ClipSettings clip;
+        c.mChange(clip);
+        const BE::TrackItemRef item = Item(moving, clip);
         const NodeRef node = ClipOver(item);
-        const ML::CutlistRenderParams params = At(MF::FrameTime(Frames(c.mClipFrame)));
+        const ML::CutlistRenderParams params = AtFrame(c.mClipFrame);
         const ML::CutlistRenderParams media = At(MF::FrameTime(c.mMediaTime));
         EXPECT_EQ(node->GetRenderFlags(),
-                  85u - (c.mClip.mSpeed == 1 && !c.mClip.IsTimeRemapped() ? 0u : 16u));
+                  85u - (clip.mSpeed == 1 && !clip.IsTimeRemapped() ? 0u : 16u));
         EXPECT_TRUE(SamePixels(Render(node, params), Render(plain, media)));
-        EXPECT_FALSE(SamePixels(Render(node, params), Render(plain, At(MF::FrameTime(Frames(8))))));
+        EXPECT_FALSE(SamePixels(Render(node, params), Render(plain, AtFrame(8))));
         // Without operators the clip's frame is its media producer's.
         EXPECT_EQ(FrameHash(node, params),
                   FrameHash(ML::CreateMediaNode(MediaSetup(moving, item)), media));
@@ -160,16 +154,13 @@ TEST(ClipNodeTest, ClipsOfOneMediaShareFramesAndEffectsChangeThemAndTheirFlags)
     const NodeRef first = ClipOver(Item(moving));
     const NodeRef second = ClipOver(Item(moving, later));
     EXPECT_NE(first->GetNodeHash(), second->GetNodeHash());
-    EXPECT_EQ(FrameHash(first, At(MF::FrameTime(Frames(3)))),
-              FrameHash(second, At(MF::FrameTime(Frames(1)))));
-    EXPECT_NE(FrameHash(first, At(MF::FrameTime(Frames(3)))),
-              FrameHash(second, At(MF::FrameTime(Frames(3)))));
+    EXPECT_EQ(FrameHash(first, AtFrame(3)), FrameHash(second, AtFrame(1)));
+    EXPECT_NE(FrameHash(first, AtFrame(3)), FrameHash(second, AtFrame(3)));
     // An operator keeps the clip's flags but opacity; its own flags limit the rest.
     const auto effect = [](std::uint32_t inFlags)
     { return Seal(MakeMutable<FillEffectNode>(inFlags)); };
     const NodeRef effected = ClipWithEffects(Item(moving), {effect(76)});
-    EXPECT_NE(FrameHash(effected, At(MF::FrameTime(Frames(3)))),
-              FrameHash(first, At(MF::FrameTime(Frames(3)))));
+    EXPECT_NE(FrameHash(effected, AtFrame(3)), FrameHash(first, AtFrame(3)));
     EXPECT_EQ(effected->GetRenderFlags(), 84u);
     EXPECT_EQ(ClipWithEffects(Item(moving), {effect(76), effect(12)})->GetRenderFlags(), 20u);
     // Re-timing clears flag 16 of the still; blending the frames sets flag 128.
@@ -184,7 +175,7 @@ TEST(ClipNodeTest, OperatorsRunOnTheFrameConformedToTheRequest)
     const BE::TrackItemRef item = Item(Pattern("solid", "size=32x18&color=FF0000"));
     const auto effect = MakeMutable<FillEffectNode>(76u);
     const NodeRef node = ClipWithEffects(item, {Seal(effect)});
-    const FrameRef frame = Render(node, At(MF::FrameTime(Frames(1))));
+    const FrameRef frame = Render(node, AtFrame(1));
     EXPECT_TRUE(vrtest::IsFilledWith(frame, kFill));
     // The media, at its own size, sits centred in a clear frame of the request.
     const FrameRef given = effect->mMade->mGiven;
@@ -228,17 +219,18 @@ TEST(ClipNodeTest, IntrinsicParametersOfAHoldWithFiltersAreTheMotionAtTheHoldTim
     held.mFrameHold = {Frames(2), true, false};
     const NodeRef clip = ClipOver(Item(Pattern("bars", "size=32x18"), held, moved));
     // The 32x18 media in the 64x36 frame, as at frame 2 where it is 16 pixels right.
-    ML::MotionRecord expected = ML::kIdentityMotionRecord;
-    expected.mMediaPixelAspect = 1.0f;
-    expected.mPositionX = 0.75f;
-    expected.mPositionY = 0.25f;
-    expected.mAnchorX = expected.mAnchorY = 0.75f;
-    expected.mScaleX = expected.mScaleY = 0.5f;
-    expected.mRotation = 30;
-    expected.mOpacity = 0.5f;
-    expected.mBlendMode = kIR_BlendMode_Multiply;
-    expected.mMediaWidth = 32;
-    expected.mMediaHeight = 18;
+    const ML::MotionRecord expected{.mAnchorX = 0.75f,
+                                    .mAnchorY = 0.75f,
+                                    .mPositionX = 0.75f,
+                                    .mPositionY = 0.25f,
+                                    .mScaleX = 0.5f,
+                                    .mScaleY = 0.5f,
+                                    .mRotation = 30,
+                                    .mMediaPixelAspect = 1.0f,
+                                    .mMediaWidth = 32,
+                                    .mMediaHeight = 18,
+                                    .mBlendMode = kIR_BlendMode_Multiply,
+                                    .mOpacity = 0.5f};
     ML::MotionRecord record;
     record.mOpacity = 0.25f;
     EXPECT_EQ(QRT::InterfaceRef<ML::IRenderableNodeIntrinsicParameterProvider>(clip)

@@ -64,10 +64,8 @@ TEST(MediaNodeTest, RenderFlagsSayStillAndOpaqueAndFrameHashesFollowMediaTime)
         EXPECT_EQ(MediaNode(Pattern(pattern, query))->GetRenderFlags(), flags) << query;
     const NodeRef still = MediaNode(Pattern("bars"));
     const NodeRef moving = MediaNode(Pattern("moving"));
-    const ML::CutlistRenderParams early = At(MF::FrameTime(Frames(1)));
-    const ML::CutlistRenderParams late = At(MF::FrameTime(Frames(7)));
-    EXPECT_EQ(FrameHash(still, early), FrameHash(still, late));
-    EXPECT_NE(FrameHash(moving, early), FrameHash(moving, late));
+    EXPECT_EQ(FrameHash(still, AtFrame(1)), FrameHash(still, AtFrame(7)));
+    EXPECT_NE(FrameHash(moving, AtFrame(1)), FrameHash(moving, AtFrame(7)));
     // Other material never shares a node (and so a frame) hash; the same
     // material in another node does.
     EXPECT_NE(still->GetNodeHash(), MediaNode(Pattern("gradient"))->GetNodeHash());
@@ -77,10 +75,6 @@ TEST(MediaNodeTest, RenderFlagsSayStillAndOpaqueAndFrameHashesFollowMediaTime)
 TEST(MediaNodeTest, FieldSettingsBuildTheirFilters)
 {
     const BE::MediaRef upper = Pattern("moving", "size=64x36&field=upper");
-    const auto dominance = [](const SourceRef& in)
-    { return ML::ReverseFieldDominanceOfSource(in); };
-    const auto reverse = [](const SourceRef& in) { return ML::FieldReverseSource(in); };
-    const auto deinterlace = [](const SourceRef& in) { return ML::DeinterlaceSource(in); };
     BE::ClipSettings reversed;
     reversed.mReverseFieldDominance = true;
     BE::ClipSettings deinterlaced;
@@ -98,10 +92,13 @@ TEST(MediaNodeTest, FieldSettingsBuildTheirFilters)
         SourceRef mOther;
         MF::FrameTime mTime;
     } cases[] = {
-        {"dominance then field reverse", reversed, Chain(upper, {dominance, reverse}),
-         Chain(upper, {dominance}), MF::FrameTime(Frames(2))},
-        {"deinterlace always", deinterlaced, Chain(upper, {deinterlace}), Chain(upper, {}), fields},
-        {"frame hold deinterlace", held, Chain(upper, {deinterlace}), Chain(upper, {}), fields},
+        {"dominance then field reverse", reversed,
+         Chain(upper, {ML::ReverseFieldDominanceOfSource, ML::FieldReverseSource}),
+         Chain(upper, {ML::ReverseFieldDominanceOfSource}), MF::FrameTime(Frames(2))},
+        {"deinterlace always", deinterlaced, Chain(upper, {ML::DeinterlaceSource}),
+         Chain(upper, {}), fields},
+        {"frame hold deinterlace", held, Chain(upper, {ML::DeinterlaceSource}), Chain(upper, {}),
+         fields},
     };
     for (const auto& c : cases)
     {
@@ -116,7 +113,7 @@ TEST(MediaNodeTest, FieldSettingsBuildTheirFilters)
     }
     // The producer renders through that chain, at the hold time when held.
     EXPECT_TRUE(SamePixels(Render(MediaNode(upper, held, mt::kFieldType_UpperFirst), At(fields)),
-                           RenderChain(Chain(upper, {deinterlace}),
+                           RenderChain(Chain(upper, {ML::DeinterlaceSource}),
                                        At(MF::FrameTime(Frames(3)), mt::kFieldType_UpperFirst))));
 }
 
@@ -128,7 +125,7 @@ TEST(MediaNodeTest, MediaWithoutSourceShowItsState)
     pending.mKind = BE::MediaKind::kPattern;
     pending.mLocation = "pattern:moving";
     pending.mPending = true;
-    const ML::CutlistRenderParams params = At(MF::FrameTime(Frames(2)));
+    const ML::CutlistRenderParams params = AtFrame(2);
     // Offline and pending media keep their stream's picture size: 1920x1080.
     const auto picture = [](std::int32_t inNumber)
     {
@@ -178,7 +175,7 @@ TEST(MediaNodeTest, NestedSequenceRendersItsCutlist)
     setup.mNestedCutlist = cutlist;
     const NodeRef node = ML::CreateMediaNode(setup);
 
-    const ML::CutlistRenderParams params = At(MF::FrameTime(Frames(6)));
+    const ML::CutlistRenderParams params = AtFrame(6);
     MF::FrameTime local;
     QRT::InterfaceRef<ML::IRenderableNodeProducer> inner;
     ASSERT_EQ(ML::CutlistRenderer::GetProducerForCutlist(cutlist, params, inner, local),

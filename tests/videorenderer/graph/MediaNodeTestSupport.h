@@ -87,6 +87,12 @@ inline ML::CutlistRenderParams At(const MF::FrameTime& inTime,
     return params;
 }
 
+// The parameters of a progressive 64x36 render at frame inFrame.
+inline ML::CutlistRenderParams AtFrame(double inFrame)
+{
+    return At(MF::FrameTime(Frames(inFrame)));
+}
+
 inline QRT::InterfaceRef<ML::IRenderableNodeProducer>
 ProducerOf(const NodeRef& inNode, const ML::CutlistRenderParams& inParams)
 {
