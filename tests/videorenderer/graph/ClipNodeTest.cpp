@@ -107,6 +107,9 @@ TEST(ClipNodeTest, ClipTimeMapsToMediaTime)
         const NodeRef node = ClipOver(item);
         const ML::CutlistRenderParams params = AtFrame(c.mClipFrame);
         const ML::CutlistRenderParams media = At(MF::FrameTime(c.mMediaTime));
+        EXPECT_EQ(dynamic_cast<RenderableNodeClipImpl&>(*node).GetTimeTransform()->Transform(
+                      Frames(c.mClipFrame)),
+                  c.mMediaTime);
         EXPECT_EQ(node->GetRenderFlags(),
                   85u - (clip.mSpeed == 1 && !clip.IsTimeRemapped() ? 0u : 16u));
         EXPECT_TRUE(SamePixels(Render(node, params), Render(plain, media)));
