@@ -3,7 +3,6 @@
 // per pixel, R for red, B for blue, ? for anything else.
 
 #include "ContractExpect.h"
-#include "IR/ImageRenderer.h"
 #include "ML/CutlistRenderer.h"
 #include "ML/IRenderableNodeIntrinsicParameterProvider.h"
 #include "ML/RenderFlags.h"
@@ -268,7 +267,7 @@ TEST_F(CompositorTest, TrackIndexLimitKeepsTheTracksAtOrBelowIt)
                           "mInputs.size() == mTrackIndices.size()");
 }
 
-TEST_F(CompositorTest, IdentityLayerPassesThroughBlendModesApplyAndEmptyContentKeepsTheLower)
+TEST_F(CompositorTest, IdentityLayerPassesThroughAndEmptyContentKeepsTheLower)
 {
     const auto layer = MakeLayer(kBlue);
     const MF::IVideoFrame* painted = nullptr;
@@ -287,16 +286,6 @@ TEST_F(CompositorTest, IdentityLayerPassesThroughBlendModesApplyAndEmptyContentK
     // Opacity and blend mode do not count for a layer alone; geometry does.
     EXPECT_EQ(ML::ApplyMotion(frame, faded, faded, mParams), frame);
     EXPECT_NE(ML::ApplyMotion(frame, Moved(0.4f, 1.0f), Moved(0.4f, 1.0f), mParams), frame);
-
-    // Over a lower frame the blend mode applies: blue multiplied onto red is black.
-    ML::MotionRecord multiply;
-    multiply.mBlendMode = kIR_BlendMode_Multiply;
-    const FrameRef blue = vrtest::MakeFrame(8, 4);
-    vrtest::Fill(*blue, kBlue);
-    const FrameRef red = vrtest::MakeFrame(8, 4);
-    vrtest::Fill(*red, kRed);
-    EXPECT_TRUE(vrtest::IsFilledWith(ML::CompositeLayer(blue, multiply, multiply, red, mParams),
-                                     {0, 0, 0, 255}));
 
     const FrameRef lower = vrtest::MakeFrame(8, 4);
     lower->MarkShared(1);
