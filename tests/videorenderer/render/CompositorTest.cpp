@@ -115,14 +115,6 @@ std::string Letters(const FrameRef& inFrame)
     return letters;
 }
 
-ML::MotionRecord Moved(float inPositionX, float inScale)
-{
-    ML::MotionRecord record;
-    record.mPositionX = inPositionX;
-    record.mScaleX = record.mScaleY = inScale;
-    return record;
-}
-
 class CompositorTest : public ::testing::Test
 {
 protected:
@@ -196,8 +188,8 @@ TEST_F(CompositorTest, FieldMotionIsDrawnInTwoPassesHashedInOrderAndOneFieldIsKe
     // layer left, field 2 (its tick 10) right.
     mParams.SetFrameTime(MF::FrameTime(Ticks(10), Ticks(20)));
     mParams.mFieldType = mvxmediatypes::kFieldType_UpperFirst;
-    const ML::MotionRecord left = Moved(0.25f, 0.5f);
-    const ML::MotionRecord right = Moved(0.75f, 0.5f);
+    const ML::MotionRecord left{.mPositionX = 0.25f, .mScaleX = 0.5f, .mScaleY = 0.5f};
+    const ML::MotionRecord right{.mPositionX = 0.75f, .mScaleX = 0.5f, .mScaleY = 0.5f};
     const auto top = MakeLayer(kBlue, {{Ticks(0), left}, {Ticks(10), right}});
     const NodeRef bottom = ML::CreateSolidColorNode(kRedColor);
     const NodeRef compositor = MakeCompositor({{bottom}, {NodeRef(top.Get()), 10, 1}});
@@ -285,7 +277,8 @@ TEST_F(CompositorTest, IdentityLayerPassesThroughAndEmptyContentKeepsTheLower)
               frame);
     // Opacity and blend mode do not count for a layer alone; geometry does.
     EXPECT_EQ(ML::ApplyMotion(frame, faded, faded, mParams), frame);
-    EXPECT_NE(ML::ApplyMotion(frame, Moved(0.4f, 1.0f), Moved(0.4f, 1.0f), mParams), frame);
+    const ML::MotionRecord shifted{.mPositionX = 0.4f};
+    EXPECT_NE(ML::ApplyMotion(frame, shifted, shifted, mParams), frame);
 
     const FrameRef lower = vrtest::MakeFrame(8, 4);
     lower->MarkShared(1);
