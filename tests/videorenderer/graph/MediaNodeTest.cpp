@@ -10,6 +10,7 @@
 #include "graph/RenderableNodeMediaImpl.h"
 
 #include <functional>
+#include <tuple>
 
 namespace graphtest
 {
@@ -53,55 +54,27 @@ FrameRef RenderChain(const SourceRef& inSource, ML::CutlistRenderParams inParams
     return frame;
 }
 
-TEST(MediaNodeTest, RenderFlagsSayStillAndOpaque)
+TEST(MediaNodeTest, RenderFlagsSayStillAndOpaqueAndFrameHashesFollowMediaTime)
 {
-    BE::MediaSettings offline;
-    offline.mLocation = "/nonexistent/clip.y4m";
-    const struct
-    {
-        const char* mName;
-        NodeRef mNode;
-        std::uint32_t mFlags;
-    } cases[] = {
-        {"opaque still", MediaNode(Pattern("pattern:bars?size=64x36")), 93},
-        {"still with alpha", MediaNode(Pattern("pattern:bars?size=64x36&alpha=straight")), 92},
-        {"opaque moving", MediaNode(Pattern("pattern:moving?size=64x36")), 85},
-        {"muted", MediaNode(Pattern("pattern:moving?size=64x36"), {}, {}, true), 84},
-        {"offline", MediaNode(MakeMedia(offline)), 85},
-    };
-    for (const auto& c : cases)
-    {
-        SCOPED_TRACE(c.mName);
-        EXPECT_EQ(c.mNode->GetRenderFlags(), c.mFlags);
-        EXPECT_EQ(c.mNode->GetNodeType().ToStdString(), "RenderableNodeMediaImpl");
-    }
-}
-
-TEST(MediaNodeTest, FrameHashesFollowMediaTimeAndMaterial)
-{
-    const NodeRef still = MediaNode(Pattern("pattern:bars?size=64x36"));
-    const NodeRef moving = MediaNode(Pattern("pattern:moving?size=64x36"));
-    const ML::CutlistRenderParams early = At(MF::FrameTime(Frames(1)));
-    const ML::CutlistRenderParams late = At(MF::FrameTime(Frames(7)));
-    EXPECT_EQ(FrameHash(still, early), FrameHash(still, late));
-    EXPECT_NE(FrameHash(moving, early), FrameHash(moving, late));
-    // Different material of the same size never shares a node (and so a
-    // frame) hash; the same material in another node does.
-    EXPECT_NE(still->GetNodeHash(),
-              MediaNode(Pattern("pattern:gradient?size=64x36"))->GetNodeHash());
-    EXPECT_EQ(still->GetNodeHash(), MediaNode(Pattern("pattern:bars?size=64x36"))->GetNodeHash());
-    ML::CutlistRenderParams smaller = early;
-    smaller.mWidth = 32;
-    EXPECT_NE(FrameHash(moving, early), FrameHash(moving, smaller));
+    const std::tuple<const char*, const char*, std::uint32_t> cases[] = {
+        {"bars", "size=64x36", 93},
+        {"bars", "size=64x36&alpha=straight", 92},
+        {"moving", "size=64x36", 85}};
+    for (const auto& [pattern, query, flags] : cases)
+        EXPECT_EQ(MediaNode(Pattern(pattern, query))->GetRenderFlags(), flags) << query;
+    const NodeRef still = MediaNode(Pattern("bars"));
+    const NodeRef moving = MediaNode(Pattern("moving"));
+    EXPECT_EQ(FrameHash(still, AtFrame(1)), FrameHash(still, AtFrame(7)));
+    EXPECT_NE(FrameHash(moving, AtFrame(1)), FrameHash(moving, AtFrame(7)));
+    // Other material never shares a node (and so a frame) hash; the same
+    // material in another node does.
+    EXPECT_NE(still->GetNodeHash(), MediaNode(Pattern("gradient"))->GetNodeHash());
+    EXPECT_EQ(still->GetNodeHash(), MediaNode(Pattern("bars"))->GetNodeHash());
 }
 
 TEST(MediaNodeTest, FieldSettingsBuildTheirFilters)
 {
-    const BE::MediaRef upper = Pattern("pattern:moving?size=64x36&field=upper");
-    const auto dominance = [](const SourceRef& in)
-    { return ML::ReverseFieldDominanceOfSource(in); };
-    const auto reverse = [](const SourceRef& in) { return ML::FieldReverseSource(in); };
-    const auto deinterlace = [](const SourceRef& in) { return ML::DeinterlaceSource(in); };
+    const BE::MediaRef upper = Pattern("moving", "size=64x36&field=upper");
     BE::ClipSettings reversed;
     reversed.mReverseFieldDominance = true;
     BE::ClipSettings deinterlaced;
@@ -119,10 +92,13 @@ TEST(MediaNodeTest, FieldSettingsBuildTheirFilters)
         SourceRef mOther;
         MF::FrameTime mTime;
     } cases[] = {
-        {"dominance then field reverse", reversed, Chain(upper, {dominance, reverse}),
-         Chain(upper, {dominance}), MF::FrameTime(Frames(2))},
-        {"deinterlace always", deinterlaced, Chain(upper, {deinterlace}), Chain(upper, {}), fields},
-        {"frame hold deinterlace", held, Chain(upper, {deinterlace}), Chain(upper, {}), fields},
+        {"dominance then field reverse", reversed,
+         Chain(upper, {ML::ReverseFieldDominanceOfSource, ML::FieldReverseSource}),
+         Chain(upper, {ML::ReverseFieldDominanceOfSource}), MF::FrameTime(Frames(2))},
+        {"deinterlace always", deinterlaced, Chain(upper, {ML::DeinterlaceSource}),
+         Chain(upper, {}), fields},
+        {"frame hold deinterlace", held, Chain(upper, {ML::DeinterlaceSource}), Chain(upper, {}),
+         fields},
     };
     for (const auto& c : cases)
     {
@@ -137,7 +113,7 @@ TEST(MediaNodeTest, FieldSettingsBuildTheirFilters)
     }
     // The producer renders through that chain, at the hold time when held.
     EXPECT_TRUE(SamePixels(Render(MediaNode(upper, held, mt::kFieldType_UpperFirst), At(fields)),
-                           RenderChain(Chain(upper, {deinterlace}),
+                           RenderChain(Chain(upper, {ML::DeinterlaceSource}),
                                        At(MF::FrameTime(Frames(3)), mt::kFieldType_UpperFirst))));
 }
 
@@ -145,11 +121,11 @@ TEST(MediaNodeTest, MediaWithoutSourceShowItsState)
 {
     BE::MediaSettings offline;
     offline.mLocation = "/nonexistent/clip.y4m";
-    BE::MediaSettings pending;
+    BE::MediaSettings pending = offline;
     pending.mKind = BE::MediaKind::kPattern;
     pending.mLocation = "pattern:moving";
     pending.mPending = true;
-    const ML::CutlistRenderParams params = At(MF::FrameTime(Frames(2)));
+    const ML::CutlistRenderParams params = AtFrame(2);
     // Offline and pending media keep their stream's picture size: 1920x1080.
     const auto picture = [](std::int32_t inNumber)
     {
@@ -164,26 +140,29 @@ TEST(MediaNodeTest, MediaWithoutSourceShowItsState)
     {
         const char* mName;
         NodeRef mNode;
+        std::uint32_t mFlags;
         ML::CutlistRenderParams mParams;
         FrameRef mExpected;
     } cases[] = {
-        {"muted", MediaNode(Pattern("pattern:bars?size=64x36"), {}, {}, true), params,
+        {"muted", MediaNode(Pattern("moving"), {}, {}, true), 84, params,
          ML::CutlistRenderer::GetBlackFrame(params)},
-        {"offline", MediaNode(MakeMedia(offline)), full, picture(ML::kStaticImage_MediaOffline)},
-        {"pending", MediaNode(MakeMedia(pending)), full, picture(ML::kStaticImage_MediaPending)},
+        {"offline", MediaNode(MakeMedia(offline)), 85, full,
+         picture(ML::kStaticImage_MediaOffline)},
+        {"pending", MediaNode(MakeMedia(pending)), 85, full,
+         picture(ML::kStaticImage_MediaPending)},
     };
     EXPECT_FALSE(SamePixels(cases[1].mExpected, cases[2].mExpected));
     for (const auto& c : cases)
     {
         SCOPED_TRACE(c.mName);
+        EXPECT_EQ(c.mNode->GetRenderFlags(), c.mFlags);
         EXPECT_TRUE(SamePixels(Render(c.mNode, c.mParams), c.mExpected));
     }
 }
 
 TEST(MediaNodeTest, NestedSequenceRendersItsCutlist)
 {
-    const BE::MediaRef moving = Pattern("pattern:moving?size=64x36");
-    const BE::TrackItemRef innerItem = Item(moving);
+    const BE::TrackItemRef innerItem = Item(Pattern("moving"));
     const vrtest::CutlistRef cutlist = vrtest::OneSegment(ClipOver(innerItem));
     BE::SequenceBuilder builder("Inner", Sequence());
     builder.AddTrack();
@@ -196,20 +175,15 @@ TEST(MediaNodeTest, NestedSequenceRendersItsCutlist)
     setup.mNestedCutlist = cutlist;
     const NodeRef node = ML::CreateMediaNode(setup);
 
+    const ML::CutlistRenderParams params = AtFrame(6);
     MF::FrameTime local;
-    for (const double frame : {1.0, 6.0})
-    {
-        SCOPED_TRACE(frame);
-        const ML::CutlistRenderParams params = At(MF::FrameTime(Frames(frame)));
-        QRT::InterfaceRef<ML::IRenderableNodeProducer> inner;
-        ASSERT_EQ(ML::CutlistRenderer::GetProducerForCutlist(cutlist, params, inner, local),
-                  QRT::kResult_Success);
-        EXPECT_TRUE(SamePixels(Render(node, params),
-                               ML::CutlistRenderer::RenderFrameFromCutlist(
-                                   inner, params, local, {mt::kPixelFormat_BGRA_4444_8u}, false)));
-    }
-    setup.mNestedCutlist = vrtest::OneSegment(ClipOver(Item(Pattern("pattern:bars?size=64x36"))));
-    const ML::CutlistRenderParams params = At(MF::FrameTime(Frames(1)));
+    QRT::InterfaceRef<ML::IRenderableNodeProducer> inner;
+    ASSERT_EQ(ML::CutlistRenderer::GetProducerForCutlist(cutlist, params, inner, local),
+              QRT::kResult_Success);
+    EXPECT_TRUE(SamePixels(Render(node, params),
+                           ML::CutlistRenderer::RenderFrameFromCutlist(
+                               inner, params, local, {mt::kPixelFormat_BGRA_4444_8u}, false)));
+    setup.mNestedCutlist = vrtest::OneSegment(ClipOver(Item(Pattern("bars"))));
     EXPECT_NE(FrameHash(node, params), FrameHash(ML::CreateMediaNode(setup), params));
 }
 

@@ -1,6 +1,6 @@
 #pragma once
 
-// The media and clip node suites' helpers: back-end media and items made in
+// The media, clip and compositor suites' helpers: back-end media and items made in
 // one line, nodes over them in a small 64x36 sequence at 25 frames per
 // second, and rendering or hashing a node's producer at a frame time.
 
@@ -40,11 +40,12 @@ inline BE::MediaRef MakeMedia(BE::MediaSettings inSettings, const BE::SequenceRe
     return made.mMedia;
 }
 
-inline BE::MediaRef Pattern(const std::string& inText)
+// The generated pattern inName with the settings inQuery.
+inline BE::MediaRef Pattern(const std::string& inName, const std::string& inQuery = "size=64x36")
 {
     BE::MediaSettings settings;
     settings.mKind = BE::MediaKind::kPattern;
-    settings.mLocation = inText;
+    settings.mLocation = "pattern:" + inName + "?" + inQuery;
     return MakeMedia(settings);
 }
 
@@ -84,6 +85,12 @@ inline ML::CutlistRenderParams At(const MF::FrameTime& inTime,
     ML::CutlistRenderParams params = vrtest::MakeParams(64, 36, inTime);
     params.mFieldType = static_cast<std::uint32_t>(inField);
     return params;
+}
+
+// The parameters of a progressive 64x36 render at frame inFrame.
+inline ML::CutlistRenderParams AtFrame(double inFrame)
+{
+    return At(MF::FrameTime(Frames(inFrame)));
 }
 
 inline QRT::InterfaceRef<ML::IRenderableNodeProducer>

@@ -3,17 +3,16 @@
 // per pixel, R for red, B for blue, ? for anything else.
 
 #include "ContractExpect.h"
-#include "IR/ImageRenderer.h"
 #include "ML/CutlistRenderer.h"
 #include "ML/IRenderableNodeIntrinsicParameterProvider.h"
 #include "ML/RenderFlags.h"
 #include "ML/RenderableNodeCompositorImpl.h"
 #include "ML/RenderableNodes.h"
+#include "MediaNodeTestSupport.h"
 #include "QRT/Exception.h"
 #include "TestFrames.h"
-#include "TestNodeKinds.h"
+#include "TestNode.h"
 #include "TestProducer.h"
-#include "VF/PixelFormatConversions.h"
 #include "VF/SharedVideoFrameCache.h"
 #include "render/VideoFrameCompositeUtilities.h"
 
@@ -26,7 +25,11 @@
 namespace
 {
 
+using graphtest::BytesOf;
+using graphtest::FrameHash;
 using graphtest::NodeRef;
+using graphtest::ProducerOf;
+using graphtest::Render;
 using graphtest::Ticks;
 using mvxmediatypes::TickTime;
 using vrtest::Bgra;
@@ -36,37 +39,23 @@ constexpr Bgra kRed{0, 0, 255, 255};
 constexpr Bgra kBlue{255, 0, 0, 255};
 constexpr std::uint32_t kRedColor = 0xFFFF0000u;
 
-// A layer with a producer and per-time motion that records when it was asked.
+// A layer answering its test producer, with per-time motion.
 class LayerNode
-    : public ML::RenderableNodeWithInterfaces<graphtest::ScriptedProviderNode,
+    : public ML::RenderableNodeWithInterfaces<vrtest::TestNode,
                                               ML::IRenderableNodeIntrinsicParameterProvider>
 {
 public:
-    LayerNode()
-        : RenderableNodeWithInterfaces("LayerNode", 0)
-    {
-    }
-    void GetProducer(QRT::InterfaceRef<ML::IRenderableNodeProducer>& outProducer,
-                     const MF::FrameTime&, const ML::CutlistRenderParams&) const override
-    {
-        outProducer = mProducer;
-    }
     QRT::Result GetIntrinsicParameters(TickTime inLayerTime, const ML::CutlistRenderParams&,
                                        ML::MotionRecord& ioRecord) const override
     {
-        mAskedTimes.push_back(inLayerTime);
         if (const auto found = mMotion.find(inLayerTime); found != mMotion.end())
             ioRecord = found->second;
         return QRT::kResult_Success;
     }
 
-    QRT::InterfaceRef<vrtest::TestProducer> mProducer =
+    QRT::InterfaceRef<vrtest::TestProducer> mTest =
         QRT::Allocated<vrtest::TestProducer>::CreateInstance();
     std::map<TickTime, ML::MotionRecord> mMotion;
-    mutable std::vector<TickTime> mAskedTimes;
-
-protected:
-    ~LayerNode() = default;
 };
 
 // A sealed layer whose frames are the request's size and format, filled with inColor.
@@ -74,10 +63,10 @@ QRT::InterfaceRef<LayerNode> MakeLayer(const Bgra& inColor,
                                        std::map<TickTime, ML::MotionRecord> inMotion = {})
 {
     auto node = QRT::Allocated<LayerNode>::CreateInstance();
-    node->mProducer->mFormat = mvxmediatypes::kPixelFormat_Invalid;
-    node->mProducer->mWidth = 0;
-    node->mProducer->mPaint = [inColor](MF::IVideoFrame& ioFrame)
-    { vrtest::Fill(ioFrame, inColor); };
+    node->mProducer = node->mTest;
+    node->mTest->mFormat = mvxmediatypes::kPixelFormat_Invalid;
+    node->mTest->mWidth = 0;
+    node->mTest->mPaint = [inColor](MF::IVideoFrame& ioFrame) { vrtest::Fill(ioFrame, inColor); };
     node->mMotion = std::move(inMotion);
     node->MakeImmutable();
     return node;
@@ -97,30 +86,6 @@ NodeRef MakeCompositor(const std::vector<LayerInput>& inLayers)
         compositor->AddTrackInput(layer.mNode, Ticks(layer.mOffset), layer.mTrack);
     compositor->MakeImmutable();
     return compositor->GetSelfReference();
-}
-
-QRT::InterfaceRef<ML::IRenderableNodeProducer> ProducerOf(const NodeRef& inNode,
-                                                          const ML::CutlistRenderParams& inParams)
-{
-    QRT::InterfaceRef<ML::IRenderableNodeProducer> producer;
-    QRT::QueryRef<ML::IRenderableNodeProducerProvider>(inNode)->GetProducer(
-        producer, inParams.GetFrameTime(), inParams);
-    return producer;
-}
-
-FrameRef Render(const NodeRef& inNode, const ML::CutlistRenderParams& inParams)
-{
-    FrameRef frame;
-    EXPECT_EQ(ProducerOf(inNode, inParams)->ProduceFrame(inParams.GetFrameTime(), inParams, frame),
-              QRT::kResult_Success);
-    return frame;
-}
-
-QRT::Guid HashOf(const NodeRef& inNode, const ML::CutlistRenderParams& inParams)
-{
-    QRT::Guid hash;
-    ProducerOf(inNode, inParams)->GetFrameHash(hash, inParams.GetFrameTime(), inParams);
-    return hash;
 }
 
 const std::uint8_t* PixelAt(const MF::IVideoFrame& inFrame, std::int32_t inX, std::int32_t inY)
@@ -150,14 +115,6 @@ std::string Letters(const FrameRef& inFrame)
     return letters;
 }
 
-ML::MotionRecord Moved(float inPositionX, float inScale)
-{
-    ML::MotionRecord record;
-    record.mPositionX = inPositionX;
-    record.mScaleX = record.mScaleY = inScale;
-    return record;
-}
-
 class CompositorTest : public ::testing::Test
 {
 protected:
@@ -167,53 +124,37 @@ protected:
     ML::CutlistRenderParams mParams = vrtest::MakeParams(8, 4);
 };
 
-TEST(MotionRecordTest, FieldOffsetsAndWhichFieldsEachComparisonReads)
+TEST(MotionRecordTest, EachComparisonReadsItsFields)
 {
     using R = ML::MotionRecord;
-    // Per field: its offset, and whether SameGeometry and SameMotion still hold
-    // when only that field differs from the identity.
-    const struct
-    {
-        std::size_t mOffset, mExpected;
-        bool mSameGeometry, mSameMotion;
-    } fields[] = {
-        {offsetof(R, mAnchorX), 0, false, false},
-        {offsetof(R, mAnchorY), 4, false, false},
-        {offsetof(R, mPositionX), 8, false, false},
-        {offsetof(R, mPositionY), 12, false, false},
-        {offsetof(R, mScaleX), 16, false, false},
-        {offsetof(R, mScaleY), 20, false, false},
-        {offsetof(R, mRotation), 24, false, false},
-        {offsetof(R, mReserved1), 32, false, false},
-        {offsetof(R, mReserved2), 36, true, true},
-        {offsetof(R, mReserved3), 40, false, false},
-        {offsetof(R, mMediaPixelAspect), 48, true, true},
-        {offsetof(R, mMediaWidth), 52, false, false},
-        {offsetof(R, mMediaHeight), 56, false, false},
-        {offsetof(R, mReserved4), 60, true, true},
-        {offsetof(R, mBlendMode), 64, true, false},
-        {offsetof(R, mOpacity), 68, true, false},
+    // Per field: 2 when both comparisons read it, 1 when only SameMotion does.
+    const std::pair<std::size_t, int> fields[] = {
+        {offsetof(R, mAnchorX), 2},          {offsetof(R, mAnchorY), 2},
+        {offsetof(R, mPositionX), 2},        {offsetof(R, mPositionY), 2},
+        {offsetof(R, mScaleX), 2},           {offsetof(R, mScaleY), 2},
+        {offsetof(R, mRotation), 2},         {offsetof(R, mReserved1), 2},
+        {offsetof(R, mReserved2), 0},        {offsetof(R, mReserved3), 2},
+        {offsetof(R, mMediaPixelAspect), 0}, {offsetof(R, mMediaWidth), 2},
+        {offsetof(R, mMediaHeight), 2},      {offsetof(R, mReserved4), 0},
+        {offsetof(R, mBlendMode), 1},        {offsetof(R, mOpacity), 1},
     };
-    EXPECT_EQ(sizeof(R), 72u);
-    EXPECT_EQ(ML::kIdentityMotionRecord.mBlendMode, 18u);
-    for (const auto& field : fields)
+    for (const auto& [offset, reads] : fields)
     {
-        SCOPED_TRACE(field.mExpected);
-        EXPECT_EQ(field.mOffset, field.mExpected);
+        SCOPED_TRACE(offset);
         R record;
-        reinterpret_cast<unsigned char*>(&record)[field.mOffset + 3] ^= 0x08;
-        EXPECT_EQ(ML::SameGeometry(record, ML::kIdentityMotionRecord), field.mSameGeometry);
-        EXPECT_EQ(ML::SameMotion(record, ML::kIdentityMotionRecord), field.mSameMotion);
+        reinterpret_cast<unsigned char*>(&record)[offset + 3] ^= 0x08;
+        EXPECT_EQ(ML::SameGeometry(record, ML::kIdentityMotionRecord), reads < 2);
+        EXPECT_EQ(ML::SameMotion(record, ML::kIdentityMotionRecord), reads == 0);
     }
 }
 
-TEST_F(CompositorTest, FlagsAreTheInputsAndWithoutInputsTheBlackFrameIsRendered)
+TEST_F(CompositorTest, FlagsAreTheInputsEmptyIsBlackAndAFailingLayerAborts)
 {
     const struct
     {
         std::vector<std::uint32_t> mInputFlags;
         std::uint32_t mExpected;
-    } cases[] = {{{}, 92}, {{255}, 92}, {{92 | 1, 84}, 84}, {{84 | 8, 1}, 0}};
+    } cases[] = {{{}, 92}, {{92 | 1, 84}, 84}, {{84 | 8, 1}, 0}};
     for (const auto& testCase : cases)
     {
         std::vector<LayerInput> layers;
@@ -226,157 +167,32 @@ TEST_F(CompositorTest, FlagsAreTheInputsAndWithoutInputsTheBlackFrameIsRendered)
     EXPECT_THROW(withEmptyInput->MakeImmutable(), QRT::NullInterfaceException);
 
     const NodeRef empty = MakeCompositor({});
-    EXPECT_EQ(empty->GetNodeType().Compare(
-                  QRT::ImmutableString::CreateStatic("RenderableNodeCompositorImpl")),
-              0);
     EXPECT_EQ(Render(empty, mParams), ML::CutlistRenderer::GetBlackFrame(mParams));
-    EXPECT_EQ(HashOf(empty, mParams), ML::CutlistRenderer::GetBlackFrameHash(mParams));
+    EXPECT_EQ(FrameHash(empty, mParams), ML::CutlistRenderer::GetBlackFrameHash(mParams));
+
+    // A failing layer aborts the composite with its status; the layers above are not asked.
+    const auto failing = MakeLayer(kBlue);
+    failing->mTest->mFailure = vrtest::ProducerFailure::kStatus;
+    const auto above = MakeLayer(kRed);
+    const NodeRef compositor = MakeCompositor({{NodeRef(failing.Get())}, {NodeRef(above.Get())}});
+    FrameRef frame;
+    EXPECT_EQ(ProducerOf(compositor, mParams)->ProduceFrame(mParams.GetFrameTime(), mParams, frame),
+              failing->mTest->mFailureStatus);
+    EXPECT_FALSE(frame);
+    EXPECT_EQ(above->mTest->mProduceCount.load(), 0);
 }
 
-TEST_F(CompositorTest, TopLayerIsDrawnThroughItsMotionOntoTheBottomAndHashedInOrder)
+TEST_F(CompositorTest, FieldMotionIsDrawnInTwoPassesHashedInOrderAndOneFieldIsKept)
 {
-    mParams.SetFrameTime(MF::FrameTime(Ticks(100)));
-    const auto top = MakeLayer(kBlue, {{Ticks(90), Moved(0.5f, 0.5f)}});
+    // The layer starts 10 ticks late: field 1 (its tick 0) moves the half-size
+    // layer left, field 2 (its tick 10) right.
+    mParams.SetFrameTime(MF::FrameTime(Ticks(10), Ticks(20)));
+    mParams.mFieldType = mvxmediatypes::kFieldType_UpperFirst;
+    const ML::MotionRecord left{.mPositionX = 0.25f, .mScaleX = 0.5f, .mScaleY = 0.5f};
+    const ML::MotionRecord right{.mPositionX = 0.75f, .mScaleX = 0.5f, .mScaleY = 0.5f};
+    const auto top = MakeLayer(kBlue, {{Ticks(0), left}, {Ticks(10), right}});
     const NodeRef bottom = ML::CreateSolidColorNode(kRedColor);
     const NodeRef compositor = MakeCompositor({{bottom}, {NodeRef(top.Get()), 10, 1}});
-    EXPECT_EQ(Letters(Render(compositor, mParams)), "RRRRRRRR|RRBBBBRR|RRBBBBRR|RRRRRRRR");
-    // Asked once per field, in the layer's own time.
-    EXPECT_EQ(top->mAskedTimes, (std::vector<TickTime>{Ticks(90), Ticks(90)}));
-
-    // The exact runs: each layer's two records and frame hash, then the node
-    // hash and the request.
-    const auto recordBytes = [](const ML::MotionRecord& inRecord)
-    { return std::string(reinterpret_cast<const char*>(&inRecord), sizeof(inRecord)); };
-    QRT::Guid bottomHash;
-    ProducerOf(bottom, mParams)->GetFrameHash(bottomHash, mParams.GetFrameTime(), mParams);
-    const ML::MotionRecord identity;
-    const ML::MotionRecord moved = Moved(0.5f, 0.5f);
-    EXPECT_EQ(HashOf(compositor, mParams),
-              graphtest::HashOfRuns(
-                  {"RenderableNodeCompositorProducer", recordBytes(identity), recordBytes(identity),
-                   graphtest::BytesOf(bottomHash), recordBytes(moved), recordBytes(moved),
-                   graphtest::BytesOf(top->mProducer->mHash),
-                   graphtest::BytesOf(compositor->GetNodeHash()),
-                   graphtest::BytesOf(mParams.mPixelAspectRatio),
-                   graphtest::BytesOf(mParams.mWidth), graphtest::BytesOf(mParams.mHeight),
-                   graphtest::BytesOf(mParams.mQuality), graphtest::BytesOf(mParams.mSingleField),
-                   graphtest::BytesOf(mParams.mSecondaryQuality),
-                   graphtest::BytesOf(mParams.mPixelFormat)}));
-    EXPECT_EQ(top->mProducer->LastHashTime(), MF::FrameTime(Ticks(90)));
-    const NodeRef swapped = MakeCompositor({{NodeRef(top.Get()), 10, 0}, {bottom, 0, 1}});
-    EXPECT_NE(HashOf(swapped, mParams), HashOf(compositor, mParams));
-    EXPECT_EQ(Letters(Render(swapped, mParams)), "RRRRRRRR|RRRRRRRR|RRRRRRRR|RRRRRRRR");
-}
-
-TEST_F(CompositorTest, TrackIndexLimitKeepsTheTracksAtOrBelowIt)
-{
-    const auto blue = MakeLayer(kBlue);
-    const NodeRef compositor =
-        MakeCompositor({{ML::CreateSolidColorNode(kRedColor), 0, 0}, {NodeRef(blue.Get()), 0, 2}});
-    const struct
-    {
-        std::int64_t mLimit;
-        char mExpected;
-    } cases[] = {{-1, 'B'}, {0, 'R'}, {1, 'R'}, {2, 'B'}};
-    for (const auto& testCase : cases)
-    {
-        mParams.mCutlistParameter = testCase.mLimit;
-        EXPECT_EQ(Letters(Render(compositor, mParams)).front(), testCase.mExpected)
-            << testCase.mLimit;
-    }
-    // Inputs added without a track index break the pairing once a limit applies.
-    auto unpaired = ML::RenderableNodeCompositorImpl::Create();
-    unpaired->AddTrackInput(ML::CreateSolidColorNode(kRedColor), Ticks(0), 0);
-    unpaired->AddInput(ML::CreateSolidColorNode(kRedColor), Ticks(0));
-    unpaired->MakeImmutable();
-    EXPECT_INPUT_CONTRACT(ProducerOf(unpaired->GetSelfReference(), mParams),
-                          "mInputs.size() == mTrackIndices.size()");
-}
-
-TEST_F(CompositorTest, ConformingIdentityLayerPassesThroughAndEmptyContentKeepsTheLower)
-{
-    const auto layer = MakeLayer(kBlue);
-    const MF::IVideoFrame* painted = nullptr;
-    layer->mProducer->mPaint = [&](MF::IVideoFrame& ioFrame) { painted = &ioFrame; };
-    EXPECT_EQ(Render(MakeCompositor({{NodeRef(layer.Get())}}), mParams).Get(), painted);
-    // A faded layer alone keeps its opacity (over nothing, its alpha is halved).
-    ML::MotionRecord half;
-    half.mOpacity = 0.5f;
-    const auto alone = MakeLayer(kBlue, {{mParams.GetFirstFieldTime(), half}});
-    const FrameRef halved = Render(MakeCompositor({{NodeRef(alone.Get())}}), mParams);
-    EXPECT_NEAR(PixelAt(*halved, 3, 2)[3], 128, 1);
-
-    const FrameRef frame = vrtest::MakeFrame(8, 4);
-    EXPECT_EQ(ML::ApplyMotion(frame, ML::kIdentityMotionRecord, ML::kIdentityMotionRecord, mParams),
-              frame);
-    // Opacity and blend mode do not count for a layer alone; geometry and size do.
-    ML::MotionRecord faded;
-    faded.mOpacity = 0.5f;
-    EXPECT_EQ(ML::ApplyMotion(frame, faded, faded, mParams), frame);
-    EXPECT_NE(ML::ApplyMotion(frame, Moved(0.4f, 1.0f), Moved(0.4f, 1.0f), mParams), frame);
-    const FrameRef small = ML::ApplyMotion(vrtest::MakeFrame(4, 4), ML::kIdentityMotionRecord,
-                                           ML::kIdentityMotionRecord, mParams);
-    EXPECT_EQ(small->GetBounds(), QRT::ParamRect(0, 0, 8, 4));
-
-    const FrameRef lower = vrtest::MakeFrame(8, 4);
-    lower->MarkShared(1);
-    const FrameRef nothing =
-        VF::CreateVideoFrame(mvxmediatypes::kPixelFormat_BGRA_4444_8u, 8, 4,
-                             mvxmediatypes::kPixelAspectRatio_Square, true, true);
-    EXPECT_EQ(ML::CompositeLayer(nothing, faded, faded, lower, mParams), lower);
-    EXPECT_INPUT_CONTRACT(ML::CompositeLayer({}, faded, faded, lower, mParams), "inFrame");
-    EXPECT_INPUT_CONTRACT(ML::CompositeLayer(frame, faded, faded, vrtest::MakeFrame(4, 4), mParams),
-                          "!inLowerFrame || FrameAlreadyConformsToOutput(inLowerFrame, "
-                          "inRenderParams)");
-}
-
-TEST_F(CompositorTest, EveryBlendModeDrawsInPlaceAsTheBlendKernel)
-{
-    // Half-transparent gradients, so that every mode gives its own picture.
-    const auto gradient = [](std::uint8_t inSeed)
-    {
-        FrameRef frame = vrtest::MakeFrame(8, 4);
-        auto* base = static_cast<std::uint8_t*>(frame->GetWritableBaseAddress());
-        for (std::int32_t y = 0; y < 4; ++y)
-            for (std::int32_t x = 0; x < 32; ++x)
-                base[y * frame->GetRowBytes() + x] =
-                    static_cast<std::uint8_t>(inSeed + 29 * x + 53 * y) | ((x % 4 == 3) ? 0x80 : 0);
-        return frame;
-    };
-    const FrameRef upper = gradient(7);
-    ML::MotionRecord record = Moved(0.45f, 0.75f);
-    record.mOpacity = 0.75f;
-    for (const std::uint32_t mode : {1u, 2u, 5u, 6u, 9u, 11u, 15u, 17u, 18u})
-    {
-        SCOPED_TRACE(mode);
-        record.mBlendMode = mode;
-        const FrameRef lower = gradient(100);
-        const FrameRef expected = gradient(100);
-        IR_AffineMatrix matrix;
-        IR_BuildMotionMatrix(ML::ToMotionGeometry(record), 8, 4, 8, 4, &matrix);
-        ASSERT_EQ(IR_MotionWithBlendMode(
-                      upper->GetBaseAddress(), upper->GetRowBytes(), kIR_PixelFormat_BGRA_8u, 8, 4,
-                      expected->GetWritableBaseAddress(), expected->GetRowBytes(),
-                      kIR_PixelFormat_BGRA_8u, 8, 4, &matrix, 0.75f, 0, kIR_Field_All, true, mode),
-                  kIR_NoError);
-        const FrameRef result = ML::CompositeLayer(upper, record, record, lower, mParams);
-        ASSERT_EQ(result, lower);
-        for (std::int32_t y = 0; y < 4; ++y)
-            EXPECT_TRUE(std::equal(PixelAt(*result, 0, y), PixelAt(*result, 8, y),
-                                   PixelAt(*expected, 0, y)))
-                << "row " << y;
-    }
-}
-
-TEST_F(CompositorTest, DifferentFieldMotionIsDrawnInTwoFieldPassesAndOneFieldIsKept)
-{
-    // Field 1 at tick 0 moves the half-size layer left, field 2 at tick 10 right.
-    mParams.SetFrameTime(MF::FrameTime(Ticks(0), Ticks(10)));
-    mParams.mFieldType = mvxmediatypes::kFieldType_UpperFirst;
-    const auto top =
-        MakeLayer(kBlue, {{Ticks(0), Moved(0.25f, 0.5f)}, {Ticks(10), Moved(0.75f, 0.5f)}});
-    const NodeRef compositor =
-        MakeCompositor({{ML::CreateSolidColorNode(kRedColor)}, {NodeRef(top.Get())}});
     const struct
     {
         std::uint32_t mSingleField;
@@ -402,43 +218,78 @@ TEST_F(CompositorTest, DifferentFieldMotionIsDrawnInTwoFieldPassesAndOneFieldIsK
             letters[index] = expected[index] == '.' ? '.' : letters[index];
         EXPECT_EQ(letters, expected);
     }
+
+    // The exact runs: each layer's two records and frame hash, in layer time,
+    // then the node hash and the request.
+    const ML::MotionRecord identity;
+    EXPECT_EQ(
+        FrameHash(compositor, mParams),
+        graphtest::HashOfRuns(
+            {"RenderableNodeCompositorProducer", BytesOf(identity), BytesOf(identity),
+             BytesOf(FrameHash(bottom, mParams)), BytesOf(left), BytesOf(right),
+             BytesOf(top->mTest->mHash), BytesOf(compositor->GetNodeHash()),
+             BytesOf(mParams.mPixelAspectRatio), BytesOf(mParams.mWidth), BytesOf(mParams.mHeight),
+             BytesOf(mParams.mQuality), BytesOf(mParams.mSingleField),
+             BytesOf(mParams.mSecondaryQuality), BytesOf(mParams.mPixelFormat)}));
+    EXPECT_EQ(top->mTest->LastHashTime(), MF::FrameTime(Ticks(0), Ticks(10)));
 }
 
-TEST_F(CompositorTest, QualityFiveCompositesInLinearFloatWithinOneCodeOfQualityFour)
+TEST_F(CompositorTest, TrackIndexLimitKeepsTheTracksAtOrBelowIt)
 {
-    const auto top = MakeLayer(kBlue, {{Ticks(0), Moved(0.5f, 0.5f)}});
+    const auto blue = MakeLayer(kBlue);
     const NodeRef compositor =
-        MakeCompositor({{ML::CreateSolidColorNode(0xFF406080u)}, {NodeRef(top.Get())}});
-    mParams.mQuality = 4;
-    const FrameRef four = Render(compositor, mParams);
-    mParams.mQuality = 5;
-    const FrameRef five = Render(compositor, mParams);
-    ASSERT_TRUE(four && five);
-    EXPECT_EQ(five->GetPixelFormat(), mvxmediatypes::kPixelFormat_BGRP_4444_32f_Linear);
-    const FrameRef delivered = ML::CutlistRenderer::ConformFrameToOutput(
-        five, mParams, mvxmediatypes::kPixelFormat_BGRA_4444_8u,
-        {mvxmediatypes::kPixelFormat_BGRA_4444_8u});
-    int largest = 0;
-    for (std::int32_t y = 0; y < 4; ++y)
-        for (std::int32_t x = 0; x < 32; ++x)
-            largest =
-                std::max(largest, std::abs(PixelAt(*delivered, 0, y)[x] - PixelAt(*four, 0, y)[x]));
-    EXPECT_LE(largest, 1);
-    EXPECT_EQ(Letters(four).substr(9, 8), "??BBBB??");
+        MakeCompositor({{ML::CreateSolidColorNode(kRedColor), 0, 0}, {NodeRef(blue.Get()), 0, 2}});
+    const struct
+    {
+        std::int64_t mLimit;
+        char mExpected;
+    } cases[] = {{-1, 'B'}, {1, 'R'}, {2, 'B'}};
+    for (const auto& testCase : cases)
+    {
+        mParams.mCutlistParameter = testCase.mLimit;
+        EXPECT_EQ(Letters(Render(compositor, mParams)).front(), testCase.mExpected)
+            << testCase.mLimit;
+    }
+    // Inputs added without a track index break the pairing once a limit applies.
+    auto unpaired = ML::RenderableNodeCompositorImpl::Create();
+    unpaired->AddTrackInput(ML::CreateSolidColorNode(kRedColor), Ticks(0), 0);
+    unpaired->AddInput(ML::CreateSolidColorNode(kRedColor), Ticks(0));
+    unpaired->MakeImmutable();
+    EXPECT_INPUT_CONTRACT(ProducerOf(unpaired->GetSelfReference(), mParams),
+                          "mInputs.size() == mTrackIndices.size()");
 }
 
-TEST_F(CompositorTest, FailingLayerAbortsWithItsStatus)
+TEST_F(CompositorTest, IdentityLayerPassesThroughAndEmptyContentKeepsTheLower)
 {
-    const auto failing = MakeLayer(kBlue);
-    failing->mProducer->mFailure = vrtest::ProducerFailure::kStatus;
-    const auto above = MakeLayer(kRed);
-    const NodeRef compositor = MakeCompositor(
-        {{ML::CreateSolidColorNode(kRedColor)}, {NodeRef(failing.Get())}, {NodeRef(above.Get())}});
-    FrameRef frame;
-    EXPECT_EQ(ProducerOf(compositor, mParams)->ProduceFrame(mParams.GetFrameTime(), mParams, frame),
-              failing->mProducer->mFailureStatus);
-    EXPECT_FALSE(frame);
-    EXPECT_EQ(above->mProducer->mProduceCount.load(), 0);
+    const auto layer = MakeLayer(kBlue);
+    const MF::IVideoFrame* painted = nullptr;
+    layer->mTest->mPaint = [&](MF::IVideoFrame& ioFrame) { painted = &ioFrame; };
+    EXPECT_EQ(Render(MakeCompositor({{NodeRef(layer.Get())}}), mParams).Get(), painted);
+    // A faded layer alone keeps its opacity (over nothing, its alpha is halved).
+    ML::MotionRecord faded;
+    faded.mOpacity = 0.5f;
+    const auto alone = MakeLayer(kBlue, {{mParams.GetFirstFieldTime(), faded}});
+    const FrameRef halved = Render(MakeCompositor({{NodeRef(alone.Get())}}), mParams);
+    EXPECT_NEAR(PixelAt(*halved, 3, 2)[3], 128, 1);
+
+    const FrameRef frame = vrtest::MakeFrame(8, 4);
+    EXPECT_EQ(ML::ApplyMotion(frame, ML::kIdentityMotionRecord, ML::kIdentityMotionRecord, mParams),
+              frame);
+    // Opacity and blend mode do not count for a layer alone; geometry does.
+    EXPECT_EQ(ML::ApplyMotion(frame, faded, faded, mParams), frame);
+    const ML::MotionRecord shifted{.mPositionX = 0.4f};
+    EXPECT_NE(ML::ApplyMotion(frame, shifted, shifted, mParams), frame);
+
+    const FrameRef lower = vrtest::MakeFrame(8, 4);
+    lower->MarkShared(1);
+    const FrameRef nothing =
+        VF::CreateVideoFrame(mvxmediatypes::kPixelFormat_BGRA_4444_8u, 8, 4,
+                             mvxmediatypes::kPixelAspectRatio_Square, true, true);
+    EXPECT_EQ(ML::CompositeLayer(nothing, faded, faded, lower, mParams), lower);
+    EXPECT_INPUT_CONTRACT(ML::CompositeLayer({}, faded, faded, lower, mParams), "inFrame");
+    EXPECT_INPUT_CONTRACT(ML::CompositeLayer(frame, faded, faded, vrtest::MakeFrame(4, 4), mParams),
+                          "!inLowerFrame || FrameAlreadyConformsToOutput(inLowerFrame, "
+                          "inRenderParams)");
 }
 
 TEST_F(CompositorTest, StillRangesAreTheShiftedUnionAndSmartTimesNeedOneInput)
@@ -500,8 +351,6 @@ TEST_F(CompositorTest, OffsetCompositeClipsAtEveryEdgeAndGrowsTheVisibleContent)
         EXPECT_EQ(destination->GetVisibleContentRect(), testCase.mCovered);
     }
     EXPECT_INPUT_CONTRACT(ML::CompositeFrameAtOffset({}, source, 0, 0), "inSourceFrame != NULL");
-    EXPECT_INPUT_CONTRACT(ML::CompositeFrameAtOffset(source, {}, 0, 0),
-                          "inDestinationFrame != NULL");
 }
 
 } // namespace
