@@ -117,13 +117,15 @@ public:
             QRT::MixHash::MixInData(hash, &side.mFirstField, kGeometryBytes);
             QRT::MixHash::MixInData(hash, &side.mSecondField, kGeometryBytes);
         }
-        QRT::MixHash::MixInValue(hash, inParams.mPixelAspectRatio.GetNumerator());
-        QRT::MixHash::MixInValue(hash, inParams.mPixelAspectRatio.GetDenominator());
+        const std::uint32_t aspect[2] = {inParams.mPixelAspectRatio.GetNumerator(),
+                                         inParams.mPixelAspectRatio.GetDenominator()};
+        QRT::MixHash::MixInValue(hash, aspect);
         QRT::MixHash::MixInValue(hash, inParams.mWidth);
         QRT::MixHash::MixInValue(hash, inParams.mHeight);
         QRT::MixHash::MixInGuid(hash, mSetup.mNodeHash);
-        QRT::MixHash::MixInValue(hash, inTime.GetFirstFieldTime().GetTicks());
-        QRT::MixHash::MixInValue(hash, inTime.GetSecondFieldTime().GetTicks());
+        const std::int64_t time[2] = {inTime.GetFirstFieldTime().GetTicks(),
+                                      inTime.GetSecondFieldTime().GetTicks()};
+        QRT::MixHash::MixInValue(hash, time);
         QRT::MixHash::MixInValue(hash, inParams.mQuality);
         QRT::MixHash::MixInValue(hash, inParams.mSecondaryQuality);
         QRT::MixHash::MixInValue(hash, inParams.mPixelFormat.GetValue());
