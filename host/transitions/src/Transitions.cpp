@@ -68,6 +68,30 @@ public:
         std::fill_n(&mByteC[at], 4, c);
     }
 
+    // Every pixel's weights from one weight per pixel (B's and the colour's).
+    void SetAll(const float* inWeightsB, const float* inWeightsC, std::int32_t inWidth)
+    {
+        const std::size_t channels = static_cast<std::size_t>(inWidth) * 4;
+        if (mFloat)
+        {
+            for (std::size_t i = 0; i < channels; ++i)
+            {
+                mFloatB[i] = inWeightsB[i / 4];
+                mFloatC[i] = inWeightsC[i / 4];
+            }
+            return;
+        }
+        for (std::size_t i = 0; i < channels; ++i)
+        {
+            const float b = inWeightsB[i / 4];
+            const int b8 = static_cast<int>(b * 256.0f + 0.5f);
+            const int both =
+                std::min(static_cast<int>((b + inWeightsC[i / 4]) * 256.0f + 0.5f), 256);
+            mByteB[i] = static_cast<std::uint16_t>(b8);
+            mByteC[i] = static_cast<std::uint16_t>(both - b8);
+        }
+    }
+
     // Weights in 1/256 whose sum stays within 256.
     static std::pair<std::uint16_t, std::uint16_t> ByteWeights(float inWeightB, float inWeightC)
     {
@@ -462,18 +486,37 @@ private:
         const float radius = inProgress * (reach + border + softness) - border - softness / 2;
         const std::uint8_t* color =
             border > 0.0f ? ioCanvas.ColorRow(inParameters.mBorderColor) : nullptr;
-        WeightRow row(ioCanvas.IsFloat(), ioCanvas.Width());
+        const std::int32_t count = ioCanvas.Width();
+        WeightRow row(ioCanvas.IsFloat(), count);
+        std::vector<float> weightsB(static_cast<std::size_t>(count));
+        std::vector<float> weightsC(static_cast<std::size_t>(count));
+        // Without a ramp the edge is a step at the pixel centre; with one, a
+        // linear ramp (a plain loop either way, so that it vectorises).
+        const float slope = ramp > 0.0f ? 1.0f / ramp : 0.0f;
         ForRows(ioCanvas, inFirst, inStep,
                 [&](std::int32_t y)
                 {
                     const float dy = float(y) + 0.5f - cy;
-                    for (std::int32_t x = 0; x < ioCanvas.Width(); ++x)
+                    for (std::int32_t x = 0; x < count; ++x)
                     {
                         const float dx = float(x) + 0.5f - cx;
                         const float distance = std::sqrt(dx * dx + dy * dy);
-                        const float b = Cover(radius, distance, ramp);
-                        row.Set(x, b, color ? Cover(radius + border, distance, ramp) - b : 0.0f);
+                        float inside, withBorder;
+                        if (ramp > 0.0f)
+                        {
+                            inside = std::clamp((radius - distance) * slope + 0.5f, 0.0f, 1.0f);
+                            withBorder =
+                                std::clamp((radius + border - distance) * slope + 0.5f, 0.0f, 1.0f);
+                        }
+                        else
+                        {
+                            inside = distance < radius ? 1.0f : 0.0f;
+                            withBorder = distance < radius + border ? 1.0f : 0.0f;
+                        }
+                        weightsB[std::size_t(x)] = inside;
+                        weightsC[std::size_t(x)] = color ? withBorder - inside : 0.0f;
                     }
+                    row.SetAll(weightsB.data(), weightsC.data(), count);
                     ioCanvas.MixWeights(y, color, row);
                 });
     }
