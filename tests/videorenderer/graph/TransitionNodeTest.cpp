@@ -99,11 +99,12 @@ TEST(TransitionNodeTest, FlagsAreTheNonEmptyInputsAndWith68)
 
 TEST(TransitionNodeTest, KeysCarryTheSettingsAndTheInstanceLeavesTheHashAlone)
 {
-    const auto wipe = Transition("TX.Wipe", {{"direction", "bottom"},
-                                             {"border", "2.5"},
-                                             {"borderColor", "#FF102030"},
-                                             {"start", "10"},
-                                             {"centre", "0.25,1"}});
+    const std::map<std::string, std::string> params = {{"direction", "bottom"},
+                                                       {"border", "2.5"},
+                                                       {"borderColor", "#FF102030"},
+                                                       {"start", "10"},
+                                                       {"centre", "0.25,1"}};
+    const auto wipe = Transition("TX.Wipe", params);
     const NodeRef node = Node(MakeLeaf("A"), -500, MakeLeaf("B"), 200, wipe);
     EXPECT_EQ(Property(node, "TransitionNode::TransitionMatchName"), "TX.Wipe");
     EXPECT_EQ(Property(node, "TransitionNode::TransitionDirection"), "3");
@@ -119,11 +120,7 @@ TEST(TransitionNodeTest, KeysCarryTheSettingsAndTheInstanceLeavesTheHashAlone)
               std::to_string(wipe->GetParameters().mInstanceNumber));
 
     // Another object of the same settings: another instance, the same hash.
-    const auto again = Transition("TX.Wipe", {{"direction", "bottom"},
-                                              {"border", "2.5"},
-                                              {"borderColor", "#FF102030"},
-                                              {"start", "10"},
-                                              {"centre", "0.25,1"}});
+    const auto again = Transition("TX.Wipe", params);
     EXPECT_NE(again->GetParameters().mInstanceNumber, wipe->GetParameters().mInstanceNumber);
     EXPECT_EQ(Node(MakeLeaf("A"), -500, MakeLeaf("B"), 200, again)->GetNodeHash(),
               node->GetNodeHash());
