@@ -10,6 +10,7 @@
 #include "ML/RenderFlags.h"
 #include "ML/VideoRenderer.h"
 #include "QRT/Allocated.h"
+#include "QRT/Exception.h"
 
 #include <string>
 #include <vector>
@@ -139,6 +140,84 @@ TEST_F(CutlistFactoryTest, SegmentsFallWhereTheSetOfActiveItemsChanges)
         SCOPED_TRACE(test.mName);
         EXPECT_EQ(Describe(Segments(SequenceCutlist(Sequence(test.mTracks), test.mRanges))),
                   test.mExpected);
+    }
+}
+
+// One track's segments as "start-end" and, for a transition, its inputs'
+// offsets in frames ("-" for nothing): "0-6 6-14:T(-6,4) 14-20".
+std::string DescribeTransitions(const CutlistRef& inCutlist)
+{
+    std::string text;
+    for (const Segment& segment : Segments(inCutlist))
+    {
+        text += (text.empty() ? "" : " ") + std::to_string(segment.mStart) + "-" +
+                std::to_string(segment.mEnd);
+        QRT::InterfaceRef<MF::IRenderableNode> root, layer;
+        TickTime offset;
+        inCutlist->GetNodeByHash(segment.mHash, root);
+        root->GetInput(0, offset, layer);
+        if (layer->GetNodeType().Compare(
+                QRT::ImmutableString::CreateStatic("RenderableNodeTransitionImpl")) != 0)
+            continue;
+        text += ":T(";
+        for (std::uint32_t i = 0; i < 2; ++i)
+        {
+            QRT::InterfaceRef<MF::IRenderableNode> input;
+            layer->GetInput(i, offset, input);
+            text += (i ? "," : "") + (input ? std::to_string(offset.ToFrame64(kRate)) : "-");
+        }
+        text += ")";
+    }
+    return text;
+}
+
+std::string Transition(int inStart, int inEnd, const std::string& inMatch = "TX.CrossDissolve")
+{
+    return R"(, "transitions": [{"match": ")" + inMatch + R"(", "start": ")" +
+           std::to_string(inStart) + R"(f", "end": ")" + std::to_string(inEnd) + R"(f"}])";
+}
+
+TEST_F(CutlistFactoryTest, TransitionsTakeTheirTrackOverTheirTime)
+{
+    struct Case
+    {
+        const char* mName;
+        std::string mItems;
+        const char* mExpected; // or the start of the error
+    };
+    const std::vector<Case> cases = {
+        {"on the outgoing item", Item(0, 10, Transition(6, 14)) + "," + Item(10, 20),
+         "0-6 6-14:T(-6,4) 14-20"},
+        {"on the incoming item", Item(0, 10) + "," + Item(10, 20, Transition(8, 12)),
+         "0-8 8-12:T(-8,2) 12-20"},
+        {"at the start of a lone clip", Item(5, 15, Transition(5, 9)), "5-9:T(-,0) 9-15"},
+        {"at the end, into the gap", Item(0, 10, Transition(7, 12)) + "," + Item(20, 30),
+         "0-7 7-12:T(-7,-) 20-30"},
+        {"over both ends of an item",
+         Item(0, 10, Transition(8, 12)) + "," + Item(10, 20, Transition(16, 24)) + "," +
+             Item(20, 30),
+         "0-8 8-12:T(-8,2) 12-16 16-24:T(-6,4) 24-30"},
+        {"unknown match", Item(0, 10, Transition(6, 10, "TX.Nope")),
+         "unknown transition match name \"TX.Nope\" on item 0 of track 0"},
+        {"inside the item", Item(0, 10, Transition(2, 6)),
+         "transition \"TX.CrossDissolve\" on item 0 of track 0 covers neither"},
+        {"beyond the incoming item", Item(0, 10, Transition(6, 25)) + "," + Item(10, 20),
+         "transition \"TX.CrossDissolve\" on item 0 of track 0 reaches beyond"},
+        {"two over one cut", Item(0, 10, Transition(8, 12)) + "," + Item(10, 20, Transition(9, 11)),
+         "transition \"TX.CrossDissolve\" on item 1 of track 0 overlaps"},
+    };
+    for (const Case& test : cases)
+    {
+        SCOPED_TRACE(test.mName);
+        const BE::SequenceRef sequence = Sequence(R"({"items": [)" + test.mItems + "]}");
+        try
+        {
+            EXPECT_EQ(DescribeTransitions(SequenceCutlist(sequence)), test.mExpected);
+        }
+        catch (const QRT::Exception& inError)
+        {
+            EXPECT_EQ(std::string(inError.what()).rfind(test.mExpected, 0), 0u) << inError.what();
+        }
     }
 }
 

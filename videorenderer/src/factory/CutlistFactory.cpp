@@ -9,12 +9,16 @@
 #include "ML/RenderableNodeCompositorImpl.h"
 #include "QRT/Allocated.h"
 #include "QRT/Exception.h"
+#include "TX/TransitionCatalogue.h"
 #include "factory/CutlistMerge.h"
 #include "factory/SegmentSweep.h"
+#include "factory/TransitionPlacement.h"
+#include "graph/RenderableNodeTransitionImpl.h"
 #include "graph/SequenceNodes.h"
 
 #include <algorithm>
 #include <map>
+#include <string>
 #include <utility>
 #include <vector>
 
@@ -69,6 +73,9 @@ struct TrackItems
     std::vector<QRT::InterfaceRef<BE::ITrackItem>> mItems;
     // The items' identifiers within their sequence ("MediaNode::ClipID").
     std::vector<std::int32_t> mClipIDs;
+    // What the sweep sees of the track: its items and transitions, in time
+    // order (one sweep item per piece).
+    std::vector<TrackPiece> mPieces;
 };
 
 // The work of one factory operation: the trees of one sequence and of the
@@ -90,15 +97,21 @@ public:
             TrackItems& items = tracks.emplace_back();
             items.mTrackIndex = track.GetTrackIndex();
             items.mMuted = track.GetTrackSettings().mMuted;
-            SweepTrack& swept = sweep.emplace_back();
+            std::vector<const BE::TrackItemSettings*> settings;
             for (std::size_t item = 0; item < track.GetItemCount(); ++item)
             {
                 auto ref = track.GetItem(item);
-                const BE::TrackItemSettings& settings = Require(ref).GetSettings();
-                swept.push_back({settings.mStart, settings.mEnd});
+                settings.push_back(&Require(ref).GetSettings());
                 items.mItems.push_back(std::move(ref));
                 items.mClipIDs.push_back(clipID++);
             }
+            TrackPlacement placement = PlaceTransitions(settings, items.mTrackIndex);
+            if (!placement.mError.empty())
+                throw QRT::Exception(placement.mError, QRT::kResult_NotFound);
+            items.mPieces = std::move(placement.mPieces);
+            SweepTrack& swept = sweep.emplace_back();
+            for (const TrackPiece& piece : items.mPieces)
+                swept.push_back(piece.mRange);
         }
 
         const QRT::InterfaceRef<IMutableCutlist> cutlist = CreateMutableCutlist(inName);
@@ -110,15 +123,15 @@ public:
             {
                 TickTime origin = kTime_Max;
                 for (const ActiveItem& active : segment.mActive)
-                    origin = std::min(origin, sweep[active.mTrack][active.mItem].mStart);
+                    origin = std::min(origin, tracks[active.mTrack].mPieces[active.mItem].mAnchor);
                 const QRT::InterfaceRef<RenderableNodeCompositorImpl> compositor =
                     RenderableNodeCompositorImpl::Create();
                 for (const ActiveItem& active : segment.mActive)
                 {
                     const TrackItems& track = tracks[active.mTrack];
-                    compositor->AddTrackInput(ClipSubtree(track, active.mItem, inContext),
-                                              sweep[active.mTrack][active.mItem].mStart - origin,
-                                              track.mTrackIndex);
+                    const TrackPiece& piece = track.mPieces[active.mItem];
+                    compositor->AddTrackInput(PieceSubtree(track, active.mItem, inContext),
+                                              piece.mAnchor - origin, track.mTrackIndex);
                 }
                 compositor->MakeImmutable();
                 cutlist->AddSegment(segment.mStart, segment.mEnd, segment.mStart - origin,
@@ -142,6 +155,43 @@ public:
             return empty;
         }
         return BuildTrackGroup(Require(sequence.GetTrackGroup(0)), context, inRanges, inName);
+    }
+
+    // The subtree of one piece of a track: the item's clip, or the
+    // transition over the clips it changes between.
+    NodeRef PieceSubtree(const TrackItems& inTrack, std::size_t inPiece,
+                         const BuildContext& inContext)
+    {
+        const TrackPiece& piece = inTrack.mPieces[inPiece];
+        if (!piece.IsTransition())
+            return ClipSubtree(inTrack, piece.mItem, inContext);
+        const auto found = mTransitions.find({&inTrack, inPiece});
+        if (found != mTransitions.end())
+            return found->second;
+        const BE::TrackItemSettings& carrier = inTrack.mItems[piece.mCarrier]->GetSettings();
+        const TX::TransitionCreation creation =
+            TX::CreateTransition(carrier.mTransitions[piece.mTransition]);
+        if (!creation.mTransition)
+            throw QRT::Exception(creation.mError + " on item " + std::to_string(piece.mCarrier) +
+                                     " of track " + std::to_string(inTrack.mTrackIndex),
+                                 QRT::kResult_NotFound);
+        TransitionNodeSetup setup;
+        setup.mTransition = creation.mTransition;
+        if (piece.mOutgoing != kNoItem)
+        {
+            setup.mOutgoing = ClipSubtree(inTrack, piece.mOutgoing, inContext);
+            setup.mOutgoingOffset =
+                inTrack.mItems[piece.mOutgoing]->GetSettings().mStart - piece.mAnchor;
+        }
+        if (piece.mIncoming != kNoItem)
+        {
+            setup.mIncoming = ClipSubtree(inTrack, piece.mIncoming, inContext);
+            setup.mIncomingOffset =
+                inTrack.mItems[piece.mIncoming]->GetSettings().mStart - piece.mAnchor;
+        }
+        NodeRef node = CreateTransitionNode(setup);
+        mTransitions.emplace(std::pair{&inTrack, inPiece}, node);
+        return node;
     }
 
     // The clip node of one item over its media node.
@@ -189,6 +239,7 @@ public:
 
 private:
     std::map<const BE::ITrackItem*, NodeRef> mClips;
+    std::map<std::pair<const TrackItems*, std::size_t>, NodeRef> mTransitions;
     std::map<const BE::ISequence*, CutlistRef> mNested;
 };
 

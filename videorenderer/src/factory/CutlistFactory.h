@@ -8,7 +8,9 @@
 // A sequence or track group becomes one segment per maximal interval over
 // which its set of active items does not change (factory/SegmentSweep.h).
 // Each segment's tree is a compositor over one clip subtree per active item,
-// bottom track first; each clip is a clip node over its media node. Nodes
+// bottom track first; each clip is a clip node over its media node. Where a
+// transition covers a cut (factory/TransitionPlacement.h), the track's layer
+// is a transition node over the outgoing and the incoming clip. Nodes
 // are sealed bottom-up, so every hash is computed once, and each item's
 // subtree is built once per call however many segments it spans. A tree's
 // time is sequence time less its origin, the earliest start among the
