@@ -16,7 +16,9 @@
 // budget on its own is refused before anything is rendered. The module must
 // be up (ML::VideoRenderer::Initialize) for the whole call.
 
+#include "BE/Sequence.h"
 #include "FrameWriters.h"
+#include "MF/RenderableCutlist.h"
 #include "MF/TimeTransform.h"
 #include "ML/IRenderableSource.h"
 #include "Options.h"
@@ -143,6 +145,11 @@ RenderOutcome RunRenderLoop(RenderInput inInput, const RenderPlan& inPlan,
 
 // `vrender source`: one media source with the filters of inOptions.
 RenderOutcome RunRender(const RenderOptions& inOptions, const RenderEnvironment& inEnvironment);
+
+// The cutlist the published factory builds of inSequence; empty, with
+// outError saying why, when it cannot be built. The module must be up.
+QRT::InterfaceRef<MF::IRenderableCutlist> BuildTimelineCutlist(const BE::SequenceRef& inSequence,
+                                                               std::string& outError);
 
 // `vrender render` and the demo: a timeline file, or the built-in demo
 // timeline, through the cutlist factory and the cutlist source.

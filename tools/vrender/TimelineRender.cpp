@@ -59,6 +59,29 @@ std::string ExplainTimelineFailure(const BE::ISequence& inSequence, mt::TickTime
 
 } // namespace
 
+QRT::InterfaceRef<MF::IRenderableCutlist> BuildTimelineCutlist(const BE::SequenceRef& inSequence,
+                                                               std::string& outError)
+{
+    const auto factory = MF::GetCutlistFactory();
+    QRT::InterfaceRef<MF::IRenderableCutlist> cutlist;
+    try
+    {
+        if (factory &&
+            QRT::Succeeded(factory->CreateSequenceCutlist(
+                inSequence, QRT::ImmutableString::CreateDynamic(inSequence->GetName()), cutlist)) &&
+            cutlist)
+            return cutlist;
+        outError = "the renderer could not build the sequence's cutlist";
+    }
+    catch (const std::exception& inException)
+    {
+        // What the timeline asks for and the renderer cannot build (a
+        // transition that does not fit its items, say).
+        outError = inException.what();
+    }
+    return {};
+}
+
 RenderOutcome RunTimelineRender(const RenderOptions& inOptions,
                                 const RenderEnvironment& inEnvironment)
 {
@@ -82,13 +105,11 @@ RenderOutcome RunTimelineRender(const RenderOptions& inOptions,
 
     const BE::SequenceRef& sequence = loaded.mMain;
     const std::string where = inOptions.mBuiltInTimeline ? kDemoTimelineName : inOptions.mMedia;
-    const auto factory = MF::GetCutlistFactory();
-    QRT::InterfaceRef<MF::IRenderableCutlist> cutlist;
     const QRT::ImmutableString name = QRT::ImmutableString::CreateDynamic(sequence->GetName());
-    if (!factory || QRT::Failed(factory->CreateSequenceCutlist(sequence, name, cutlist)) ||
-        !cutlist)
+    const auto cutlist = BuildTimelineCutlist(sequence, outcome.mError);
+    if (!cutlist)
     {
-        outcome.mError = where + ": the renderer could not build the sequence's cutlist";
+        outcome.mError = where + ": " + outcome.mError;
         return outcome;
     }
 

@@ -154,15 +154,13 @@ int RunTimelineInfo(const std::string& inPath)
     std::string text = vrender::DescribeSequence(loaded.mMain);
     {
         RendererSession session;
-        QRT::InterfaceRef<MF::IRenderableCutlist> cutlist;
-        const auto factory = MF::GetCutlistFactory();
-        if (!factory ||
-            QRT::Failed(factory->CreateSequenceCutlist(
-                loaded.mMain, QRT::ImmutableString::CreateDynamic(loaded.mMain->GetName()),
-                cutlist)) ||
-            !cutlist)
+        std::string error;
+        const auto cutlist = vrender::BuildTimelineCutlist(loaded.mMain, error);
+        if (!cutlist)
         {
-            std::fprintf(stderr, "vrender: the renderer could not build the sequence's cutlist\n");
+            std::fprintf(stderr, "vrender: %s: %s\n",
+                         inPath.empty() ? vrender::kDemoTimelineName : inPath.c_str(),
+                         error.c_str());
             return 1;
         }
         text += "\n" + vrender::DescribeCutlist(*cutlist);

@@ -129,6 +129,14 @@ TEST_F(EndToEndTest, ATimelineClipThatFailsToReadFailsItsFrameOnly)
     EXPECT_EQ(going.mErr,
               "vrender: " + reason + "; written black\nvrender: " + reason + " (written black)\n");
     EXPECT_EQ(NumberFrames(going.mOut), (std::vector<int>{1, 1, 0, 1, 2, 3, -1, 1}));
+
+    // What the renderer cannot build is the timeline's fault, said as such.
+    std::ofstream(timeline) << R"({"sequences": [{"name": "T", "tracks": [{"items": [{"end": 1,
+        "media": {"color": "#404040"}, "transitions": [{"match": "X", "start": 0, "end": 1}]}]}]}]})";
+    const auto refused = Run({"render", timeline, "-o", "-"});
+    EXPECT_EQ(refused.mExitCode, 1);
+    EXPECT_EQ(refused.mErr, "vrender: " + timeline +
+                                ": unknown transition match name \"X\" on item 0 of track 0\n");
 }
 
 TEST_F(EndToEndTest, AFrameLargerThanTheMemoryBudgetIsRefusedBeforeRendering)
