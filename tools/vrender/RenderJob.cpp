@@ -10,6 +10,7 @@
 #include "ML/RenderableVideoSources.h"
 #include "ML/VideoRenderer.h"
 #include "OrderingWindow.h"
+#include "PrefetchedRender.h"
 #include "Progress.h"
 #include "VF/FrameCachePriority.h"
 #include "VF/VideoFrame.h"
@@ -187,9 +188,10 @@ FrameRef MakeStandInFrame(const RenderPlan& inPlan)
     return frame;
 }
 
-// Runs on the encoder pool: finishes one delivered frame.
-FrameResult FinishFrame(SharedState& inState, std::int64_t inIndex, FrameRef inFrame,
-                        bool inCancelled, int inStatus)
+// Runs on the encoder pool once the frame's prefetches are done: renders the
+// frame (unless the request was cancelled or failed) and encodes it.
+FrameResult FinishFrame(SharedState& inState, std::int64_t inIndex,
+                        const ML::CutlistRenderParams& inParams, bool inCancelled, int inStatus)
 {
     FrameResult result;
     result.mEncoded.mIndex = inIndex;
@@ -202,11 +204,25 @@ FrameResult FinishFrame(SharedState& inState, std::int64_t inIndex, FrameRef inF
     try
     {
         std::string failure;
+        FrameRef inFrame;
         if (inStatus < 0)
             failure = "the render failed (status " + StatusText(inStatus) + ")";
-        else if (!inFrame)
+        else
+        {
+            try
+            {
+                // The parameters begin with their frame time: they are both.
+                inState.mSource->RenderFrame(inParams, inParams, inFrame);
+            }
+            catch (const ML::RenderRequestException&)
+            {
+                // A render that cannot be done comes without a frame.
+                inFrame.Reset();
+            }
             // Success without a frame: the source could not render this time.
-            failure = inState.mExplainFailure(inIndex);
+            if (!inFrame)
+                failure = inState.mExplainFailure(inIndex);
+        }
         if (!failure.empty())
         {
             if (!inState.mKeepGoing || !(inFrame = MakeStandInFrame(inState.mPlan)))
@@ -239,6 +255,10 @@ FrameResult FinishFrame(SharedState& inState, std::int64_t inIndex, FrameRef inF
     catch (const std::exception& inException)
     {
         result.mError = name + ": " + inException.what();
+    }
+    catch (...)
+    {
+        result.mError = name + ": the render failed";
     }
     return result;
 }
@@ -452,21 +472,13 @@ private:
         const unsigned int requestID = ML::GetNextRequestID();
         mInFlight.emplace(inIndex, requestID);
         std::shared_ptr<SharedState> state = mState;
-        // The module's delivering thread only hands the frame on: the pixel
-        // work runs on the encoder pool so that deliveries are never held up.
-        // The callback holds the pool, not the shared state, so that the pool
-        // is never released on one of its own threads.
-        ML::InitiateRender(
-            mState->mSource, conformed, params, requestID,
-            [state, encoders = mEncoders, inIndex](FrameRef inFrame, unsigned int, SourceRef,
-                                                   bool inCancelled, int inStatus)
-            {
-                auto task = [state, inIndex, inFrame, inCancelled, inStatus] {
-                    state->mWindow.Deliver(
-                        inIndex, FinishFrame(*state, inIndex, inFrame, inCancelled, inStatus));
-                };
-                if (!encoders->Post(task))
-                    task();
+        // The render and the pixel work run on the encoder pool, in
+        // parallel, not on the module's single delivering thread.
+        InitiatePrefetchedRender(
+            mState->mSource, conformed, params, requestID, mEncoders,
+            [state, inIndex, params](bool inCancelled, int inStatus) {
+                state->mWindow.Deliver(inIndex,
+                                       FinishFrame(*state, inIndex, params, inCancelled, inStatus));
             });
     }
 
@@ -683,6 +695,12 @@ RenderOutcome RunRenderLoop(RenderInput inInput, const RenderPlan& inPlan,
 {
     RenderOutcome outcome;
     outcome.mExitCode = 1;
+    // Without a source no request would ever be answered.
+    if (!inInput.mSource)
+    {
+        outcome.mError = "the renderer has no source to render";
+        return outcome;
+    }
     std::unique_ptr<FrameWriter> writer = CreateWriter(inOptions, inEnvironment);
     if (!writer->Begin(inPlan.mStream, outcome.mError))
         return outcome;
