@@ -6,119 +6,91 @@
 #include "Waiting.h"
 #include "mvxcore/threads/ExecutorFactories.h"
 
-#include <mutex>
+#include <atomic>
 #include <thread>
-#include <vector>
 
 #include <gtest/gtest.h>
 
 namespace
 {
 
-using vrtest::TestPrefetch;
-using vrtest::TestSource;
-
-// What the task saw when it ran.
-struct TaskRun
-{
-    std::thread::id mThread;
-    bool mCancelled = false;
-    int mStatus = -1;
-    bool mPrefetchComplete = false;
-    // The handle was still alive although only the request had held it.
-    bool mHandleAlive = false;
-};
-
 // A prefetch handle that says when it is destroyed.
-class TrackedPrefetch : public TestPrefetch
+class TrackedPrefetch : public vrtest::TestPrefetch
 {
 public:
     std::atomic<bool>* mDestroyed = nullptr;
     ~TrackedPrefetch() { *mDestroyed = true; }
 };
 
-struct Case
+TEST(PrefetchedRenderTest, TaskRunsOnceOnTheExecutorWithThePrefetchStillHeld)
 {
-    const char* mName;
-    bool mCancel;
-    // The executor refuses tasks (shut down): the task runs where the queue delivered.
-    bool mRefused;
-};
-
-TEST(PrefetchedRenderTest, TaskRunsOnceOnTheExecutorWithThePrefetchHeld)
-{
-    const Case cases[] = {
-        {"completed", false, false}, {"cancelled", true, false}, {"refused", false, true}};
+    // {cancelled, the executor refuses tasks (the task then runs where the queue delivered)}
+    const bool cases[][2] = {{false, false}, {true, false}, {false, true}};
     ML::VideoRenderer::Initialize();
-    for (const Case& test : cases)
+    for (const auto& [cancel, refused] : cases)
     {
-        SCOPED_TRACE(test.mName);
+        SCOPED_TRACE(::testing::Message() << cancel << refused);
         const auto executor = mvxcore::threads::CreateThreadPoolExecutor(1);
-        // The pool's one thread waits at the gate until the queue has
-        // delivered and dropped its request.
+        // The pool's thread waits at the gate until the queue is done with the request.
         vrtest::Gate gate;
         std::thread::id poolThread;
-        ASSERT_TRUE(executor->Post(
-            [&]
-            {
-                poolThread = std::this_thread::get_id();
-                gate.Wait();
-            }));
-        if (test.mRefused)
+        ASSERT_TRUE(executor->Post([&] { poolThread = std::this_thread::get_id(), gate.Wait(); }));
+        if (refused)
         {
             gate.Open();
             executor->BeginShutdown();
             executor->WaitForRunningTasks();
         }
 
-        auto source = QRT::Allocated<TestSource>::CreateInstance();
         std::atomic<bool> destroyed{false};
         auto prefetch = QRT::Allocated<TrackedPrefetch>::CreateInstance();
         prefetch->mDestroyed = &destroyed;
+        auto source = QRT::Allocated<vrtest::TestSource>::CreateInstance();
         source->mPrefetch = prefetch;
         TrackedPrefetch* const handle = prefetch.Get();
-        std::mutex mutex;
-        std::vector<TaskRun> runs;
+        // Written by the task, read once it has run: runs, thread, cancelled, status, complete.
+        std::atomic<int> runs{0};
+        std::thread::id thread;
+        int seen[3] = {-1, -1, -1};
         ML::CutlistRenderParams params;
         params.mWidth = params.mHeight = 8;
         const unsigned int id = ML::GetNextRequestID();
         vrender::InitiatePrefetchedRender(source, MF::FrameTime(), params, id, executor,
                                           [&](bool inCancelled, int inStatus)
                                           {
+                                              // Only the request held the handle.
                                               const bool alive = !destroyed.load();
-                                              std::lock_guard lock(mutex);
-                                              runs.push_back(
-                                                  {std::this_thread::get_id(), inCancelled,
-                                                   inStatus, alive && handle->IsComplete(), alive});
+                                              thread = std::this_thread::get_id();
+                                              seen[0] = inCancelled;
+                                              seen[1] = inStatus;
+                                              seen[2] = alive && handle->IsComplete();
+                                              ++runs;
                                           });
-        // From here on only the request holds the handle.
         source->mPrefetch.Reset();
-        if (test.mCancel)
-            ML::CancelRender(id);
-        else
-            prefetch->Complete(vrtest::MakeFrame(8, 8));
+        cancel ? ML::CancelRender(id) : prefetch->Complete(vrtest::MakeFrame(8, 8));
         prefetch.Reset();
         ASSERT_TRUE(vrtest::WaitUntil(
-            [] { return ML::RenderFrameQueue::Create()->GetStatistics().mPrefetchWaiting == 0; }));
-        gate.Open();
-        ASSERT_TRUE(vrtest::WaitUntil(
-            [&]
+            []
             {
-                std::lock_guard lock(mutex);
-                return !runs.empty();
+                const auto queued = ML::RenderFrameQueue::Create()->GetStatistics();
+                return queued.mIncoming + queued.mPending + queued.mPrefetchWaiting == 0;
             }));
+        // The queue takes up a later request only once it is done with this one.
+        std::atomic<bool> fenced{false};
+        ML::InitiateRender(QRT::Allocated<vrtest::TestSource>::CreateInstance(), MF::FrameTime(),
+                           params, ML::GetNextRequestID(), [&](auto&&...) { fenced = true; });
+        ASSERT_TRUE(vrtest::WaitUntil([&] { return fenced.load(); }));
+        gate.Open();
+        ASSERT_TRUE(vrtest::WaitUntil([&] { return runs.load() > 0; }));
         executor->BeginShutdown();
         executor->WaitForRunningTasks();
-        std::lock_guard lock(mutex);
-        ASSERT_EQ(runs.size(), 1u);
-        EXPECT_EQ(runs[0].mThread == poolThread, !test.mRefused);
-        EXPECT_EQ(runs[0].mCancelled, test.mCancel);
-        EXPECT_EQ(runs[0].mStatus, 0);
-        EXPECT_EQ(runs[0].mPrefetchComplete, !test.mCancel);
-        EXPECT_TRUE(runs[0].mHandleAlive);
-        // The task renders; the helper does not.
+        EXPECT_EQ(runs.load(), 1);
+        EXPECT_EQ(thread == poolThread, !refused);
+        EXPECT_EQ(seen[0], cancel);
+        EXPECT_EQ(seen[1], 0);
+        EXPECT_EQ(seen[2], !cancel) << "the prefetch was not complete, or no longer held";
+        // The task renders, not the helper; the handle goes once the task has run.
         EXPECT_EQ(source->mRenderCount.load(), 0);
-        // Released once the task has run.
         EXPECT_TRUE(vrtest::WaitUntil([&] { return destroyed.load(); }));
     }
     ML::VideoRenderer::Shutdown();
