@@ -9,14 +9,16 @@
 // another however many cores there are, and hold up the queue's own
 // scheduling meanwhile.
 //
-// The request is withdrawn with ML::CancelRender(inRequestID). inTask is
+// The request is withdrawn with ML::CancelRender(inRequestID). inDone is
 // called exactly once, on a thread of inExecutor (on the delivering thread
-// when the executor refuses tasks), with the cancelled flag and status of the
-// queue's answer; it renders the frame itself (IRenderableSource::RenderFrame)
-// unless the request was cancelled or failed, so that it can report the
-// render's exceptions as it reports its own. The prefetch handles, and the
-// frames they hold in the cache and in the source, stay alive until inTask
-// has returned.
+// when the executor refuses tasks), with the frame, the cancelled flag and the
+// status of the queue's answer, and the exception the render threw, if any.
+// The frame is empty when the request was cancelled or failed (the source is
+// then not rendered), when the source threw ML::RenderRequestException (a
+// render that cannot be done) or another exception, or when it rendered
+// nothing. The prefetch handles, and with them the frames they hold in the
+// cache and in the source, are kept until the render has returned and are
+// let go before inDone is called.
 
 #include "MF/FrameTime.h"
 #include "ML/CutlistRenderParams.h"
@@ -24,6 +26,7 @@
 #include "QRT/InterfaceRef.h"
 #include "mvxcore/threads/AsyncThreadedExecutor.h"
 
+#include <exception>
 #include <functional>
 
 #include <boost/shared_ptr.hpp>
@@ -31,12 +34,14 @@
 namespace vrender
 {
 
-using PrefetchedRenderTask = std::function<void(bool inCancelled, int inStatus)>;
+using PrefetchedRenderDone =
+    std::function<void(QRT::InterfaceRef<MF::IVideoFrame> inFrame, bool inCancelled, int inStatus,
+                       std::exception_ptr inFailure)>;
 
 void InitiatePrefetchedRender(const QRT::InterfaceRef<ML::IRenderableSource>& inSource,
                               const MF::FrameTime& inFrameTime,
                               const ML::CutlistRenderParams& inParams, unsigned int inRequestID,
                               boost::shared_ptr<mvxcore::threads::AsyncThreadedExecutor> inExecutor,
-                              PrefetchedRenderTask inTask);
+                              PrefetchedRenderDone inDone);
 
 } // namespace vrender

@@ -21,6 +21,7 @@
 #include <chrono>
 #include <cinttypes>
 #include <cmath>
+#include <exception>
 #include <functional>
 #include <map>
 #include <memory>
@@ -188,10 +189,31 @@ FrameRef MakeStandInFrame(const RenderPlan& inPlan)
     return frame;
 }
 
-// Runs on the encoder pool once the frame's prefetches are done: renders the
-// frame (unless the request was cancelled or failed) and encodes it.
-FrameResult FinishFrame(SharedState& inState, std::int64_t inIndex,
-                        const ML::CutlistRenderParams& inParams, bool inCancelled, int inStatus)
+// Why a render threw, for the frame's message.
+std::string DescribeRenderFailure(const std::exception_ptr& inFailure)
+{
+    try
+    {
+        std::rethrow_exception(inFailure);
+    }
+    catch (const std::bad_alloc&)
+    {
+        return "out of memory (lower --jobs or --memory)";
+    }
+    catch (const std::exception& inException)
+    {
+        return std::string("the render failed: ") + inException.what();
+    }
+    catch (...)
+    {
+        return "the render failed";
+    }
+}
+
+// Runs on the encoder pool: finishes one rendered frame. inFailure is what
+// the render threw, if anything.
+FrameResult FinishFrame(SharedState& inState, std::int64_t inIndex, FrameRef inFrame,
+                        bool inCancelled, int inStatus, std::exception_ptr inFailure)
 {
     FrameResult result;
     result.mEncoded.mIndex = inIndex;
@@ -204,25 +226,13 @@ FrameResult FinishFrame(SharedState& inState, std::int64_t inIndex,
     try
     {
         std::string failure;
-        FrameRef inFrame;
-        if (inStatus < 0)
+        if (inFailure)
+            failure = DescribeRenderFailure(inFailure);
+        else if (inStatus < 0)
             failure = "the render failed (status " + StatusText(inStatus) + ")";
-        else
-        {
-            try
-            {
-                // The parameters begin with their frame time: they are both.
-                inState.mSource->RenderFrame(inParams, inParams, inFrame);
-            }
-            catch (const ML::RenderRequestException&)
-            {
-                // A render that cannot be done comes without a frame.
-                inFrame.Reset();
-            }
+        else if (!inFrame)
             // Success without a frame: the source could not render this time.
-            if (!inFrame)
-                failure = inState.mExplainFailure(inIndex);
-        }
+            failure = inState.mExplainFailure(inIndex);
         if (!failure.empty())
         {
             if (!inState.mKeepGoing || !(inFrame = MakeStandInFrame(inState.mPlan)))
@@ -255,10 +265,6 @@ FrameResult FinishFrame(SharedState& inState, std::int64_t inIndex,
     catch (const std::exception& inException)
     {
         result.mError = name + ": " + inException.what();
-    }
-    catch (...)
-    {
-        result.mError = name + ": the render failed";
     }
     return result;
 }
@@ -474,12 +480,14 @@ private:
         std::shared_ptr<SharedState> state = mState;
         // The render and the pixel work run on the encoder pool, in
         // parallel, not on the module's single delivering thread.
-        InitiatePrefetchedRender(
-            mState->mSource, conformed, params, requestID, mEncoders,
-            [state, inIndex, params](bool inCancelled, int inStatus) {
-                state->mWindow.Deliver(inIndex,
-                                       FinishFrame(*state, inIndex, params, inCancelled, inStatus));
-            });
+        InitiatePrefetchedRender(mState->mSource, conformed, params, requestID, mEncoders,
+                                 [state, inIndex](FrameRef inFrame, bool inCancelled, int inStatus,
+                                                  std::exception_ptr inFailure)
+                                 {
+                                     state->mWindow.Deliver(
+                                         inIndex, FinishFrame(*state, inIndex, std::move(inFrame),
+                                                              inCancelled, inStatus, inFailure));
+                                 });
     }
 
     void Take(FrameResult& ioResult)
