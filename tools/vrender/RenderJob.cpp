@@ -10,6 +10,7 @@
 #include "ML/RenderableVideoSources.h"
 #include "ML/VideoRenderer.h"
 #include "OrderingWindow.h"
+#include "PrefetchedRender.h"
 #include "Progress.h"
 #include "VF/FrameCachePriority.h"
 #include "VF/VideoFrame.h"
@@ -20,6 +21,7 @@
 #include <chrono>
 #include <cinttypes>
 #include <cmath>
+#include <exception>
 #include <functional>
 #include <map>
 #include <memory>
@@ -187,9 +189,31 @@ FrameRef MakeStandInFrame(const RenderPlan& inPlan)
     return frame;
 }
 
-// Runs on the encoder pool: finishes one delivered frame.
+// Why a render threw, for the frame's message.
+std::string DescribeRenderFailure(const std::exception_ptr& inFailure)
+{
+    try
+    {
+        std::rethrow_exception(inFailure);
+    }
+    catch (const std::bad_alloc&)
+    {
+        return "out of memory (lower --jobs or --memory)";
+    }
+    catch (const std::exception& inException)
+    {
+        return std::string("the render failed: ") + inException.what();
+    }
+    catch (...)
+    {
+        return "the render failed";
+    }
+}
+
+// Runs on the encoder pool: finishes one rendered frame. inFailure is what
+// the render threw, if anything.
 FrameResult FinishFrame(SharedState& inState, std::int64_t inIndex, FrameRef inFrame,
-                        bool inCancelled, int inStatus)
+                        bool inCancelled, int inStatus, std::exception_ptr inFailure)
 {
     FrameResult result;
     result.mEncoded.mIndex = inIndex;
@@ -202,7 +226,9 @@ FrameResult FinishFrame(SharedState& inState, std::int64_t inIndex, FrameRef inF
     try
     {
         std::string failure;
-        if (inStatus < 0)
+        if (inFailure)
+            failure = DescribeRenderFailure(inFailure);
+        else if (inStatus < 0)
             failure = "the render failed (status " + StatusText(inStatus) + ")";
         else if (!inFrame)
             // Success without a frame: the source could not render this time.
@@ -452,22 +478,16 @@ private:
         const unsigned int requestID = ML::GetNextRequestID();
         mInFlight.emplace(inIndex, requestID);
         std::shared_ptr<SharedState> state = mState;
-        // The module's delivering thread only hands the frame on: the pixel
-        // work runs on the encoder pool so that deliveries are never held up.
-        // The callback holds the pool, not the shared state, so that the pool
-        // is never released on one of its own threads.
-        ML::InitiateRender(
-            mState->mSource, conformed, params, requestID,
-            [state, encoders = mEncoders, inIndex](FrameRef inFrame, unsigned int, SourceRef,
-                                                   bool inCancelled, int inStatus)
-            {
-                auto task = [state, inIndex, inFrame, inCancelled, inStatus] {
-                    state->mWindow.Deliver(
-                        inIndex, FinishFrame(*state, inIndex, inFrame, inCancelled, inStatus));
-                };
-                if (!encoders->Post(task))
-                    task();
-            });
+        // The render and the pixel work run on the encoder pool, in
+        // parallel, not on the module's single delivering thread.
+        InitiatePrefetchedRender(mState->mSource, conformed, params, requestID, mEncoders,
+                                 [state, inIndex](FrameRef inFrame, bool inCancelled, int inStatus,
+                                                  std::exception_ptr inFailure)
+                                 {
+                                     state->mWindow.Deliver(
+                                         inIndex, FinishFrame(*state, inIndex, std::move(inFrame),
+                                                              inCancelled, inStatus, inFailure));
+                                 });
     }
 
     void Take(FrameResult& ioResult)
@@ -683,6 +703,12 @@ RenderOutcome RunRenderLoop(RenderInput inInput, const RenderPlan& inPlan,
 {
     RenderOutcome outcome;
     outcome.mExitCode = 1;
+    // Without a source no request would ever be answered.
+    if (!inInput.mSource)
+    {
+        outcome.mError = "the renderer has no source to render";
+        return outcome;
+    }
     std::unique_ptr<FrameWriter> writer = CreateWriter(inOptions, inEnvironment);
     if (!writer->Begin(inPlan.mStream, outcome.mError))
         return outcome;

@@ -1,13 +1,14 @@
 #pragma once
 
 // vrender's render loop: renders a range of frames of one media source
-// through ML::InitiateRender and writes them in order.
+// through the module's render queue and writes them in order.
 //
 // The loop runs on the caller's thread. It keeps up to `jobs` frames in
-// flight: each is conformed (IRenderableSource::ConformFrameTime) and handed
-// to ML::InitiateRender; the module calls back on its delivering thread,
-// which only posts the frame to vrender's encoder pool (format conversion,
-// PNG compression or Y'CbCr packing run there, in parallel); finished frames
+// flight: each is conformed (IRenderableSource::ConformFrameTime) and its
+// prefetches are queued (InitiatePrefetchedRender); when they are done the
+// module's delivering thread only posts the frame to vrender's encoder pool,
+// where the source renders it and format conversion, PNG compression or
+// Y'CbCr packing run, in parallel; finished frames
 // go through an OrderingWindow back into frame order and are committed by
 // the loop. A cancel request (Ctrl-C) or a failed frame cancels everything
 // in flight with ML::CancelRender, waits until every request has ended and
