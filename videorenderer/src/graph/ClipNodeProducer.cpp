@@ -162,11 +162,14 @@ private:
             mSetup.mInput->GetFrameHash(inputHash, MapClipTime(mSetup, inTime), inParams);
             QRT::MixHash::MixInGuid(hash, inputHash);
         }
-        const MF::FrameTime mapped = MapThroughTransform(mSetup, inTime);
+        // Effects are keyed in the clip's time and render at it (ApplyOperator's
+        // output time), so their hashes take that time, not the input's: a
+        // frame hold or a re-timing maps many clip times to one input time
+        // while an animated effect still changes.
         for (const QRT::InterfaceRef<IRenderableNodeOperator>& effect : mSetup.mOperators)
         {
             QRT::Guid operatorHash;
-            effect->GetOperatorHash(operatorHash, mapped, inParams);
+            effect->GetOperatorHash(operatorHash, inTime, inParams);
             QRT::MixHash::MixInGuid(hash, operatorHash);
         }
         return QRT::HashValueToGuid(hash);
