@@ -7,29 +7,12 @@
 #include "VF/VideoFrameManipulators.h"
 #include "mvxcore/debug/Contract.h"
 
-#include <algorithm>
 #include <sstream>
 
 namespace FX
 {
 namespace
 {
-
-double Interpolate(const std::vector<mvxmediatypes::TickTime>& inTimes,
-                   const std::vector<double>& inValues, mvxmediatypes::TickTime inTime)
-{
-    if (inValues.empty())
-        return 0.0;
-    if (inValues.size() == 1 || inTime <= inTimes.front())
-        return inValues.front();
-    if (inTime >= inTimes.back())
-        return inValues.back();
-    const auto next = std::upper_bound(inTimes.begin(), inTimes.end(), inTime);
-    const std::size_t i = static_cast<std::size_t>(next - inTimes.begin());
-    const double span = static_cast<double>((inTimes[i] - inTimes[i - 1]).GetTicks());
-    const double t = static_cast<double>((inTime - inTimes[i - 1]).GetTicks()) / span;
-    return inValues[i - 1] + (inValues[i] - inValues[i - 1]) * t;
-}
 
 } // namespace
 
@@ -39,30 +22,29 @@ bool EffectParam::IsTimeVariant() const
            mType == ParamType::kChoice || mType == ParamType::kLayer;
 }
 
-double EffectParam::ValueAt(mvxmediatypes::TickTime inTime) const
-{
-    return Interpolate(mTimes, mX, inTime);
-}
-
-double EffectParam::YAt(mvxmediatypes::TickTime inTime) const
-{
-    return Interpolate(mTimes, mY, inTime);
-}
-
 std::string EffectParam::GetText() const
 {
     std::ostringstream text;
     text.precision(17);
-    text << mName << '=';
-    for (std::size_t i = 0; i < mX.size(); ++i)
+    const bool point = mCurve.GetDimension() == 2;
+    auto put = [&](MF::KeyframePoint inValue)
     {
-        if (i > 0)
-            text << ';';
-        if (!IsConstant())
-            text << mTimes[i].GetTicks() << ':';
-        text << mX[i];
-        if (mType == ParamType::kPoint)
-            text << ',' << mY[i];
+        text << inValue.mX;
+        if (point)
+            text << ',' << inValue.mY;
+    };
+    text << mName << '=';
+    if (mCurve.GetKeys().empty())
+        put(mCurve.GetDefault());
+    for (std::size_t i = 0; i < mCurve.GetKeys().size(); ++i)
+    {
+        const BE::CurveKey& key = mCurve.GetKeys()[i];
+        text << (i > 0 ? ";" : "") << key.mTime.GetTicks() << ':';
+        put(key.mValue);
+        text << ':' << static_cast<int>(key.mInterpolation) << ':';
+        put(key.mInSlope);
+        text << ':';
+        put(key.mOutSlope);
     }
     return text.str();
 }

@@ -126,37 +126,40 @@ public:
     {
         outParam.mName = std::string(inSpec.mName);
         outParam.mType = inSpec.mType;
+        const bool point = inSpec.mType == ParamType::kPoint;
+        const int dimension = point ? 2 : 1;
         const std::string name(inSpec.mName);
         const auto text = mSettings.mParams.find(name);
         const auto curve = mSettings.mKeyframedParams.find(name);
+        auto constant = [&](double inX, double inY)
+        {
+            outParam.mCurve = BE::KeyframeCurve(dimension, Clamped(inSpec, {inX, inY}));
+            return true;
+        };
         if (text != mSettings.mParams.end())
         {
             const std::optional<double> value = ParseText(inSpec, text->second);
             if (!value)
                 return Refuse(Quoted(name) + ": expected " + ExpectedText(inSpec) + ", got " +
                               Quoted(text->second));
-            Push(outParam, inSpec, mvxmediatypes::kTime_Zero, *value, inSpec.mDefaultY);
-            return true;
+            return constant(*value, inSpec.mDefaultY);
         }
         if (curve == mSettings.mKeyframedParams.end())
-        {
-            Push(outParam, inSpec, mvxmediatypes::kTime_Zero, inSpec.mDefault, inSpec.mDefaultY);
-            return true;
-        }
-        const bool keyed = inSpec.mType == ParamType::kNumber || inSpec.mType == ParamType::kPoint;
+            return constant(inSpec.mDefault, inSpec.mDefaultY);
+        const bool keyed = inSpec.mType == ParamType::kNumber || point;
         if (!keyed && inSpec.mType != ParamType::kBool && inSpec.mType != ParamType::kLayer)
             return Refuse(Quoted(name) + ": expected " + ExpectedText(inSpec) + " as text");
-        if ((curve->second.GetDimension() == 2) != (inSpec.mType == ParamType::kPoint))
-            return Refuse(Quoted(name) + ": expected " +
-                          (inSpec.mType == ParamType::kPoint ? "a point" : "a number"));
+        if (curve->second.GetDimension() != dimension)
+            return Refuse(Quoted(name) + ": expected " + (point ? "a point" : "a number"));
         if (curve->second.GetKeys().empty() || !keyed)
         {
             const MF::KeyframePoint value = curve->second.ValueAt(mvxmediatypes::kTime_Zero);
-            Push(outParam, inSpec, mvxmediatypes::kTime_Zero, value.mX, value.mY);
-            return true;
+            return constant(value.mX, value.mY);
         }
-        for (const BE::CurveKey& key : curve->second.GetKeys())
-            Push(outParam, inSpec, key.mTime, key.mValue.mX, key.mValue.mY);
+        std::vector<BE::CurveKey> keys = curve->second.GetKeys();
+        for (BE::CurveKey& key : keys)
+            key.mValue = Clamped(inSpec, key.mValue);
+        outParam.mCurve = BE::KeyframeCurve(dimension, keys.front().mValue, std::move(keys));
         return true;
     }
 
@@ -188,7 +191,8 @@ private:
         const bool ranged = inSpec.mType == ParamType::kNumber || inSpec.mType == ParamType::kPoint;
         if (!ranged || (inValue >= inSpec.mMin && inValue <= inSpec.mMax))
             return inValue;
-        const double clamped = inValue < inSpec.mMin ? inSpec.mMin : inSpec.mMax;
+        // Not a number counts as below the range.
+        const double clamped = inValue > inSpec.mMax ? inSpec.mMax : inSpec.mMin;
         mMade.mWarnings.push_back(Quoted(mSettings.mMatchName) + " parameter " +
                                   Quoted(inSpec.mName) + ": " + Number(inValue) + " is outside " +
                                   Number(inSpec.mMin) + ".." + Number(inSpec.mMax) +
@@ -196,12 +200,10 @@ private:
         return clamped;
     }
 
-    void Push(EffectParam& ioParam, const ParamSpec& inSpec, mvxmediatypes::TickTime inTime,
-              double inX, double inY)
+    MF::KeyframePoint Clamped(const ParamSpec& inSpec, MF::KeyframePoint inValue)
     {
-        ioParam.mTimes.push_back(inTime);
-        ioParam.mX.push_back(Clamped(inSpec, inX));
-        ioParam.mY.push_back(inSpec.mType == ParamType::kPoint ? Clamped(inSpec, inY) : 0.0);
+        const bool point = inSpec.mType == ParamType::kPoint;
+        return {Clamped(inSpec, inValue.mX), point ? Clamped(inSpec, inValue.mY) : 0.0};
     }
 
     bool Refuse(const std::string& inProblem)

@@ -17,6 +17,7 @@
 // BGRA frames of 8-bit or float components with straight alpha; other
 // formats go through a float staging frame.
 
+#include "BE/Keyframes.h"
 #include "MF/BinaryData.h"
 #include "MF/IVideoFrame.h"
 #include "QRT/InterfaceRef.h"
@@ -50,28 +51,26 @@ enum class ParamType : std::uint32_t
 // Value of a kLayer parameter that reads no layer.
 inline constexpr double kNoLayer = 4294967295.0;
 
-// One parameter: its name and type, and its value as keys in the item's
-// time. Numbers, points and choices are keyed; colours and flags are
-// constant. A value type, immutable once made.
+// One parameter: its name and type, and its value as a curve in the item's
+// time (keys with their interpolations, or one constant value). Colours
+// (0xAARRGGBB as a number) and flags are constant. A value type, immutable
+// once made.
 struct EffectParam
 {
     std::string mName;
     ParamType mType = ParamType::kNumber;
-    // Key times (item time) and values (mY only for points); one key for a
-    // constant. Colours are 0xAARRGGBB as a number.
-    std::vector<mvxmediatypes::TickTime> mTimes;
-    std::vector<double> mX;
-    std::vector<double> mY;
+    BE::KeyframeCurve mCurve;
 
     // The parameter may change with time (numbers, points, choices, layers).
     bool IsTimeVariant() const;
     // It holds one value throughout.
-    bool IsConstant() const { return mX.size() <= 1; }
-    // The value at inTime, linear between keys, held outside them.
-    double ValueAt(mvxmediatypes::TickTime inTime) const;
-    double YAt(mvxmediatypes::TickTime inTime) const;
-    // "name=value" or "name=t:v;t:v" (ticks), points as "x,y": the text the
-    // renderer hashes. Equal texts mean equal parameters.
+    bool IsConstant() const { return mCurve.GetKeys().size() <= 1; }
+    // The value at inTime (a point's x), and a point's y.
+    double ValueAt(mvxmediatypes::TickTime inTime) const { return mCurve.ValueAt(inTime).mX; }
+    double YAt(mvxmediatypes::TickTime inTime) const { return mCurve.ValueAt(inTime).mY; }
+    // "name=value", or "name=" and one "ticks:value:interpolation:inSlope:outSlope"
+    // per key separated by ";", points as "x,y": the text the renderer hashes.
+    // Equal texts mean equal parameters.
     std::string GetText() const;
 };
 
