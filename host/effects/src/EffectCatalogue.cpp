@@ -159,7 +159,8 @@ public:
         std::vector<BE::CurveKey> keys = curve->second.GetKeys();
         for (BE::CurveKey& key : keys)
             key.mValue = Clamped(inSpec, key.mValue);
-        outParam.mCurve = BE::KeyframeCurve(dimension, keys.front().mValue, std::move(keys));
+        const MF::KeyframePoint first = keys.front().mValue;
+        outParam.mCurve = BE::KeyframeCurve(dimension, first, std::move(keys));
         return true;
     }
 
