@@ -196,6 +196,8 @@ void AddColorEffects(std::vector<EffectEntry>& ioEntries);
 void AddKeyEffects(std::vector<EffectEntry>& ioEntries);
 void AddGeometryEffects(std::vector<EffectEntry>& ioEntries);
 void AddBlurEffects(std::vector<EffectEntry>& ioEntries);
+void AddOverlayEffects(std::vector<EffectEntry>& ioEntries);
+void AddPinEffects(std::vector<EffectEntry>& ioEntries);
 
 } // namespace FX::detail
 

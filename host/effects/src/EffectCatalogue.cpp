@@ -25,6 +25,8 @@ const std::vector<EffectEntry>& Entries()
         detail::AddKeyEffects(entries);
         detail::AddGeometryEffects(entries);
         detail::AddBlurEffects(entries);
+        detail::AddPinEffects(entries);
+        detail::AddOverlayEffects(entries);
         return entries;
     }();
     return sEntries;

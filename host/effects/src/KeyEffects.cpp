@@ -8,6 +8,7 @@
 
 #include "EffectBase.h"
 #include "FX/EffectCatalogue.h"
+#include "IR/ImageRenderer.h"
 
 #include <algorithm>
 #include <cmath>
@@ -180,6 +181,33 @@ public:
     }
 };
 
+constexpr std::string_view kMattes[] = {"black", "white"};
+
+constexpr ParamSpec kRemoveMatteParams[] = {
+    {"matte", ParamType::kChoice, 0.0, 0.0, 1.0, 0.0, kMattes},
+};
+
+// Remove Matte: colour that was premultiplied over black or white is taken
+// back to straight colour, c = (p - (1 - a) * matte) / a, so that keyed
+// edges lose the fringe of the matte.
+class RemoveMatteEffect : public EffectBase
+{
+public:
+    using EffectBase::EffectBase;
+
+protected:
+    QRT::Result RenderInPlace(const RenderContext& inContext, const Pixels& inPixels) override
+    {
+        const std::uint32_t matte = Value(0, inContext) == 0.0 ? 0xFF000000u : 0xFFFFFFFFu;
+        const IR_PixelFormat format =
+            inPixels.mFloat ? kIR_PixelFormat_BGRA_32f : kIR_PixelFormat_BGRA_8u;
+        return IR_UnPremultiplyAgainstMatteColor(
+            inPixels.mBase, inPixels.mRowBytes, inPixels.mBase, inPixels.mRowBytes, format,
+            inPixels.mWidth, inPixels.mHeight, matte, kIR_FormatBit_StraightAlpha,
+            static_cast<std::int32_t>(inContext.mQuality));
+    }
+};
+
 } // namespace
 
 void AddKeyEffects(std::vector<EffectEntry>& ioEntries)
@@ -195,6 +223,7 @@ void AddKeyEffects(std::vector<EffectEntry>& ioEntries)
         {kMatch_NonRedKey, kScreenParams, &Make<BackdropKeyEffect<Backdrop::kNonRed>>});
     ioEntries.push_back({kMatch_MultiplyKey, kBlendKeyParams, &Make<BlendKeyEffect<true>>});
     ioEntries.push_back({kMatch_ScreenKey, kBlendKeyParams, &Make<BlendKeyEffect<false>>});
+    ioEntries.push_back({kMatch_RemoveMatte, kRemoveMatteParams, &Make<RemoveMatteEffect>});
 }
 
 } // namespace FX::detail

@@ -168,7 +168,10 @@ TEST(EffectPixels, DefaultsLeaveThePictureAlone)
         {kMatch_Transform, {}},
         {kMatch_Crop, {}},
         {kMatch_GaussianBlur, {{"blurriness", "0"}}},
-        {kMatch_MultiplyKey, {{"softness", "0"}}}};
+        {kMatch_MultiplyKey, {{"softness", "0"}}},
+        {kMatch_CornerPin, {}},
+        {kMatch_GarbageMatte, {}},
+        {kMatch_MulticamHilite, {{"width", "0"}}}};
     for (const mt::PixelFormat format : kFormats)
         for (const auto& [match, params] : cases)
         {
@@ -195,6 +198,58 @@ TEST(EffectPixels, CropClearsTheEdgesOnly)
             const bool kept = x >= 3 && x < 11 && y >= 1;
             EXPECT_EQ(At(*result, x, y, 3), kept ? 255 : 0) << x << "," << y;
         }
+}
+
+TEST(EffectPixels, CornerPinAndGarbageMatteFollowTheirCorners)
+{
+    const FrameRef source = Noise(mt::kPixelFormat_BGRA_4444_8u);
+    // Every corner moved by (4, 2) is a shift of the picture.
+    BE::EffectSettings pin;
+    pin.mMatchName = std::string(kMatch_CornerPin);
+    for (const char* corner : {"upperLeft", "upperRight", "lowerRight", "lowerLeft"})
+        pin.mKeyframedParams[corner] = BE::KeyframeCurve::Point({4, 2});
+    FrameRef shifted = Noise(mt::kPixelFormat_BGRA_4444_8u);
+    RenderContext context;
+    ASSERT_EQ(CreateEffect(pin).mEffect->Render(context, shifted, {}), QRT::kResult_Success);
+    for (int y = 0; y < 8; ++y)
+        for (int x = 0; x < 16; ++x)
+            for (int c = 0; c < 4; ++c)
+                ASSERT_EQ(At(*shifted, x, y, c),
+                          x >= 4 && y >= 2 ? At(*source, x - 4, y - 2, c) : 0.0)
+                    << x << "," << y << " component " << c;
+
+    // The left edge moved in by 4.5 pixels: a half-covered column, then the picture.
+    BE::EffectSettings matte;
+    matte.mMatchName = std::string(kMatch_GarbageMatte);
+    matte.mKeyframedParams["upperLeft"] = matte.mKeyframedParams["lowerLeft"] =
+        BE::KeyframeCurve::Point({4.5, 0});
+    FrameRef matted = Noise(mt::kPixelFormat_BGRA_4444_8u);
+    ASSERT_EQ(CreateEffect(matte).mEffect->Render(context, matted, {}), QRT::kResult_Success);
+    for (int x = 0; x < 16; ++x)
+        EXPECT_EQ(At(*matted, x, 3, 3), x < 4 ? 0 : (x == 4 ? 128 : 255)) << x;
+}
+
+TEST(EffectPixels, TimecodeDrawsTheFramesOwnTime)
+{
+    BE::EffectSettings settings;
+    settings.mMatchName = std::string(kMatch_Timecode);
+    settings.mParams = {{"size", "40"}, {"background", "0"}};
+    const QRT::InterfaceRef<IEffect> effect = CreateEffect(settings).mEffect;
+    EXPECT_TRUE(effect->IsTimeVariant());
+    auto draw = [&](std::int64_t inFrame)
+    {
+        FrameRef frame = MakeFrame(160, 40);
+        RenderContext context;
+        context.mFrame = inFrame;
+        EXPECT_EQ(effect->Render(context, frame, {}), QRT::kResult_Success);
+        return std::vector<std::uint8_t>(static_cast<const std::uint8_t*>(frame->GetBaseAddress()),
+                                         static_cast<const std::uint8_t*>(frame->GetBaseAddress()) +
+                                             frame->GetDataSize());
+    };
+    const std::vector<std::uint8_t> first = draw(25 * 3600 + 1);
+    EXPECT_EQ(draw(25 * 3600 + 1), first);
+    EXPECT_NE(draw(25 * 3600 + 2), first);
+    EXPECT_NE(std::count(first.begin(), first.end(), 255), 0) << "nothing was drawn";
 }
 
 TEST(EffectPixels, BlurKeepsAFlatFieldAndSpreadsALineEvenly)

@@ -79,6 +79,7 @@ public:
         context.mTime = inOutputTime.GetTime();
         context.mFrame = context.mTime.ToFrame64(mSetup.mFrameRate);
         context.mDurationFrames = mSetup.mDuration.ToFrame64(mSetup.mFrameRate);
+        context.mFrameRate = mSetup.mFrameRate;
         context.mFlags = inFlags;
         if (!mSetup.mRenderLock)
             return mSetup.mEffect->Render(context, ioFrame, {});

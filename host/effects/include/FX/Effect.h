@@ -90,6 +90,8 @@ struct RenderContext
     mvxmediatypes::TickTime mTime = mvxmediatypes::kTime_Zero;
     std::int64_t mFrame = 0;
     std::int64_t mDurationFrames = 0;
+    // The rate frames are counted at.
+    mvxmediatypes::FrameRate mFrameRate = mvxmediatypes::kFrameRate_Video25;
     std::string mStreamLabel;
     std::uint32_t mFlags = 0;
 };

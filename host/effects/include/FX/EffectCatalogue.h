@@ -38,6 +38,11 @@ inline constexpr std::string_view kMatch_GreenScreenKey = "KX.VNTR Legacy Key Gr
 inline constexpr std::string_view kMatch_NonRedKey = "KX.VNTR Legacy Key NonRed";
 inline constexpr std::string_view kMatch_MultiplyKey = "KX.VNTR Legacy Key Multiply";
 inline constexpr std::string_view kMatch_ScreenKey = "KX.VNTR Legacy Key Screen";
+inline constexpr std::string_view kMatch_RemoveMatte = "KX.VNTR Legacy Key Remove Matte";
+inline constexpr std::string_view kMatch_CornerPin = "KX.VNTR Corner Pin";
+inline constexpr std::string_view kMatch_GarbageMatte = "KX.VNTR Garbage Matte";
+inline constexpr std::string_view kMatch_Timecode = "KX.VNTR Orvl Timecode";
+inline constexpr std::string_view kMatch_MulticamHilite = "KX.VNTR Multicam Hilite";
 inline constexpr std::string_view kMatch_Crop = "VR.Crop";
 inline constexpr std::string_view kMatch_GaussianBlur = "VR.GaussianBlur";
 // The item's own opacity and motion: known names, but no effect object (the
