@@ -6,7 +6,6 @@
 // Usage: effect_job WIDTH HEIGHT FRAMES INPUT.raw MATCH_NAME [KEY=VALUE ...]
 
 #include "FX/EffectCatalogue.h"
-
 #include "VF/VideoFrame.h"
 
 #include <cstdio>
@@ -63,8 +62,8 @@ int main(int argc, char** argv)
         VF::CreateVideoFrame(mvxmediatypes::kPixelFormat_BGRA_4444_8u, width, height,
                              mvxmediatypes::kPixelAspectRatio_Square, false, false);
     FX::RenderContext context;
-    context.mFrameRect = QRT::ParamRect(0, 0, static_cast<std::int32_t>(width),
-                                        static_cast<std::int32_t>(height));
+    context.mFrameRect =
+        QRT::ParamRect(0, 0, static_cast<std::int32_t>(width), static_cast<std::int32_t>(height));
     context.mQuality = 4;
     const std::size_t rowBytes = static_cast<std::size_t>(width) * 4;
     for (int f = 0; f < frames; ++f)

@@ -4,7 +4,6 @@
 // reused and page faults are not measured.
 
 #include "FX/EffectCatalogue.h"
-
 #include "VF/VideoFrame.h"
 
 #include <cstring>
@@ -40,6 +39,11 @@ const Case kCases[] = {
     {"NonRedKey", FX::kMatch_NonRedKey, {}},
     {"MultiplyKey", FX::kMatch_MultiplyKey, {}},
     {"ScreenKey", FX::kMatch_ScreenKey, {}},
+    {"RemoveMatte", FX::kMatch_RemoveMatte, {{"matte", "white"}}},
+    {"CornerPin", FX::kMatch_CornerPin, {}},
+    {"GarbageMatte", FX::kMatch_GarbageMatte, {}},
+    {"Timecode", FX::kMatch_Timecode, {}},
+    {"MulticamHilite", FX::kMatch_MulticamHilite, {}},
 };
 
 void BM_Effect1080p8u(benchmark::State& ioState, const Case& inCase)
@@ -47,6 +51,12 @@ void BM_Effect1080p8u(benchmark::State& ioState, const Case& inCase)
     BE::EffectSettings settings;
     settings.mMatchName = std::string(inCase.mMatch);
     settings.mParams = inCase.mParams;
+    // The four-point effects with corners moved in, so that they do real work.
+    if (inCase.mMatch == FX::kMatch_CornerPin || inCase.mMatch == FX::kMatch_GarbageMatte)
+    {
+        settings.mKeyframedParams["upperLeft"] = BE::KeyframeCurve::Point({100, 50});
+        settings.mKeyframedParams["lowerRight"] = BE::KeyframeCurve::Point({-200, -30});
+    }
     const FX::EffectMade made = FX::CreateEffect(settings);
     if (!made.mEffect)
     {

@@ -13,6 +13,7 @@
 #include "FX/EffectCatalogue.h"
 
 #include <algorithm>
+#include <array>
 #include <cmath>
 
 namespace FX::detail
@@ -48,28 +49,90 @@ std::array<int, kPasses> BoxRadii(double inSigma)
     return radii;
 }
 
-// One box pass over inCount pixels of four components, inStride floats
-// apart, from inSource into outTarget.
-void BoxLine(const float* inSource, float* outTarget, int inCount, std::ptrdiff_t inStride,
-             int inRadius)
+// One box pass of radius inRadius along a line of inCount steps, each step
+// kLanes contiguous floats (a pixel's four components, or a strip of pixels
+// of one row), steps inInStride floats apart in inSource and inOutStride
+// apart in outTarget. Beyond the line's ends its end steps repeat.
+template <int kLanes>
+void BoxLine(const float* inSource, std::ptrdiff_t inInStride, float* outTarget,
+             std::ptrdiff_t inOutStride, int inCount, int inRadius)
 {
     const float scale = 1.0f / static_cast<float>(2 * inRadius + 1);
-    float sum[4] = {0, 0, 0, 0};
-    auto at = [&](int inIndex)
-    { return inSource + std::clamp(inIndex, 0, inCount - 1) * inStride; };
+    float sum[kLanes];
+    auto step = [&](int inIndex)
+    { return inSource + std::clamp(inIndex, 0, inCount - 1) * inInStride; };
+    for (int c = 0; c < kLanes; ++c)
+        sum[c] = 0.0f;
     for (int i = -inRadius - 1; i < inRadius; ++i)
-        for (int c = 0; c < 4; ++c)
-            sum[c] += at(i)[c];
-    for (int i = 0; i < inCount; ++i)
     {
-        const float* in = at(i + inRadius);
-        const float* out = at(i - inRadius - 1);
-        float* target = outTarget + i * inStride;
-        for (int c = 0; c < 4; ++c)
+        const float* in = step(i);
+        for (int c = 0; c < kLanes; ++c)
+            sum[c] += in[c];
+    }
+    auto emit = [&](int inIndex, const float* inAdded, const float* inRemoved)
+    {
+        float* out = outTarget + inIndex * inOutStride;
+        for (int c = 0; c < kLanes; ++c)
         {
-            sum[c] += in[c] - out[c];
-            target[c] = sum[c] * scale;
+            sum[c] += inAdded[c] - inRemoved[c];
+            out[c] = sum[c] * scale;
         }
+    };
+    // The steps whose window reaches past an end take the clamped reads.
+    const int safeFrom = std::min(inCount, inRadius + 1);
+    const int safeTo = std::max(safeFrom, inCount - inRadius);
+    for (int i = 0; i < safeFrom; ++i)
+        emit(i, step(i + inRadius), step(i - inRadius - 1));
+    for (int i = safeFrom; i < safeTo; ++i)
+        emit(i, inSource + (i + inRadius) * inInStride, inSource + (i - inRadius - 1) * inInStride);
+    for (int i = safeTo; i < inCount; ++i)
+        emit(i, step(i + inRadius), step(i - inRadius - 1));
+}
+
+// Pixels [inX, inX + inCount) of row inY as premultiplied floats.
+void LoadPremultiplied(const Pixels& inPixels, int inX, int inY, int inCount, float* outValues)
+{
+    if (inPixels.mFloat)
+    {
+        const float* p = inPixels.Row<float>(inY) + inX * 4;
+        for (int i = 0; i < inCount * 4; i += 4)
+        {
+            const float a = p[i + 3];
+            outValues[i] = p[i] * a, outValues[i + 1] = p[i + 1] * a;
+            outValues[i + 2] = p[i + 2] * a, outValues[i + 3] = a;
+        }
+        return;
+    }
+    const std::uint8_t* p = inPixels.Row<std::uint8_t>(inY) + inX * 4;
+    for (int i = 0; i < inCount * 4; i += 4)
+    {
+        const float a = kUnit8[p[i + 3]];
+        outValues[i] = kUnit8[p[i]] * a, outValues[i + 1] = kUnit8[p[i + 1]] * a;
+        outValues[i + 2] = kUnit8[p[i + 2]] * a, outValues[i + 3] = a;
+    }
+}
+
+// The same pixels back from premultiplied floats.
+void StoreStraight(const Pixels& inPixels, int inX, int inY, int inCount, const float* inValues)
+{
+    auto inverse = [](float inAlpha) { return inAlpha > 0.0f ? 1.0f / inAlpha : 0.0f; };
+    if (inPixels.mFloat)
+    {
+        float* p = inPixels.Row<float>(inY) + inX * 4;
+        for (int i = 0; i < inCount * 4; i += 4)
+        {
+            const float a = inValues[i + 3], k = inverse(a);
+            p[i] = inValues[i] * k, p[i + 1] = inValues[i + 1] * k;
+            p[i + 2] = inValues[i + 2] * k, p[i + 3] = a;
+        }
+        return;
+    }
+    std::uint8_t* p = inPixels.Row<std::uint8_t>(inY) + inX * 4;
+    for (int i = 0; i < inCount * 4; i += 4)
+    {
+        const float a = inValues[i + 3], k = inverse(a);
+        p[i] = ToByte(inValues[i] * k), p[i + 1] = ToByte(inValues[i + 1] * k);
+        p[i + 2] = ToByte(inValues[i + 2] * k), p[i + 3] = ToByte(a);
     }
 }
 
@@ -84,85 +147,77 @@ protected:
     {
         const double sigma = Value(0, inContext) * inContext.mScale;
         const int dimensions = static_cast<int>(Value(1, inContext));
-        if (sigma < 0.2 || inPixels.mWidth == 0 || inPixels.mHeight == 0)
+        const int width = inPixels.mWidth, height = inPixels.mHeight;
+        if (sigma < 0.2 || width == 0 || height == 0)
             return QRT::kResult_Success;
         const std::array<int, kPasses> radii = BoxRadii(sigma);
-        const std::size_t count = static_cast<std::size_t>(inPixels.mWidth) *
-                                  static_cast<std::size_t>(inPixels.mHeight) * 4;
-        mPlane.resize(count);
-        mSpare.resize(count);
-        Load(inPixels);
-        const int width = inPixels.mWidth, height = inPixels.mHeight;
-        if (dimensions != 2)
-            for (const int radius : radii)
+        const bool horizontal = dimensions != 2, vertical = dimensions != 1;
+        // Rows are blurred one at a time in two row buffers, which stay in
+        // the cache; columns in strips of kStrip pixels, for the same reason.
+        // Between the two the plane holds the horizontally blurred picture.
+        const std::size_t rowFloats = static_cast<std::size_t>(width) * 4;
+        const std::size_t stripFloats = static_cast<std::size_t>(height) * kStrip * 4;
+        mRowA.resize(rowFloats);
+        mRowB.resize(rowFloats);
+        if (vertical)
+        {
+            mPlane.resize(rowFloats * static_cast<std::size_t>(height));
+            mStripA.resize(stripFloats);
+            mStripB.resize(stripFloats);
+        }
+        float* rowA = mRowA.data();
+        float* rowB = mRowB.data();
+        for (int y = 0; y < height; ++y)
+        {
+            float* target =
+                vertical ? mPlane.data() + rowFloats * static_cast<std::size_t>(y) : rowA;
+            LoadPremultiplied(inPixels, 0, y, width, horizontal ? rowA : target);
+            if (horizontal)
             {
-                for (int y = 0; y < height; ++y)
-                {
-                    const std::size_t start = static_cast<std::size_t>(y) * width * 4;
-                    BoxLine(mPlane.data() + start, mSpare.data() + start, width, 4, radius);
-                }
-                mPlane.swap(mSpare);
+                BoxLine<4>(rowA, 4, rowB, 4, width, radii[0]);
+                BoxLine<4>(rowB, 4, rowA, 4, width, radii[1]);
+                BoxLine<4>(rowA, 4, vertical ? target : rowB, 4, width, radii[2]);
             }
-        if (dimensions != 1)
-            for (const int radius : radii)
-            {
-                for (int x = 0; x < width; ++x)
-                    BoxLine(mPlane.data() + x * 4, mSpare.data() + x * 4, height,
-                            static_cast<std::ptrdiff_t>(width) * 4, radius);
-                mPlane.swap(mSpare);
-            }
-        Store(inPixels);
+            if (!vertical)
+                StoreStraight(inPixels, 0, y, width, horizontal ? rowB : target);
+        }
+        if (!vertical)
+            return QRT::kResult_Success;
+        constexpr std::ptrdiff_t kStripStride = kStrip * 4;
+        const auto planeStride = static_cast<std::ptrdiff_t>(rowFloats);
+        for (int x = 0; x + kStrip <= width; x += kStrip)
+        {
+            BoxLine<kStrip * 4>(mPlane.data() + x * 4, planeStride, mStripA.data(), kStripStride,
+                                height, radii[0]);
+            BoxLine<kStrip * 4>(mStripA.data(), kStripStride, mStripB.data(), kStripStride, height,
+                                radii[1]);
+            BoxLine<kStrip * 4>(mStripB.data(), kStripStride, mStripA.data(), kStripStride, height,
+                                radii[2]);
+            for (int y = 0; y < height; ++y)
+                StoreStraight(inPixels, x, y, kStrip, mStripA.data() + y * kStripStride);
+        }
+        // The last columns, fewer than a strip, one pixel at a time.
+        for (int x = width - width % kStrip; x < width; ++x)
+        {
+            BoxLine<4>(mPlane.data() + x * 4, planeStride, mStripA.data(), 4, height, radii[0]);
+            BoxLine<4>(mStripA.data(), 4, mStripB.data(), 4, height, radii[1]);
+            BoxLine<4>(mStripB.data(), 4, mStripA.data(), 4, height, radii[2]);
+            for (int y = 0; y < height; ++y)
+                StoreStraight(inPixels, x, y, 1, mStripA.data() + y * 4);
+        }
         return QRT::kResult_Success;
     }
 
 private:
-    void Load(const Pixels& inPixels)
-    {
-        float* plane = mPlane.data();
-        for (std::int32_t y = 0; y < inPixels.mHeight; ++y)
-            for (std::int32_t x = 0; x < inPixels.mWidth; ++x, plane += 4)
-            {
-                float b, g, r, a;
-                if (inPixels.mFloat)
-                {
-                    const float* p = inPixels.Row<float>(y) + x * 4;
-                    b = p[0], g = p[1], r = p[2], a = p[3];
-                }
-                else
-                {
-                    const std::uint8_t* p = inPixels.Row<std::uint8_t>(y) + x * 4;
-                    b = kUnit8[p[0]], g = kUnit8[p[1]], r = kUnit8[p[2]], a = kUnit8[p[3]];
-                }
-                plane[0] = b * a, plane[1] = g * a, plane[2] = r * a, plane[3] = a;
-            }
-    }
+    static constexpr int kStrip = 16;
 
-    void Store(const Pixels& inPixels) const
-    {
-        const float* plane = mPlane.data();
-        for (std::int32_t y = 0; y < inPixels.mHeight; ++y)
-            for (std::int32_t x = 0; x < inPixels.mWidth; ++x, plane += 4)
-            {
-                const float a = plane[3];
-                const float inverse = a > 0.0f ? 1.0f / a : 0.0f;
-                const float b = plane[0] * inverse, g = plane[1] * inverse, r = plane[2] * inverse;
-                if (inPixels.mFloat)
-                {
-                    float* p = inPixels.Row<float>(y) + x * 4;
-                    p[0] = b, p[1] = g, p[2] = r, p[3] = a;
-                }
-                else
-                {
-                    std::uint8_t* p = inPixels.Row<std::uint8_t>(y) + x * 4;
-                    p[0] = ToByte(b), p[1] = ToByte(g), p[2] = ToByte(r), p[3] = ToByte(a);
-                }
-            }
-    }
-
-    // The working planes, premultiplied BGRA floats; reused from frame to
+    // The working buffers, premultiplied BGRA floats, reused from frame to
     // frame. Touched only inside RenderInPlace, which the caller serialises.
+    std::vector<float> mRowA;
+    std::vector<float> mRowB;
     std::vector<float> mPlane;
-    std::vector<float> mSpare;
+    std::vector<float> mStripA;
+    std::vector<float> mStripB;
 };
 
 } // namespace

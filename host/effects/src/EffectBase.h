@@ -8,6 +8,7 @@
 #include "FX/Effect.h"
 #include "QRT/QRTUnknown.h"
 
+#include <algorithm>
 #include <array>
 #include <cmath>
 #include <cstdint>
@@ -114,15 +115,12 @@ constexpr std::array<float, 256> MakeUnit8Table()
 }
 inline constexpr std::array<float, 256> kUnit8 = MakeUnit8Table();
 
+// 0..1 to an 8-bit component, rounded; clamped without branches (pixel data
+// is unpredictable). Not a number gives 0.
 inline std::uint8_t ToByte(float inValue)
 {
     const float scaled = inValue * 255.0f + 0.5f;
-    return static_cast<std::uint8_t>(scaled <= 0.0f ? 0.0f : (scaled >= 255.0f ? 255.0f : scaled));
-}
-
-inline float Clamp01(float inValue)
-{
-    return inValue < 0.0f ? 0.0f : (inValue > 1.0f ? 1.0f : inValue);
+    return static_cast<std::uint8_t>(std::min(std::max(scaled, 0.0f), 255.0f));
 }
 
 // BT.709 luma of gamma-encoded components.
@@ -132,51 +130,78 @@ inline float Luma(float inR, float inG, float inB)
 }
 
 // Calls inFunction(b, g, r, a) on every pixel as floats (0..1 for 8-bit
-// pixels, which are written back rounded and clamped).
+// pixels, which are written back rounded and clamped). Each row is split
+// into one array per component first, so that the loop over a row runs on
+// contiguous values and vectorises.
 template <class Function>
 void ForEachPixel(const Pixels& inPixels, Function&& inFunction)
 {
+    const auto width = static_cast<std::size_t>(inPixels.mWidth);
+    std::vector<float> planes(width * 4);
+    float* const b = planes.data();
+    float* const g = b + width;
+    float* const r = g + width;
+    float* const a = r + width;
     for (std::int32_t y = 0; y < inPixels.mHeight; ++y)
     {
         if (inPixels.mFloat)
         {
             float* row = inPixels.Row<float>(y);
-            for (std::int32_t x = 0; x < inPixels.mWidth; ++x, row += 4)
-                inFunction(row[0], row[1], row[2], row[3]);
+            for (std::size_t x = 0; x < width; ++x)
+                b[x] = row[4 * x], g[x] = row[4 * x + 1], r[x] = row[4 * x + 2],
+                a[x] = row[4 * x + 3];
+            for (std::size_t x = 0; x < width; ++x)
+                inFunction(b[x], g[x], r[x], a[x]);
+            for (std::size_t x = 0; x < width; ++x)
+                row[4 * x] = b[x], row[4 * x + 1] = g[x], row[4 * x + 2] = r[x],
+                        row[4 * x + 3] = a[x];
             continue;
         }
         std::uint8_t* row = inPixels.Row<std::uint8_t>(y);
-        for (std::int32_t x = 0; x < inPixels.mWidth; ++x, row += 4)
+        for (std::size_t x = 0; x < width; ++x)
         {
-            float b = kUnit8[row[0]], g = kUnit8[row[1]], r = kUnit8[row[2]], a = kUnit8[row[3]];
-            inFunction(b, g, r, a);
-            row[0] = ToByte(b);
-            row[1] = ToByte(g);
-            row[2] = ToByte(r);
-            row[3] = ToByte(a);
+            b[x] = kUnit8[row[4 * x]], g[x] = kUnit8[row[4 * x + 1]];
+            r[x] = kUnit8[row[4 * x + 2]], a[x] = kUnit8[row[4 * x + 3]];
+        }
+        for (std::size_t x = 0; x < width; ++x)
+            inFunction(b[x], g[x], r[x], a[x]);
+        for (std::size_t x = 0; x < width; ++x)
+        {
+            row[4 * x] = ToByte(b[x]), row[4 * x + 1] = ToByte(g[x]);
+            row[4 * x + 2] = ToByte(r[x]), row[4 * x + 3] = ToByte(a[x]);
         }
     }
 }
 
 // The same for kernels that change only the alpha: inFunction(b, g, r) answers
-// the factor the alpha is multiplied by.
+// the factor the alpha is multiplied by. 8-bit colour is left as it is.
 template <class Function>
 void ScaleAlpha(const Pixels& inPixels, Function&& inFunction)
 {
+    if (inPixels.mFloat)
+    {
+        ForEachPixel(inPixels, [&](float& ioB, float& ioG, float& ioR, float& ioA)
+                     { ioA *= inFunction(ioB, ioG, ioR); });
+        return;
+    }
+    const auto width = static_cast<std::size_t>(inPixels.mWidth);
+    std::vector<float> planes(width * 4);
+    float* const b = planes.data();
+    float* const g = b + width;
+    float* const r = g + width;
+    float* const a = r + width;
     for (std::int32_t y = 0; y < inPixels.mHeight; ++y)
     {
-        if (inPixels.mFloat)
-        {
-            float* row = inPixels.Row<float>(y);
-            for (std::int32_t x = 0; x < inPixels.mWidth; ++x, row += 4)
-                row[3] *= inFunction(row[0], row[1], row[2]);
-            continue;
-        }
         std::uint8_t* row = inPixels.Row<std::uint8_t>(y);
-        for (std::int32_t x = 0; x < inPixels.mWidth; ++x, row += 4)
-            if (row[3] != 0)
-                row[3] = ToByte(kUnit8[row[3]] *
-                                inFunction(kUnit8[row[0]], kUnit8[row[1]], kUnit8[row[2]]));
+        for (std::size_t x = 0; x < width; ++x)
+        {
+            b[x] = kUnit8[row[4 * x]], g[x] = kUnit8[row[4 * x + 1]];
+            r[x] = kUnit8[row[4 * x + 2]], a[x] = kUnit8[row[4 * x + 3]];
+        }
+        for (std::size_t x = 0; x < width; ++x)
+            a[x] *= inFunction(b[x], g[x], r[x]);
+        for (std::size_t x = 0; x < width; ++x)
+            row[4 * x + 3] = ToByte(a[x]);
     }
 }
 

@@ -18,17 +18,25 @@ namespace FX::detail
 namespace
 {
 
-struct Ramp
+// Without branches: no softness is a slope so steep that any distance above
+// the threshold reaches 1.
+class Ramp
 {
-    float mThreshold;
-    float mSoftness;
+public:
+    Ramp(float inThreshold, float inSoftness)
+        : mThreshold(inThreshold)
+        , mSlope(inSoftness > 0.0f ? 1.0f / inSoftness : 1.0e30f)
+    {
+    }
 
     float operator()(float inDistance) const
     {
-        if (inDistance <= mThreshold)
-            return 0.0f;
-        return mSoftness <= 0.0f ? 1.0f : std::min(1.0f, (inDistance - mThreshold) / mSoftness);
+        return std::min(1.0f, std::max(0.0f, (inDistance - mThreshold) * mSlope));
     }
+
+private:
+    float mThreshold;
+    float mSlope;
 };
 
 struct Rgb
