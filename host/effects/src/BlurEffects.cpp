@@ -89,50 +89,53 @@ void BoxLine(const float* inSource, std::ptrdiff_t inInStride, float* outTarget,
         emit(i, step(i + inRadius), step(i - inRadius - 1));
 }
 
-// Pixels [inX, inX + inCount) of row inY as premultiplied floats.
-void LoadPremultiplied(const Pixels& inPixels, int inX, int inY, int inCount, float* outValues)
+// Pixels [inX, inX + inCount) of row inY as premultiplied floats, each pixel's
+// four inStride floats after the one before.
+void LoadPremultiplied(const Pixels& inPixels, int inX, int inY, int inCount, float* outValues,
+                       std::ptrdiff_t inStride = 4)
 {
     if (inPixels.mFloat)
     {
         const float* p = inPixels.Row<float>(inY) + inX * 4;
-        for (int i = 0; i < inCount * 4; i += 4)
+        for (int i = 0; i < inCount * 4; i += 4, outValues += inStride)
         {
             const float a = p[i + 3];
-            outValues[i] = p[i] * a, outValues[i + 1] = p[i + 1] * a;
-            outValues[i + 2] = p[i + 2] * a, outValues[i + 3] = a;
+            outValues[0] = p[i] * a, outValues[1] = p[i + 1] * a;
+            outValues[2] = p[i + 2] * a, outValues[3] = a;
         }
         return;
     }
     const std::uint8_t* p = inPixels.Row<std::uint8_t>(inY) + inX * 4;
-    for (int i = 0; i < inCount * 4; i += 4)
+    for (int i = 0; i < inCount * 4; i += 4, outValues += inStride)
     {
         const float a = kUnit8[p[i + 3]];
-        outValues[i] = kUnit8[p[i]] * a, outValues[i + 1] = kUnit8[p[i + 1]] * a;
-        outValues[i + 2] = kUnit8[p[i + 2]] * a, outValues[i + 3] = a;
+        outValues[0] = kUnit8[p[i]] * a, outValues[1] = kUnit8[p[i + 1]] * a;
+        outValues[2] = kUnit8[p[i + 2]] * a, outValues[3] = a;
     }
 }
 
 // The same pixels back from premultiplied floats.
-void StoreStraight(const Pixels& inPixels, int inX, int inY, int inCount, const float* inValues)
+void StoreStraight(const Pixels& inPixels, int inX, int inY, int inCount, const float* inValues,
+                   std::ptrdiff_t inStride = 4)
 {
     auto inverse = [](float inAlpha) { return inAlpha > 0.0f ? 1.0f / inAlpha : 0.0f; };
     if (inPixels.mFloat)
     {
         float* p = inPixels.Row<float>(inY) + inX * 4;
-        for (int i = 0; i < inCount * 4; i += 4)
+        for (int i = 0; i < inCount * 4; i += 4, inValues += inStride)
         {
-            const float a = inValues[i + 3], k = inverse(a);
-            p[i] = inValues[i] * k, p[i + 1] = inValues[i + 1] * k;
-            p[i + 2] = inValues[i + 2] * k, p[i + 3] = a;
+            const float a = inValues[3], k = inverse(a);
+            p[i] = inValues[0] * k, p[i + 1] = inValues[1] * k;
+            p[i + 2] = inValues[2] * k, p[i + 3] = a;
         }
         return;
     }
     std::uint8_t* p = inPixels.Row<std::uint8_t>(inY) + inX * 4;
-    for (int i = 0; i < inCount * 4; i += 4)
+    for (int i = 0; i < inCount * 4; i += 4, inValues += inStride)
     {
-        const float a = inValues[i + 3], k = inverse(a);
-        p[i] = ToByte(inValues[i] * k), p[i + 1] = ToByte(inValues[i + 1] * k);
-        p[i + 2] = ToByte(inValues[i + 2] * k), p[i + 3] = ToByte(a);
+        const float a = inValues[3], k = inverse(a);
+        p[i] = ToByte(inValues[0] * k), p[i + 1] = ToByte(inValues[1] * k);
+        p[i + 2] = ToByte(inValues[2] * k), p[i + 3] = ToByte(a);
     }
 }
 
@@ -152,9 +155,10 @@ protected:
             return QRT::kResult_Success;
         const std::array<int, kPasses> radii = BoxRadii(sigma);
         const bool horizontal = dimensions != 2, vertical = dimensions != 1;
-        // Rows are blurred one at a time in two row buffers, which stay in
-        // the cache; columns in strips of kStrip pixels, for the same reason.
-        // Between the two the plane holds the horizontally blurred picture.
+        // Rows are blurred in blocks of kStrip rows (the last few one at a
+        // time) in two block buffers, which stay in the cache; columns in
+        // strips of kStrip pixels, for the same reason. Between the two the
+        // plane holds the horizontally blurred picture.
         const std::size_t rowFloats = static_cast<std::size_t>(width) * 4;
         const std::size_t stripFloats = static_cast<std::size_t>(height) * kStrip * 4;
         mRowA.resize(rowFloats);
@@ -167,7 +171,40 @@ protected:
         }
         float* rowA = mRowA.data();
         float* rowB = mRowB.data();
-        for (int y = 0; y < height; ++y)
+        constexpr std::ptrdiff_t kStripStride = kStrip * 4;
+        int firstSingleRow = 0;
+        if (horizontal)
+        {
+            // Blocks of kStrip rows, interleaved so that one step along the
+            // rows is kStrip pixels of contiguous floats.
+            mRowA.resize(rowFloats * kStrip);
+            mRowB.resize(rowFloats * kStrip);
+            rowA = mRowA.data();
+            rowB = mRowB.data();
+            for (; firstSingleRow + kStrip <= height; firstSingleRow += kStrip)
+            {
+                const int y0 = firstSingleRow;
+                for (int r = 0; r < kStrip; ++r)
+                    LoadPremultiplied(inPixels, 0, y0 + r, width, rowA + r * 4, kStripStride);
+                BoxLine<kStrip * 4>(rowA, kStripStride, rowB, kStripStride, width, radii[0]);
+                BoxLine<kStrip * 4>(rowB, kStripStride, rowA, kStripStride, width, radii[1]);
+                BoxLine<kStrip * 4>(rowA, kStripStride, rowB, kStripStride, width, radii[2]);
+                for (int r = 0; r < kStrip; ++r)
+                {
+                    if (!vertical)
+                    {
+                        StoreStraight(inPixels, 0, y0 + r, width, rowB + r * 4, kStripStride);
+                        continue;
+                    }
+                    float* target = mPlane.data() + rowFloats * static_cast<std::size_t>(y0 + r);
+                    const float* source = rowB + r * 4;
+                    for (int x = 0; x < width; ++x)
+                        for (int c = 0; c < 4; ++c)
+                            target[x * 4 + c] = source[x * kStripStride + c];
+                }
+            }
+        }
+        for (int y = firstSingleRow; y < height; ++y)
         {
             float* target =
                 vertical ? mPlane.data() + rowFloats * static_cast<std::size_t>(y) : rowA;
@@ -183,7 +220,6 @@ protected:
         }
         if (!vertical)
             return QRT::kResult_Success;
-        constexpr std::ptrdiff_t kStripStride = kStrip * 4;
         const auto planeStride = static_cast<std::ptrdiff_t>(rowFloats);
         for (int x = 0; x + kStrip <= width; x += kStrip)
         {
