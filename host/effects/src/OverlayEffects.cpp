@@ -89,7 +89,7 @@ protected:
             std::max<std::int64_t>(1, std::llround(inContext.mFrameRate.GetValue()));
         const std::int64_t frame =
             std::max<std::int64_t>(0, inContext.mFrame + std::llround(Value(3, inContext)));
-        char text[32];
+        char text[48];
         std::snprintf(text, sizeof text, "%02lld:%02lld:%02lld:%02lld",
                       static_cast<long long>(frame / (rate * 3600) % 100),
                       static_cast<long long>(frame / (rate * 60) % 60),
