@@ -277,6 +277,21 @@ TEST(EffectPixels, BlurKeepsAFlatFieldAndSpreadsALineEvenly)
     for (int x = 0; x < 33; ++x)
         variance += At(*result, x, 1, 0) / 255 * (x - 16) * (x - 16);
     EXPECT_NEAR(std::sqrt(variance), 3.0, 0.25);
+
+    // Down the columns: a row lit across 17 columns (a strip of sixteen and
+    // one more) spreads alike in every column, at full size.
+    FrameRef row = MakeFrame(17, 33, mt::kPixelFormat_BGRA_4444_32f);
+    for (int y = 0; y < 33; ++y)
+        for (int x = 0; x < 17; ++x)
+            Set(*row, x, y, {y == 16 ? 255.0 : 0.0, 40, 80, 255});
+    const FrameRef down = Render(kMatch_GaussianBlur, {{"blurriness", "3"}}, row);
+    for (int y = 0; y < 33; ++y)
+    {
+        EXPECT_NEAR(At(*down, 0, y, 0), At(*down, 0, 32 - y, 0), 1e-3) << y;
+        EXPECT_NEAR(At(*down, 16, y, 0), At(*down, 0, y, 0), 1e-3) << y;
+        EXPECT_NEAR(At(*down, 7, y, 0), At(*down, 0, y, 0), 1e-3) << y;
+    }
+    EXPECT_GT(At(*down, 16, 13, 0), 1.0);
 }
 
 TEST(EffectPixels, ASharedFrameIsNeverWrittenAndOtherFormatsAreStaged)
