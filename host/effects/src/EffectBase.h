@@ -115,12 +115,14 @@ constexpr std::array<float, 256> MakeUnit8Table()
 }
 inline constexpr std::array<float, 256> kUnit8 = MakeUnit8Table();
 
-// 0..1 to an 8-bit component, rounded; clamped without branches (pixel data
-// is unpredictable). Not a number gives 0.
+// 0..1 to an 8-bit component, rounded and clamped in integers, which compiles
+// to conditional moves (pixel data is too unpredictable for branches).
+// Input contract: a finite value of at most a few million (every kernel's
+// arithmetic stays far inside that).
 inline std::uint8_t ToByte(float inValue)
 {
-    const float scaled = inValue * 255.0f + 0.5f;
-    return static_cast<std::uint8_t>(std::min(std::max(scaled, 0.0f), 255.0f));
+    const auto scaled = static_cast<std::int32_t>(inValue * 255.0f + 0.5f);
+    return static_cast<std::uint8_t>(std::clamp(scaled, 0, 255));
 }
 
 // BT.709 luma of gamma-encoded components.

@@ -25,17 +25,18 @@ namespace mt = mvxmediatypes;
 using CutlistRef = QRT::InterfaceRef<MF::IRenderableCutlist>;
 using NodeRef = QRT::InterfaceRef<MF::IRenderableNode>;
 
-// One 64x36 item of 12 frames with the given effects (JSON list).
-std::string Timeline(const std::string& inEffects)
+// One 64x36 item of 12 frames with the given effects (JSON list) and more keys.
+std::string Timeline(const std::string& inEffects, const std::string& inMore = {})
 {
     return R"({"sequences": [{"name": "S", "size": [64, 36], "tracks": [{"items": [)"
            R"({"end": "12f", "media": {"pattern": "pattern:moving?size=64x36"}, "effects": )" +
-           inEffects + "}]}]}]}";
+           inEffects + inMore + "}]}]}]}";
 }
 
-CutlistRef Cutlist(const std::string& inEffects)
+CutlistRef Cutlist(const std::string& inEffects, const std::string& inMore = {})
 {
-    const BE::TimelineLoadResult loaded = BE::ParseTimeline(Timeline(inEffects), "t.json", ".");
+    const BE::TimelineLoadResult loaded =
+        BE::ParseTimeline(Timeline(inEffects, inMore), "t.json", ".");
     EXPECT_EQ(loaded.mError, "");
     CutlistRef cutlist;
     EXPECT_EQ(CreateCutlistFactory()->CreateSequenceCutlist(loaded.mMain, {}, cutlist),
@@ -119,6 +120,20 @@ std::string RenderPixels(const CutlistRef& inCutlist, std::int64_t inFrame)
         return "none";
     const auto* base = static_cast<const char*>(frame->GetBaseAddress());
     return std::string(base, base + frame->GetDataSize());
+}
+
+TEST(EffectTimelineTest, AFrameHoldWithFiltersHoldsTheEffectsToo)
+{
+    const std::string brightening = R"([{"match": "KX.VNTR ProcAmp", "params": {"brightness":
+        [{"time": 0, "value": 0}, {"time": "11f", "value": 100}]}}])";
+    for (const bool filters : {true, false})
+    {
+        SCOPED_TRACE(filters);
+        const CutlistRef held = Cutlist(
+            brightening, std::string(R"(, "clip": {"frameHold": {"at": "3f", "filters": )") +
+                             (filters ? "true" : "false") + "}}");
+        EXPECT_EQ(RenderPixels(held, 2) == RenderPixels(held, 9), filters);
+    }
 }
 
 TEST(EffectTimelineTest, FrameParallelRenderingOfASerialEffectMatchesSerialRendering)
