@@ -69,13 +69,18 @@ int main(int argc, char** argv)
     for (int f = 0; f < frames; ++f)
     {
         auto* base = static_cast<std::uint8_t*>(frame->GetWritableBaseAddress());
-        for (std::uint32_t y = 0; y < height; ++y)
-            if (std::fread(base + y * static_cast<std::size_t>(frame->GetRowBytes()), 1, rowBytes,
-                           input.get()) != rowBytes)
+        // Rows without padding are read in one go, as ffmpeg reads its frames.
+        const bool packed = static_cast<std::size_t>(frame->GetRowBytes()) == rowBytes;
+        for (std::uint32_t y = 0; y < (packed ? 1 : height); ++y)
+        {
+            const std::size_t bytes = packed ? rowBytes * height : rowBytes;
+            if (std::fread(base + y * static_cast<std::size_t>(frame->GetRowBytes()), 1, bytes,
+                           input.get()) != bytes)
             {
                 std::fprintf(stderr, "effect_job: %s ends before frame %d\n", argv[4], f);
                 return 1;
             }
+        }
         // The frame the effect answers is the one the next input is read into.
         if (made.mEffect->Render(context, frame, {}) != QRT::kResult_Success)
         {
