@@ -153,14 +153,15 @@ public:
     {
         return [](float b, float g, float r)
         {
+            // Plain selections rather than std::max, so that the row loop vectorises.
             float excess = 0.0f;
             if constexpr (kBackdrop == Backdrop::kBlue)
-                excess = b - std::max(r, g);
+                excess = b - (r > g ? r : g);
             else if constexpr (kBackdrop == Backdrop::kGreen)
-                excess = g - std::max(r, b);
+                excess = g - (r > b ? r : b);
             else
-                excess = std::max(g, b) - r;
-            return 1.0f - std::max(0.0f, excess);
+                excess = (g > b ? g : b) - r;
+            return 1.0f - (excess > 0.0f ? excess : 0.0f);
         };
     }
 };
