@@ -91,8 +91,8 @@ void BoxLine(const float* inSource, std::ptrdiff_t inInStride, float* outTarget,
 
 // Pixels [inX, inX + inCount) of row inY as premultiplied floats, each pixel's
 // four inStride floats after the one before.
-void LoadPremultiplied(const Pixels& inPixels, int inX, int inY, int inCount, float* outValues,
-                       std::ptrdiff_t inStride = 4)
+template <std::ptrdiff_t inStride = 4>
+void LoadPremultiplied(const Pixels& inPixels, int inX, int inY, int inCount, float* outValues)
 {
     if (inPixels.mFloat)
     {
@@ -115,8 +115,8 @@ void LoadPremultiplied(const Pixels& inPixels, int inX, int inY, int inCount, fl
 }
 
 // The same pixels back from premultiplied floats.
-void StoreStraight(const Pixels& inPixels, int inX, int inY, int inCount, const float* inValues,
-                   std::ptrdiff_t inStride = 4)
+template <std::ptrdiff_t inStride = 4>
+void StoreStraight(const Pixels& inPixels, int inX, int inY, int inCount, const float* inValues)
 {
     auto inverse = [](float inAlpha) { return inAlpha > 0.0f ? 1.0f / inAlpha : 0.0f; };
     if (inPixels.mFloat)
@@ -185,7 +185,7 @@ protected:
             {
                 const int y0 = firstSingleRow;
                 for (int r = 0; r < kStrip; ++r)
-                    LoadPremultiplied(inPixels, 0, y0 + r, width, rowA + r * 4, kStripStride);
+                    LoadPremultiplied<kStripStride>(inPixels, 0, y0 + r, width, rowA + r * 4);
                 BoxLine<kStrip * 4>(rowA, kStripStride, rowB, kStripStride, width, radii[0]);
                 BoxLine<kStrip * 4>(rowB, kStripStride, rowA, kStripStride, width, radii[1]);
                 BoxLine<kStrip * 4>(rowA, kStripStride, rowB, kStripStride, width, radii[2]);
@@ -193,7 +193,7 @@ protected:
                 {
                     if (!vertical)
                     {
-                        StoreStraight(inPixels, 0, y0 + r, width, rowB + r * 4, kStripStride);
+                        StoreStraight<kStripStride>(inPixels, 0, y0 + r, width, rowB + r * 4);
                         continue;
                     }
                     float* target = mPlane.data() + rowFloats * static_cast<std::size_t>(y0 + r);
