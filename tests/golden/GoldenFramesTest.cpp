@@ -208,7 +208,7 @@ TEST_P(GoldenFramesTest, FramesMatchTheirGoldenLines)
 }
 
 INSTANTIATE_TEST_SUITE_P(Timelines, GoldenFramesTest,
-                         ::testing::Values("layers", "motion", "retime", "transitions"));
+                         ::testing::Values("effects", "layers", "motion", "retime", "transitions"));
 
 } // namespace
 } // namespace ML

@@ -7,6 +7,7 @@
 #include "BE/TimelineFile.h"
 #include "BE/VideoSources.h"
 #include "DemoTimeline.h"
+#include "FX/EffectCatalogue.h"
 #include "MF/RenderableCutlistFactory.h"
 #include "ML/RenderableCutlistSource.h"
 #include "RenderJob.h"
@@ -89,13 +90,15 @@ RenderOutcome RunTimelineRender(const RenderOptions& inOptions,
     outcome.mExitCode = 1;
     const BE::TimelineLoadResult loaded =
         inOptions.mBuiltInTimeline
-            ? BE::ParseTimeline(GetDemoTimelineText(), kDemoTimelineName, ".")
-            : BE::LoadTimelineFile(inOptions.mMedia);
+            ? BE::ParseTimeline(GetDemoTimelineText(), kDemoTimelineName, ".", FX::CheckEffect)
+            : BE::LoadTimelineFile(inOptions.mMedia, FX::CheckEffect);
     if (!loaded.Succeeded())
     {
         outcome.mError = loaded.mError;
         return outcome;
     }
+    for (const std::string& warning : loaded.mWarnings)
+        std::fprintf(inEnvironment.mProgress, "vrender: warning: %s\n", warning.c_str());
     // The demo's offline clip is offline on purpose.
     if (!inOptions.mBuiltInTimeline)
         for (const std::string& missing : loaded.mMissingFiles)

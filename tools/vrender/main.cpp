@@ -18,6 +18,7 @@
 #include "BE/TimelineFile.h"
 #include "CutlistInfo.h"
 #include "DemoTimeline.h"
+#include "FX/EffectCatalogue.h"
 #include "MF/RenderableCutlistFactory.h"
 #include "ML/RenderExecutors.h"
 #include "ML/VideoRenderer.h"
@@ -138,14 +139,16 @@ public:
 int RunTimelineInfo(const std::string& inPath)
 {
     const BE::TimelineLoadResult loaded =
-        inPath.empty()
-            ? BE::ParseTimeline(vrender::GetDemoTimelineText(), vrender::kDemoTimelineName, ".")
-            : BE::LoadTimelineFile(inPath);
+        inPath.empty() ? BE::ParseTimeline(vrender::GetDemoTimelineText(),
+                                           vrender::kDemoTimelineName, ".", FX::CheckEffect)
+                       : BE::LoadTimelineFile(inPath, FX::CheckEffect);
     if (!loaded.Succeeded())
     {
         std::fprintf(stderr, "vrender: %s\n", loaded.mError.c_str());
         return 2;
     }
+    for (const std::string& warning : loaded.mWarnings)
+        std::fprintf(stderr, "vrender: warning: %s\n", warning.c_str());
     if (!inPath.empty())
         for (const std::string& missing : loaded.mMissingFiles)
             std::fprintf(stderr,

@@ -4,6 +4,7 @@
 #include "factory/CutlistFactory.h"
 
 #include "BE/SequenceInterfaces.h"
+#include "FX/EffectCatalogue.h"
 #include "ML/IMutableCutlist.h"
 #include "ML/RenderFlags.h"
 #include "ML/RenderableNodeCompositorImpl.h"
@@ -13,6 +14,7 @@
 #include "factory/CutlistMerge.h"
 #include "factory/SegmentSweep.h"
 #include "factory/TransitionPlacement.h"
+#include "graph/RenderableNodeEffectImpl.h"
 #include "graph/RenderableNodeTransitionImpl.h"
 #include "graph/SequenceNodes.h"
 
@@ -215,10 +217,36 @@ public:
         ClipNodeSetup clip;
         clip.mTrackItem = item;
         clip.mInput = CreateMediaNode(media);
+        clip.mOperators = EffectNodes(Require(item).GetSettings(), inContext, media.mStreamLabel);
         clip.mTrackID = inTrack.mTrackIndex;
         NodeRef node = CreateClipNode(clip);
         mClips.emplace(item.Get(), node);
         return node;
+    }
+
+    // The sealed effect nodes of an item's effects, in order; its opacity
+    // and motion are the clip's own keyframes, not operators. An effect the
+    // catalogue refuses throws QRT::Exception naming the effect.
+    static std::vector<NodeRef> EffectNodes(const BE::TrackItemSettings& inItem,
+                                            const BuildContext& inContext,
+                                            const std::string& inStreamLabel)
+    {
+        std::vector<NodeRef> nodes;
+        for (const BE::EffectSettings& effect : inItem.mEffects)
+        {
+            if (effect.mMatchName == FX::kMatch_Opacity || effect.mMatchName == FX::kMatch_Motion)
+                continue;
+            FX::EffectMade made = FX::CreateEffect(effect, inItem.mEnd - inItem.mStart);
+            if (!made.mEffect)
+                throw QRT::Exception("the track item's effect cannot be made: " + made.mError,
+                                     QRT::kResult_NotFound);
+            EffectNodeSetup setup;
+            setup.mEffect = std::move(made.mEffect);
+            setup.mFrameRate = inContext.mSettings.mFrameRate;
+            setup.mStreamLabel = inStreamLabel;
+            nodes.push_back(CreateEffectNode(setup));
+        }
+        return nodes;
     }
 
     // The whole cutlist of a nested-sequence media (empty for other media).

@@ -118,8 +118,8 @@ public:
             return conformed;
         for (const QRT::InterfaceRef<IRenderableNodeOperator>& effect : mSetup.mOperators)
         {
-            const QRT::Result status =
-                effect->ApplyOperator(inTime, mapped, inParams, NoLayerInputs(), frame, 0);
+            const QRT::Result status = effect->ApplyOperator(OperatorTime(inTime), mapped, inParams,
+                                                             NoLayerInputs(), frame, 0);
             if (QRT::Failed(status))
                 return status;
         }
@@ -150,6 +150,14 @@ protected:
     ~ClipNodeProducer() = default;
 
 private:
+    // The clip time the operators render at: the held time for a frame hold
+    // with filters, else the requested time.
+    MF::FrameTime OperatorTime(const MF::FrameTime& inTime) const
+    {
+        return mSetup.mOperatorHoldTime.IsValid() ? MF::FrameTime(mSetup.mOperatorHoldTime)
+                                                  : inTime;
+    }
+
     QRT::Guid ComputeHash(const MF::FrameTime& inTime, const CutlistRenderParams& inParams)
     {
         QRT::HashValue hash;
@@ -162,11 +170,14 @@ private:
             mSetup.mInput->GetFrameHash(inputHash, MapClipTime(mSetup, inTime), inParams);
             QRT::MixHash::MixInGuid(hash, inputHash);
         }
-        const MF::FrameTime mapped = MapThroughTransform(mSetup, inTime);
+        // Effects are keyed in the clip's time and render at it (ApplyOperator's
+        // output time), so their hashes take that time, not the input's: a
+        // frame hold without filters or a re-timing maps many clip times to
+        // one input time while an animated effect still changes.
         for (const QRT::InterfaceRef<IRenderableNodeOperator>& effect : mSetup.mOperators)
         {
             QRT::Guid operatorHash;
-            effect->GetOperatorHash(operatorHash, mapped, inParams);
+            effect->GetOperatorHash(operatorHash, OperatorTime(inTime), inParams);
             QRT::MixHash::MixInGuid(hash, operatorHash);
         }
         return QRT::HashValueToGuid(hash);

@@ -156,6 +156,7 @@ void RenderableNodeClipImpl::GetProducer(QRT::InterfaceRef<IRenderableNodeProduc
     if (const auto provider = QRT::QueryRef<IRenderableNodeProducerProvider>(input))
         provider->GetProducer(setup.mInput, MapClipTime(setup, inTime), inParams);
     setup.mOperators = MakeOperators(GetOperators(), 0, GetOperators().size(), inTime, inParams);
+    setup.mOperatorHoldTime = mHoldClipTime;
     outProducer = CreateClipNodeProducer(std::move(setup));
 }
 

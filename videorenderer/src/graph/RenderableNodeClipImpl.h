@@ -54,6 +54,9 @@ struct ClipProducerSetup
     QRT::InterfaceRef<IRenderableNodeProducer> mInput;
     // In application order.
     std::vector<QRT::InterfaceRef<IRenderableNodeOperator>> mOperators;
+    // With a frame hold whose filters apply: the clip time the operators are
+    // evaluated at (as the motion is); kTime_Invalid otherwise.
+    mvxmediatypes::TickTime mOperatorHoldTime = mvxmediatypes::kTime_Invalid;
     // Set only by GetProducerForOperatorsWithFixedInput: the frame the
     // operators run on in place of the input's.
     QRT::InterfaceRef<MF::IVideoFrame> mFixedFrame;

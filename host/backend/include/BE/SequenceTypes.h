@@ -135,8 +135,12 @@ struct MotionKeyframes
 struct EffectSettings
 {
     std::string mMatchName;
+    // Parameters given as text (choices, colours, flags, numbers as text).
     std::map<std::string, std::string> mParams;
     MF::BinaryData mOpaqueData;
+    // Numeric parameters given as numbers or points, constant or keyed, in
+    // the item's time.
+    std::map<std::string, KeyframeCurve> mKeyframedParams;
 
     friend bool operator==(const EffectSettings&, const EffectSettings&) = default;
 };

@@ -27,11 +27,15 @@ constexpr std::size_t kMaxNestingDepth = 64;
 class TimelineReader
 {
 public:
-    TimelineReader(const Json& inRoot, std::string inBaseFolder)
+    TimelineReader(const Json& inRoot, std::string inBaseFolder, const EffectCheck& inCheck)
         : mRoot(inRoot)
         , mBaseFolder(std::move(inBaseFolder))
+        , mCheck(inCheck)
     {
     }
+
+    // The check's warnings, each with its place.
+    std::vector<std::pair<std::string, std::string>> mWarnings;
 
     TimelineLoadResult Read();
 
@@ -55,11 +59,13 @@ private:
     void ReadTrack(const Node& inNode, const SequenceSettings& inSequence,
                    SequenceBuilder& ioBuilder);
     TrackItemSettings ReadItem(const Node& inNode, mt::FrameRate inRate, mt::TickTime inStart);
+    EffectSettings ReadEffect(const Node& inNode, mt::FrameRate inRate);
     MediaRef ReadMedia(const Node& inNode, const SequenceSettings& inSequence);
     SequenceRef NestedSequence(const Node& inNode, const std::string& inName);
 
     const Json& mRoot;
     const std::string mBaseFolder;
+    const EffectCheck& mCheck;
     std::vector<Node> mNodes;
     std::vector<Entry> mEntries;
     std::unordered_map<std::string, std::size_t> mByName;
@@ -199,13 +205,7 @@ TrackItemSettings TimelineReader::ReadItem(const Node& inNode, mt::FrameRate inR
     if (inNode.Has("clip"))
         item.mClip = ReadClip(inNode.Child("clip"), inRate);
     for (const Node& effect : inNode.Elements("effects"))
-    {
-        CheckKeys(effect.Value(), effect.Path(), {"match", "params", "opaque"});
-        EffectSettings settings{effect.String("match"), effect.StringMap("params"), {}};
-        if (effect.Has("opaque"))
-            settings.mOpaqueData = MF::BinaryData::FromText(effect.String("opaque"));
-        item.mEffects.push_back(std::move(settings));
-    }
+        item.mEffects.push_back(ReadEffect(effect, inRate));
     for (const Node& transition : inNode.Elements("transitions"))
     {
         CheckKeys(transition.Value(), transition.Path(),
@@ -223,6 +223,48 @@ TrackItemSettings TimelineReader::ReadItem(const Node& inNode, mt::FrameRate inR
         item.mTransitions.push_back(std::move(settings));
     }
     return item;
+}
+
+// Parameters: text stays text; a number, a point or a key list is a curve
+// (a point when its value, or its first key's value, is a pair).
+EffectSettings TimelineReader::ReadEffect(const Node& inNode, mt::FrameRate inRate)
+{
+    constexpr double kFar = 1.0e9;
+    CheckKeys(inNode.Value(), inNode.Path(), {"match", "params", "opaque"});
+    EffectSettings settings;
+    settings.mMatchName = inNode.String("match");
+    if (inNode.Has("params"))
+    {
+        const Node params = inNode.Child("params");
+        if (!params.Value().is_object())
+            WrongType(params.Value(), params.Path(), "an object");
+        for (const auto& [key, value] : params.Value().items())
+        {
+            if (value.is_string())
+            {
+                settings.mParams[key] = value.get<std::string>();
+                continue;
+            }
+            const Json& sample = value.is_array() && !value.empty() && value[0].is_object()
+                                     ? value[0].value("value", Json())
+                                     : value;
+            const KeyframeCurve shape =
+                sample.is_array() ? KeyframeCurve::Point({0.0, 0.0}) : KeyframeCurve::Scalar(0.0);
+            settings.mKeyframedParams[key] =
+                ReadCurve(params.Child(key), shape, inRate, -kFar, kFar);
+        }
+    }
+    if (inNode.Has("opaque"))
+        settings.mOpaqueData = MF::BinaryData::FromText(inNode.String("opaque"));
+    if (mCheck)
+    {
+        const EffectCheckResult checked = mCheck(settings);
+        if (!checked.mError.empty())
+            Fail(inNode.PathOf("match"), checked.mError);
+        for (const std::string& warning : checked.mWarnings)
+            mWarnings.emplace_back(inNode.Path(), warning);
+    }
+    return settings;
 }
 
 SequenceRef TimelineReader::NestedSequence(const Node& inNode, const std::string& inName)
@@ -331,7 +373,7 @@ std::string Located(const std::string& inFileName, std::optional<int> inLine)
 } // namespace
 
 TimelineLoadResult ParseTimeline(std::string_view inText, const std::string& inFileName,
-                                 const std::string& inBaseFolder)
+                                 const std::string& inBaseFolder, const EffectCheck& inCheck)
 {
     TimelineLoadResult result;
     Json root;
@@ -355,7 +397,12 @@ TimelineLoadResult ParseTimeline(std::string_view inText, const std::string& inF
     }
     try
     {
-        return TimelineReader(root, inBaseFolder).Read();
+        TimelineReader reader(root, inBaseFolder, inCheck);
+        result = reader.Read();
+        for (const auto& [place, warning] : reader.mWarnings)
+            result.mWarnings.push_back(Located(inFileName, FindLineOfValue(inText, place)) + ": " +
+                                       place + ": " + warning);
+        return result;
     }
     catch (const Failure& failure)
     {
@@ -366,7 +413,7 @@ TimelineLoadResult ParseTimeline(std::string_view inText, const std::string& inF
     return result;
 }
 
-TimelineLoadResult LoadTimelineFile(const std::string& inPath)
+TimelineLoadResult LoadTimelineFile(const std::string& inPath, const EffectCheck& inCheck)
 {
     std::ifstream file(inPath, std::ios::binary);
     std::ostringstream text;
@@ -379,7 +426,7 @@ TimelineLoadResult LoadTimelineFile(const std::string& inPath)
         return result;
     }
     const std::filesystem::path folder = std::filesystem::path(inPath).parent_path();
-    return ParseTimeline(text.str(), inPath, folder.empty() ? "." : folder.string());
+    return ParseTimeline(text.str(), inPath, folder.empty() ? "." : folder.string(), inCheck);
 }
 
 } // namespace BE

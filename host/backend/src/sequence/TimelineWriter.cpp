@@ -191,8 +191,17 @@ Json ItemJson(const ITrackItem& inItem, const SequenceSettings& inSequence)
     {
         Json entry;
         entry["match"] = effect.mMatchName;
-        if (!effect.mParams.empty())
-            entry["params"] = effect.mParams;
+        Json params = Json::object();
+        for (const auto& [key, text] : effect.mParams)
+            params[key] = text;
+        // A default of the other dimension never equals the curve, so each is written.
+        for (const auto& [key, curve] : effect.mKeyframedParams)
+            PutCurve(params, key.c_str(), curve,
+                     curve.GetDimension() == 1 ? KeyframeCurve::Point({0.0, 0.0})
+                                               : KeyframeCurve::Scalar(0.0),
+                     rate);
+        if (!params.empty())
+            entry["params"] = std::move(params);
         if (!effect.mOpaqueData.IsEmpty())
             entry["opaque"] = TextOf(effect.mOpaqueData);
         item["effects"].push_back(std::move(entry));
