@@ -83,14 +83,23 @@ mvxmediatypes::TickTime EffectBase::GetDuration() const
 
 QRT::Result EffectBase::Render(const RenderContext& inContext,
                                QRT::InterfaceRef<MF::IVideoFrame>& ioFrame,
-                               const LayerFrames& /*inLayers*/)
+                               const LayerInputs& /*inLayers*/)
+{
+    return Stage(inContext, ioFrame,
+                 [&](QRT::InterfaceRef<MF::IVideoFrame>& ioStaged)
+                 { return RenderStaged(inContext, ioStaged); });
+}
+
+QRT::Result EffectBase::Stage(const RenderContext& inContext,
+                              QRT::InterfaceRef<MF::IVideoFrame>& ioFrame,
+                              const StagedRender& inRender)
 {
     if (!ioFrame)
         return QRT::kResult_NotFound;
     const mvxmediatypes::PixelFormat format = ioFrame->GetPixelFormat();
     if (format == mvxmediatypes::kPixelFormat_BGRA_4444_8u ||
         format == mvxmediatypes::kPixelFormat_BGRA_4444_32f)
-        return RenderStaged(inContext, ioFrame);
+        return inRender(ioFrame);
 
     const QRT::ParamRect bounds = ioFrame->GetBounds();
     QRT::InterfaceRef<MF::IVideoFrame> staged = VF::CreateVideoFrame(
@@ -102,7 +111,7 @@ QRT::Result EffectBase::Render(const RenderContext& inContext,
     QRT::Result status = VF::VideoFrameManipulators::CopyFrame(ioFrame, staged, quality);
     if (QRT::Failed(status))
         return status;
-    status = RenderStaged(inContext, staged);
+    status = inRender(staged);
     if (QRT::Failed(status))
         return status;
     QRT::InterfaceRef<MF::IVideoFrame> result = ioFrame->CreateEmptyFrame(false);

@@ -12,6 +12,7 @@
 #include <array>
 #include <cmath>
 #include <cstdint>
+#include <functional>
 #include <optional>
 #include <span>
 #include <string_view>
@@ -77,7 +78,15 @@ public:
     // Stages a frame of another format as BGRA float, renders it with
     // RenderStaged and converts the result back.
     QRT::Result Render(const RenderContext& inContext, QRT::InterfaceRef<MF::IVideoFrame>& ioFrame,
-                       const LayerFrames& inLayers) override;
+                       const LayerInputs& inLayers) override;
+
+    // A render on a BGRA 8-bit or float frame (straight alpha).
+    using StagedRender = std::function<QRT::Result(QRT::InterfaceRef<MF::IVideoFrame>&)>;
+    // Runs inRender on ioFrame itself when it is BGRA, otherwise on a float
+    // BGRA copy that is converted back into a new frame of ioFrame's format.
+    static QRT::Result Stage(const RenderContext& inContext,
+                             QRT::InterfaceRef<MF::IVideoFrame>& ioFrame,
+                             const StagedRender& inRender);
 
 protected:
     ~EffectBase() = default;
@@ -225,6 +234,7 @@ void AddGeometryEffects(std::vector<EffectEntry>& ioEntries);
 void AddBlurEffects(std::vector<EffectEntry>& ioEntries);
 void AddOverlayEffects(std::vector<EffectEntry>& ioEntries);
 void AddPinEffects(std::vector<EffectEntry>& ioEntries);
+void AddMatteEffects(std::vector<EffectEntry>& ioEntries);
 
 } // namespace FX::detail
 

@@ -23,6 +23,7 @@ const std::vector<EffectEntry>& Entries()
         std::vector<EffectEntry> entries;
         detail::AddColorEffects(entries);
         detail::AddKeyEffects(entries);
+        detail::AddMatteEffects(entries);
         detail::AddGeometryEffects(entries);
         detail::AddBlurEffects(entries);
         detail::AddPinEffects(entries);

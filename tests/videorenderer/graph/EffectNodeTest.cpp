@@ -46,7 +46,7 @@ public:
     bool IsReentrant() const override { return true; }
     std::uint32_t GetInstanceID() const override { return 0; }
     QRT::Result Render(const FX::RenderContext&, QRT::InterfaceRef<MF::IVideoFrame>&,
-                       const FX::LayerFrames&) override
+                       const FX::LayerInputs&) override
     {
         return QRT::kResult_Success;
     }

@@ -8,6 +8,7 @@
 #include "MF/FrameTime.h"
 #include "MF/IVideoFrame.h"
 #include "ML/CutlistRenderParams.h"
+#include "ML/SubTreeRender.h"
 #include "QRT/Guid.h"
 #include "QRT/InterfaceRef.h"
 #include "QRT/QRTUnknown.h"
@@ -18,10 +19,6 @@
 
 namespace ML
 {
-
-// Renders a part of a node tree (a layer input of an effect or a side of a
-// transition) at the time its consumer asks for.
-class SubTreeRender;
 
 // The layer inputs handed to an operator, in the effect's layer order.
 using SubTreeRenderList = std::vector<QRT::InterfaceRef<SubTreeRender>>;

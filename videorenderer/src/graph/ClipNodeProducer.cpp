@@ -22,15 +22,6 @@ using FrameRef = QRT::InterfaceRef<MF::IVideoFrame>;
 
 constexpr std::string_view kFrameHashText = "ClipNodeProducer FrameHash";
 
-// The layer inputs handed to operators. No effect of this module reads other
-// layers, so every operator gets none. Made once and never destroyed: the
-// subtree renderers a list holds are declared but not defined here.
-const SubTreeRenderList& NoLayerInputs()
-{
-    static const SubTreeRenderList* const sNone = new SubTreeRenderList();
-    return *sNone;
-}
-
 // Clip time to the transform's time, before a time-invariant input is sent
 // to time 0.
 MF::FrameTime MapThroughTransform(const ClipProducerSetup& inSetup, const MF::FrameTime& inTime)
@@ -116,10 +107,10 @@ public:
         const QRT::Result conformed = Conform(frame, inParams, quality);
         if (QRT::Failed(conformed))
             return conformed;
-        for (const QRT::InterfaceRef<IRenderableNodeOperator>& effect : mSetup.mOperators)
+        for (std::size_t i = 0; i < mSetup.mOperators.size(); ++i)
         {
-            const QRT::Result status = effect->ApplyOperator(OperatorTime(inTime), mapped, inParams,
-                                                             NoLayerInputs(), frame, 0);
+            const QRT::Result status = mSetup.mOperators[i]->ApplyOperator(
+                OperatorTime(inTime), mapped, inParams, mSetup.mLayerInputs[i], frame, 0);
             if (QRT::Failed(status))
                 return status;
         }

@@ -10,6 +10,7 @@
 #include "QRT/Hash.h"
 #include "graph/ClipTimeTransforms.h"
 #include "graph/RenderableNodeMediaImpl.h"
+#include "graph/RenderableNodeSubtreeImpl.h"
 
 #include <algorithm>
 #include <cmath>
@@ -27,13 +28,12 @@ QRT::ImmutableString Key(const char* inName)
     return QRT::ImmutableString::CreateStatic(inName);
 }
 
-// One operator per operator node, made for the request.
-std::vector<QRT::InterfaceRef<IRenderableNodeOperator>>
-MakeOperators(const std::vector<QRT::InterfaceRef<MF::IRenderableNode>>& inNodes,
-              std::size_t inFirst, std::size_t inCount, const MF::FrameTime& inTime,
-              const CutlistRenderParams& inParams)
+// One operator per operator node, made for the request, each with the
+// renderers of the layers it reads.
+void MakeOperators(const std::vector<QRT::InterfaceRef<MF::IRenderableNode>>& inNodes,
+                   std::size_t inFirst, std::size_t inCount, const MF::FrameTime& inTime,
+                   const CutlistRenderParams& inParams, ClipProducerSetup& ioSetup)
 {
-    std::vector<QRT::InterfaceRef<IRenderableNodeOperator>> operators;
     for (std::size_t i = inFirst; i < inFirst + inCount; ++i)
     {
         const auto provider = QRT::QueryRef<IRenderableNodeOperatorProvider>(inNodes[i]);
@@ -41,10 +41,11 @@ MakeOperators(const std::vector<QRT::InterfaceRef<MF::IRenderableNode>>& inNodes
             continue;
         QRT::InterfaceRef<IRenderableNodeOperator> made;
         provider->CreateOperator(made, inTime, inParams);
-        if (made)
-            operators.push_back(std::move(made));
+        if (!made)
+            continue;
+        ioSetup.mOperators.push_back(std::move(made));
+        ioSetup.mLayerInputs.push_back(CreateLayerInputs(*inNodes[i], inParams));
     }
-    return operators;
 }
 
 } // namespace
@@ -155,7 +156,7 @@ void RenderableNodeClipImpl::GetProducer(QRT::InterfaceRef<IRenderableNodeProduc
     setup.mInputTimeInvariant = (input->GetRenderFlags() & kRenderFlag_TimeInvariant) != 0;
     if (const auto provider = QRT::QueryRef<IRenderableNodeProducerProvider>(input))
         provider->GetProducer(setup.mInput, MapClipTime(setup, inTime), inParams);
-    setup.mOperators = MakeOperators(GetOperators(), 0, GetOperators().size(), inTime, inParams);
+    MakeOperators(GetOperators(), 0, GetOperators().size(), inTime, inParams, setup);
     setup.mOperatorHoldTime = mHoldClipTime;
     outProducer = CreateClipNodeProducer(std::move(setup));
 }
@@ -193,8 +194,7 @@ void RenderableNodeClipImpl::GetProducerForOperatorsWithFixedInput(
     setup.mOffset = GetInputs().front().second;
     setup.mTransform = mTransform;
     setup.mNodeHash = QRT::HashValueToGuid(hash);
-    setup.mOperators =
-        MakeOperators(GetOperators(), inFirst, inCount, params.GetFrameTime(), params);
+    MakeOperators(GetOperators(), inFirst, inCount, params.GetFrameTime(), params, setup);
     setup.mFixedFrame = inFrame;
     outProducer = CreateClipNodeProducer(std::move(setup));
 }

@@ -54,6 +54,8 @@ struct ClipProducerSetup
     QRT::InterfaceRef<IRenderableNodeProducer> mInput;
     // In application order.
     std::vector<QRT::InterfaceRef<IRenderableNodeOperator>> mOperators;
+    // Parallel to mOperators: the layers each operator reads.
+    std::vector<SubTreeRenderList> mLayerInputs;
     // With a frame hold whose filters apply: the clip time the operators are
     // evaluated at (as the motion is); kTime_Invalid otherwise.
     mvxmediatypes::TickTime mOperatorHoldTime = mvxmediatypes::kTime_Invalid;

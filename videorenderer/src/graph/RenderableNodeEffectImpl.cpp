@@ -4,6 +4,7 @@
 
 #include "ML/MatchNames.h"
 #include "ML/RenderFlags.h"
+#include "ML/SubTreeRender.h"
 #include "QRT/Allocated.h"
 #include "QRT/Exception.h"
 #include "QRT/Hash.h"
@@ -66,12 +67,10 @@ public:
         return QRT::InterfaceRef<IRenderableNodeOperator>(this);
     }
 
-    QRT::Result ApplyOperator(const MF::FrameTime& inOutputTime,
-                              const MF::FrameTime& /*inInputTime*/,
-                              const CutlistRenderParams& /*inParams*/,
-                              const SubTreeRenderList& /*inLayerInputs*/,
-                              QRT::InterfaceRef<MF::IVideoFrame>& ioFrame,
-                              std::uint32_t inFlags) override
+    QRT::Result
+    ApplyOperator(const MF::FrameTime& inOutputTime, const MF::FrameTime& /*inInputTime*/,
+                  const CutlistRenderParams& /*inParams*/, const SubTreeRenderList& inLayerInputs,
+                  QRT::InterfaceRef<MF::IVideoFrame>& ioFrame, std::uint32_t inFlags) override
     {
         if (!mSetup.mEffect)
             throw QRT::NullInterfaceException();
@@ -81,10 +80,14 @@ public:
         context.mDurationFrames = mSetup.mDuration.ToFrame64(mSetup.mFrameRate);
         context.mFrameRate = mSetup.mFrameRate;
         context.mFlags = inFlags;
+        FX::LayerInputs layers;
+        layers.reserve(inLayerInputs.size());
+        for (const QRT::InterfaceRef<SubTreeRender>& layer : inLayerInputs)
+            layers.emplace_back(layer.Get());
         if (!mSetup.mRenderLock)
-            return mSetup.mEffect->Render(context, ioFrame, {});
+            return mSetup.mEffect->Render(context, ioFrame, layers);
         const std::lock_guard<std::mutex> lock(*mSetup.mRenderLock);
-        return mSetup.mEffect->Render(context, ioFrame, {});
+        return mSetup.mEffect->Render(context, ioFrame, layers);
     }
 
     QRT::Result GetOperatorHash(QRT::Guid& outHash, const MF::FrameTime& inTime,
@@ -187,6 +190,20 @@ void RenderableNodeEffectImpl::SetEffect(const QRT::InterfaceRef<FX::IEffect>& i
     SetTypedProperty(Key("EffectNode::RuntimeInstanceID"), inEffect->GetInstanceID(), false);
 }
 
+void RenderableNodeEffectImpl::SetLayerInputs(const std::vector<EffectLayerInput>& inLayers)
+{
+    std::string hashes;
+    for (const EffectLayerInput& layer : inLayers)
+    {
+        if (!layer.mNode)
+            throw QRT::NullInterfaceException();
+        AddInput(layer.mNode, layer.mOffset);
+        hashes +=
+            layer.mNode->GetNodeHash().ToString() + "@" + FormatPropertyValue(layer.mOffset) + "\n";
+    }
+    SetProperty(Key("EffectNode::LayerInputHashes"), hashes, true);
+}
+
 void RenderableNodeEffectImpl::CreateOperator(
     QRT::InterfaceRef<IRenderableNodeOperator>& outOperator, const MF::FrameTime& inTime,
     const CutlistRenderParams& inParams) const
@@ -232,6 +249,7 @@ QRT::InterfaceRef<MF::IRenderableNode> CreateEffectNode(const EffectNodeSetup& i
     const QRT::InterfaceRef<RenderableNodeEffectImpl> node =
         QRT::Allocated<RenderableNodeEffectImpl>::CreateInstance();
     node->SetEffect(inSetup.mEffect, inSetup.mFrameRate, inSetup.mStreamLabel);
+    node->SetLayerInputs(inSetup.mLayerInputs);
     node->MakeImmutable();
     return node->GetSelfReference();
 }

@@ -8,11 +8,18 @@
 //   empty), "EffectNode::EffectDuration" (when the effect has one),
 //   "EffectNode::FilterOpaqueData" (when it has some), "EffectNode::FilterParams"
 //   (the parameter count and a line feed, then each parameter's text and a
-//   line feed), "EffectNode::RuntimeInstanceID" (unhashed).
+//   line feed), "EffectNode::RuntimeInstanceID" (unhashed); SetLayerInputs
+//   then "EffectNode::LayerInputHashes" (one line per layer the effect
+//   reads: the layer node's hash, "@" and its offset in ticks), only when
+//   there is a layer.
+//
+// Layer inputs are the node's inputs: each a sealed subtree of another
+// track at the offset of its time origin from the clip's time. The clip
+// producer hands them to the operator as subtree renderers.
 //
 // Render flags: 4, plus 8 unless the effect varies with time (the effect
 // says so, a parameter is animated, or a layer parameter reads a layer at
-// time 0), plus 64 (no effect reads layers yet).
+// time 0), plus 64 unless the node has "EffectNode::LayerInputHashes".
 //
 // Built and sealed by one thread (CreateEffectNode), read by any afterwards.
 // Operators are made per request. An effect that may not render several
@@ -27,9 +34,18 @@
 #include <memory>
 #include <mutex>
 #include <string>
+#include <vector>
 
 namespace ML
 {
+
+// A layer an effect reads: the layer's sealed subtree and the offset of its
+// time origin from the effect's clip time.
+struct EffectLayerInput
+{
+    QRT::InterfaceRef<MF::IRenderableNode> mNode;
+    mvxmediatypes::TickTime mOffset = mvxmediatypes::kTime_Zero;
+};
 
 class RenderableNodeEffectImpl
     : public RenderableNodeWithInterfaces<RenderableNodeCommonImpl, IRenderableNodeOperatorProvider,
@@ -46,6 +62,11 @@ public:
     // QRT::NullInterfaceException. Input contract "mMutable".
     void SetEffect(const QRT::InterfaceRef<FX::IEffect>& inEffect,
                    mvxmediatypes::FrameRate inFrameRate, const std::string& inStreamLabel);
+
+    // Adds inLayers as the node's inputs and writes
+    // "EffectNode::LayerInputHashes" (nothing without layers). An empty node
+    // throws QRT::NullInterfaceException. Input contract "mMutable".
+    void SetLayerInputs(const std::vector<EffectLayerInput>& inLayers);
 
     // --- IRenderableNodeOperatorProvider ---------------------------------------------
     // Empty for opacity and motion; otherwise a new EffectNodeOperator.
@@ -79,6 +100,8 @@ struct EffectNodeSetup
     QRT::InterfaceRef<FX::IEffect> mEffect;
     mvxmediatypes::FrameRate mFrameRate = mvxmediatypes::kFrameRate_Video25;
     std::string mStreamLabel;
+    // The layers the effect reads, in its layer order.
+    std::vector<EffectLayerInput> mLayerInputs;
 };
 
 // A sealed "RenderableNodeEffectImpl".

@@ -96,8 +96,27 @@ struct RenderContext
     std::uint32_t mFlags = 0;
 };
 
-// The frames of the layers an effect reads, in its layer parameters' order.
-using LayerFrames = std::vector<QRT::InterfaceRef<MF::IVideoFrame>>;
+// A layer of the sequence that an effect reads (a track matte's track, say),
+// handed to Render by the renderer. Used by the thread that renders the
+// effect, during that render only.
+class ILayerInput : public QRT::QRTUnknown
+{
+public:
+    QRT_INTERFACE_ID("{b6e2c04d-58a1-4f3e-9d27-7c1a9e5f0b36}");
+
+    // The layer's picture at inTime (the effect's own item time), drawn
+    // through the layer's motion at the render's size and format. outFrame
+    // is empty where the layer shows nothing. Answers 0 or the layer's
+    // negative status.
+    virtual QRT::Result RenderLayer(mvxmediatypes::TickTime inTime,
+                                    QRT::InterfaceRef<MF::IVideoFrame>& outFrame) = 0;
+
+protected:
+    ~ILayerInput() = default;
+};
+
+// The layers an effect reads, in its layer parameters' order.
+using LayerInputs = std::vector<QRT::InterfaceRef<ILayerInput>>;
 
 class IEffect : public QRT::QRTUnknown
 {
@@ -118,11 +137,12 @@ public:
     virtual bool IsReentrant() const = 0;
     // Unique among the effects of one process.
     virtual std::uint32_t GetInstanceID() const = 0;
-    // Renders onto ioFrame (which may be replaced). Answers 0, or a negative
-    // status (kIR_UnsupportedFormat for a format that cannot be staged).
+    // Renders onto ioFrame (which may be replaced), asking inLayers for the
+    // pictures of the layers it reads. Answers 0, or a negative status
+    // (kIR_UnsupportedFormat for a format that cannot be staged).
     virtual QRT::Result Render(const RenderContext& inContext,
                                QRT::InterfaceRef<MF::IVideoFrame>& ioFrame,
-                               const LayerFrames& inLayers) = 0;
+                               const LayerInputs& inLayers) = 0;
 
 protected:
     ~IEffect() = default;
