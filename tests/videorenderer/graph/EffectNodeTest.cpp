@@ -59,7 +59,7 @@ private:
 
 NodeRef Node(const QRT::InterfaceRef<FX::IEffect>& inEffect, const std::string& inLabel = {})
 {
-    return CreateEffectNode({inEffect, mt::kFrameRate_Video25, inLabel});
+    return CreateEffectNode({inEffect, mt::kFrameRate_Video25, inLabel, {}});
 }
 
 NodeRef Node(const BE::EffectSettings& inSettings, std::optional<TickTime> inDuration = {})

@@ -22,6 +22,7 @@
 #include "QRT/Guid.h"
 #include "QRT/InterfaceRef.h"
 
+#include <cstddef>
 #include <cstdint>
 #include <vector>
 
@@ -121,9 +122,16 @@ public:
 protected:
     ~CompositorProducer() = default;
 
-    // The layers composited bottom-up, without the single-field step.
+    // The first inLayerCount layers composited bottom-up, without the
+    // single-field step.
     QRT::Result CompositeLayers(const MF::FrameTime& inTime, const CutlistRenderParams& inParams,
-                                QRT::InterfaceRef<MF::IVideoFrame>& outFrame);
+                                QRT::InterfaceRef<MF::IVideoFrame>& outFrame,
+                                std::size_t inLayerCount = SIZE_MAX);
+    // The single-field step: when only one field is needed, an interlaced
+    // inFrame reduced to it; otherwise inFrame.
+    static QRT::InterfaceRef<MF::IVideoFrame>
+    KeepNeededField(QRT::InterfaceRef<MF::IVideoFrame> inFrame,
+                    const CutlistRenderParams& inParams);
 
 private:
     const QRT::Guid mNodeHash;

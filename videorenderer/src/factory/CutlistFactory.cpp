@@ -14,13 +14,17 @@
 #include "factory/CutlistMerge.h"
 #include "factory/SegmentSweep.h"
 #include "factory/TransitionPlacement.h"
+#include "graph/RenderableNodeAdjustmentImpl.h"
 #include "graph/RenderableNodeEffectImpl.h"
 #include "graph/RenderableNodeTransitionImpl.h"
 #include "graph/SequenceNodes.h"
 
 #include <algorithm>
 #include <map>
+#include <optional>
+#include <set>
 #include <string>
+#include <tuple>
 #include <utility>
 #include <vector>
 
@@ -80,6 +84,47 @@ struct TrackItems
     std::vector<TrackPiece> mPieces;
 };
 
+// The track indices that an item's layer effects read (a track matte's
+// matte track, a difference matte's layer), in effect and parameter order.
+std::vector<std::uint32_t> LayerTracksOf(const BE::TrackItemSettings& inItem)
+{
+    std::vector<std::uint32_t> layers;
+    for (const BE::EffectSettings& effect : inItem.mEffects)
+    {
+        if (effect.mMatchName == FX::kMatch_Opacity || effect.mMatchName == FX::kMatch_Motion)
+            continue;
+        const FX::EffectMade made = FX::CreateEffect(effect);
+        if (!made.mEffect)
+            continue;
+        for (std::uint32_t i = 0; i < made.mEffect->GetParamCount(); ++i)
+        {
+            const FX::EffectParam& param = made.mEffect->GetParam(i);
+            const double track = param.ValueAt(kTime_Zero);
+            if (param.mType == FX::ParamType::kLayer && track >= 0.0 && track < FX::kNoLayer)
+                layers.push_back(static_cast<std::uint32_t>(track));
+        }
+    }
+    return layers;
+}
+
+// A piece of a track active in a segment.
+struct PieceRef
+{
+    const TrackItems* mTrack = nullptr;
+    std::size_t mPiece = 0;
+
+    friend auto operator<=>(const PieceRef&, const PieceRef&) = default;
+};
+
+// The pieces of one segment by track index, where layer effects find their
+// layers. Empty for the subtrees of layers themselves: a layer's own layer
+// effects read nothing, so that layers never read each other in a cycle.
+using SegmentLayers = std::map<std::uint32_t, PieceRef>;
+
+// What a subtree's layer effects read: the piece of each layer track (a null
+// track where the segment has none), in the order LayerTracksOf gives.
+using LayerKey = std::vector<PieceRef>;
+
 // The work of one factory operation: the trees of one sequence and of the
 // sequences it nests, every item's clip subtree and every nested cutlist
 // built once.
@@ -127,21 +172,91 @@ public:
                 for (const ActiveItem& active : segment.mActive)
                     origin = std::min(origin, tracks[active.mTrack].mPieces[active.mItem].mAnchor);
                 const QRT::InterfaceRef<RenderableNodeCompositorImpl> compositor =
-                    RenderableNodeCompositorImpl::Create();
-                for (const ActiveItem& active : segment.mActive)
-                {
-                    const TrackItems& track = tracks[active.mTrack];
-                    const TrackPiece& piece = track.mPieces[active.mItem];
-                    compositor->AddTrackInput(PieceSubtree(track, active.mItem, inContext),
-                                              piece.mAnchor - origin, track.mTrackIndex);
-                }
-                compositor->MakeImmutable();
+                    SegmentTree(tracks, segment.mActive, origin, inContext);
                 cutlist->AddSegment(segment.mStart, segment.mEnd, segment.mStart - origin,
                                     compositor->GetSelfReference());
             }
         }
         cutlist->MakeImmutable();
         return cutlist;
+    }
+
+    // The tree of one segment: the active pieces bottom first in one
+    // compositor, except that an adjustment item closes the compositor built
+    // so far into an adjustment node, which becomes the first input of a new
+    // compositor for the tracks above; and a track that a layer effect of
+    // another active item reads is that effect's layer only, not drawn.
+    QRT::InterfaceRef<RenderableNodeCompositorImpl>
+    SegmentTree(const std::vector<TrackItems>& inTracks, const std::vector<ActiveItem>& inActive,
+                TickTime inOrigin, const BuildContext& inContext)
+    {
+        SegmentLayers layers;
+        for (const ActiveItem& active : inActive)
+            layers[inTracks[active.mTrack].mTrackIndex] = {&inTracks[active.mTrack], active.mItem};
+        std::set<std::uint32_t> readAsLayers;
+        for (const ActiveItem& active : inActive)
+        {
+            const TrackItems& track = inTracks[active.mTrack];
+            for (const std::size_t item : PieceItems(track.mPieces[active.mItem]))
+                for (const std::uint32_t layer : LayerTracksOf(track.mItems[item]->GetSettings()))
+                    if (layer != track.mTrackIndex && layers.contains(layer))
+                        readAsLayers.insert(layer);
+        }
+
+        QRT::InterfaceRef<RenderableNodeCompositorImpl> compositor =
+            RenderableNodeCompositorImpl::Create();
+        std::optional<std::uint32_t> lowest;
+        for (const ActiveItem& active : inActive)
+        {
+            const TrackItems& track = inTracks[active.mTrack];
+            const TrackPiece& piece = track.mPieces[active.mItem];
+            if (readAsLayers.contains(track.mTrackIndex))
+                continue;
+            if (!piece.IsTransition() &&
+                track.mItems[piece.mItem]->GetSettings().IsAdjustmentLayer())
+            {
+                compositor->MakeImmutable();
+                AdjustmentNodeSetup adjustment;
+                adjustment.mBelow = compositor->GetSelfReference();
+                adjustment.mBelowTrackIndex = lowest.value_or(track.mTrackIndex);
+                adjustment.mClip = ClipSetup(track, piece.mItem, inContext, layers);
+                adjustment.mClipOffset = piece.mAnchor - inOrigin;
+                compositor = RenderableNodeCompositorImpl::Create();
+                compositor->AddTrackInput(CreateAdjustmentNode(adjustment), kTime_Zero,
+                                          adjustment.mBelowTrackIndex);
+                lowest = adjustment.mBelowTrackIndex;
+                continue;
+            }
+            compositor->AddTrackInput(PieceSubtree(track, active.mItem, inContext, layers),
+                                      piece.mAnchor - inOrigin, track.mTrackIndex);
+            lowest = std::min(lowest.value_or(track.mTrackIndex), track.mTrackIndex);
+        }
+        compositor->MakeImmutable();
+        return compositor;
+    }
+
+    // The items whose clips a piece draws.
+    static std::vector<std::size_t> PieceItems(const TrackPiece& inPiece)
+    {
+        if (!inPiece.IsTransition())
+            return {inPiece.mItem};
+        std::vector<std::size_t> items;
+        for (const std::size_t item : {inPiece.mOutgoing, inPiece.mIncoming})
+            if (item != kNoItem)
+                items.push_back(item);
+        return items;
+    }
+
+    // The layers an item's layer effects read in the segment.
+    static LayerKey LayerKeyOf(const BE::TrackItemSettings& inItem, const SegmentLayers& inLayers)
+    {
+        LayerKey key;
+        for (const std::uint32_t track : LayerTracksOf(inItem))
+        {
+            const auto found = inLayers.find(track);
+            key.push_back(found != inLayers.end() ? found->second : PieceRef{});
+        }
+        return key;
     }
 
     CutlistRef BuildSequence(const QRT::InterfaceRef<BE::ISequence>& inSequence,
@@ -162,12 +277,16 @@ public:
     // The subtree of one piece of a track: the item's clip, or the
     // transition over the clips it changes between.
     NodeRef PieceSubtree(const TrackItems& inTrack, std::size_t inPiece,
-                         const BuildContext& inContext)
+                         const BuildContext& inContext, const SegmentLayers& inLayers = {})
     {
         const TrackPiece& piece = inTrack.mPieces[inPiece];
         if (!piece.IsTransition())
-            return ClipSubtree(inTrack, piece.mItem, inContext);
-        const auto found = mTransitions.find({&inTrack, inPiece});
+            return ClipSubtree(inTrack, piece.mItem, inContext, inLayers);
+        LayerKey key;
+        for (const std::size_t item : PieceItems(piece))
+            for (const PieceRef& layer : LayerKeyOf(inTrack.mItems[item]->GetSettings(), inLayers))
+                key.push_back(layer);
+        const auto found = mTransitions.find({&inTrack, inPiece, key});
         if (found != mTransitions.end())
             return found->second;
         const BE::TrackItemSettings& carrier = inTrack.mItems[piece.mCarrier]->GetSettings();
@@ -181,30 +300,41 @@ public:
         setup.mTransition = creation.mTransition;
         if (piece.mOutgoing != kNoItem)
         {
-            setup.mOutgoing = ClipSubtree(inTrack, piece.mOutgoing, inContext);
+            setup.mOutgoing = ClipSubtree(inTrack, piece.mOutgoing, inContext, inLayers);
             setup.mOutgoingOffset =
                 inTrack.mItems[piece.mOutgoing]->GetSettings().mStart - piece.mAnchor;
         }
         if (piece.mIncoming != kNoItem)
         {
-            setup.mIncoming = ClipSubtree(inTrack, piece.mIncoming, inContext);
+            setup.mIncoming = ClipSubtree(inTrack, piece.mIncoming, inContext, inLayers);
             setup.mIncomingOffset =
                 inTrack.mItems[piece.mIncoming]->GetSettings().mStart - piece.mAnchor;
         }
         NodeRef node = CreateTransitionNode(setup);
-        mTransitions.emplace(std::pair{&inTrack, inPiece}, node);
+        mTransitions.emplace(std::tuple{&inTrack, inPiece, std::move(key)}, node);
         return node;
     }
 
-    // The clip node of one item over its media node.
+    // The clip node of one item over its media node, its layer effects
+    // reading their layers from inLayers.
     NodeRef ClipSubtree(const TrackItems& inTrack, std::size_t inItem,
-                        const BuildContext& inContext)
+                        const BuildContext& inContext, const SegmentLayers& inLayers = {})
     {
         const QRT::InterfaceRef<BE::ITrackItem>& item = inTrack.mItems[inItem];
-        const auto found = mClips.find(item.Get());
+        std::pair key{item.Get(), LayerKeyOf(Require(item).GetSettings(), inLayers)};
+        const auto found = mClips.find(key);
         if (found != mClips.end())
             return found->second;
+        NodeRef node = CreateClipNode(ClipSetup(inTrack, inItem, inContext, inLayers));
+        mClips.emplace(std::move(key), node);
+        return node;
+    }
 
+    // What the clip node of one item is made of.
+    ClipNodeSetup ClipSetup(const TrackItems& inTrack, std::size_t inItem,
+                            const BuildContext& inContext, const SegmentLayers& inLayers)
+    {
+        const QRT::InterfaceRef<BE::ITrackItem>& item = inTrack.mItems[inItem];
         MediaNodeSetup media;
         media.mMedia = Require(item).GetMedia();
         media.mTrackItem = item;
@@ -217,19 +347,22 @@ public:
         ClipNodeSetup clip;
         clip.mTrackItem = item;
         clip.mInput = CreateMediaNode(media);
-        clip.mOperators = EffectNodes(Require(item).GetSettings(), inContext, media.mStreamLabel);
+        clip.mOperators = EffectNodes(Require(item).GetSettings(), inContext, media.mStreamLabel,
+                                      inLayers, inTrack.mTrackIndex);
         clip.mTrackID = inTrack.mTrackIndex;
-        NodeRef node = CreateClipNode(clip);
-        mClips.emplace(item.Get(), node);
-        return node;
+        return clip;
     }
 
     // The sealed effect nodes of an item's effects, in order; its opacity
     // and motion are the clip's own keyframes, not operators. An effect the
     // catalogue refuses throws QRT::Exception naming the effect.
-    static std::vector<NodeRef> EffectNodes(const BE::TrackItemSettings& inItem,
-                                            const BuildContext& inContext,
-                                            const std::string& inStreamLabel)
+    // A layer effect reads the segment's piece on the track its layer
+    // parameter names (not the item's own track; nothing where the segment
+    // has no piece there), built without layers of its own.
+    std::vector<NodeRef> EffectNodes(const BE::TrackItemSettings& inItem,
+                                     const BuildContext& inContext,
+                                     const std::string& inStreamLabel,
+                                     const SegmentLayers& inLayers, std::uint32_t inOwnTrack)
     {
         std::vector<NodeRef> nodes;
         for (const BE::EffectSettings& effect : inItem.mEffects)
@@ -244,6 +377,22 @@ public:
             setup.mEffect = std::move(made.mEffect);
             setup.mFrameRate = inContext.mSettings.mFrameRate;
             setup.mStreamLabel = inStreamLabel;
+            for (std::uint32_t i = 0; i < setup.mEffect->GetParamCount(); ++i)
+            {
+                const FX::EffectParam& param = setup.mEffect->GetParam(i);
+                if (param.mType != FX::ParamType::kLayer)
+                    continue;
+                const double track = param.ValueAt(kTime_Zero);
+                const auto found = track >= 0.0 && track < FX::kNoLayer
+                                       ? inLayers.find(static_cast<std::uint32_t>(track))
+                                       : inLayers.end();
+                if (found == inLayers.end() || found->first == inOwnTrack)
+                    continue;
+                const PieceRef layer = found->second;
+                setup.mLayerInputs.push_back(
+                    {PieceSubtree(*layer.mTrack, layer.mPiece, inContext),
+                     layer.mTrack->mPieces[layer.mPiece].mAnchor - inItem.mStart});
+            }
             nodes.push_back(CreateEffectNode(setup));
         }
         return nodes;
@@ -266,8 +415,8 @@ public:
     }
 
 private:
-    std::map<const BE::ITrackItem*, NodeRef> mClips;
-    std::map<std::pair<const TrackItems*, std::size_t>, NodeRef> mTransitions;
+    std::map<std::pair<const BE::ITrackItem*, LayerKey>, NodeRef> mClips;
+    std::map<std::tuple<const TrackItems*, std::size_t, LayerKey>, NodeRef> mTransitions;
     std::map<const BE::ISequence*, CutlistRef> mNested;
 };
 

@@ -13,6 +13,7 @@
 #include "render/VideoFrameCompositeUtilities.h"
 #include "sources/FieldFilterSteps.h"
 
+#include <algorithm>
 #include <string_view>
 
 namespace ML
@@ -156,11 +157,13 @@ CompositorProducer::CompositorProducer(const QRT::Guid& inNodeHash)
 
 QRT::Result CompositorProducer::CompositeLayers(const MF::FrameTime& inTime,
                                                 const CutlistRenderParams& inParams,
-                                                QRT::InterfaceRef<MF::IVideoFrame>& outFrame)
+                                                QRT::InterfaceRef<MF::IVideoFrame>& outFrame,
+                                                std::size_t inLayerCount)
 {
     QRT::InterfaceRef<MF::IVideoFrame> result;
-    for (const Layer& layer : mLayers)
+    for (std::size_t index = 0; index < std::min(inLayerCount, mLayers.size()); ++index)
     {
+        const Layer& layer = mLayers[index];
         QRT::InterfaceRef<MF::IVideoFrame> frame;
         const QRT::Result status =
             layer.mProducer->ProduceFrame(LayerTime(inTime, layer.mOffset), inParams, frame);
@@ -201,6 +204,15 @@ QRT::Result CompositorProducer::ProduceFrame(const MF::FrameTime& inTime,
     const QRT::Result status = CompositeLayers(inTime, inParams, result);
     if (QRT::Failed(status))
         return status;
+    outFrame = KeepNeededField(std::move(result), inParams);
+    return QRT::kResult_Success;
+}
+
+QRT::InterfaceRef<MF::IVideoFrame>
+CompositorProducer::KeepNeededField(QRT::InterfaceRef<MF::IVideoFrame> inFrame,
+                                    const CutlistRenderParams& inParams)
+{
+    QRT::InterfaceRef<MF::IVideoFrame> result = std::move(inFrame);
     if (result && inParams.mSingleField != 0)
     {
         const mvxmediatypes::FieldType fieldType = result->GetFieldType();
@@ -211,8 +223,7 @@ QRT::Result CompositorProducer::ProduceFrame(const MF::FrameTime& inTime,
         if (mvxmediatypes::IsInterlaced(fieldType))
             result = FieldFilterSteps::DeinterlaceKeepingField(result, inParams, keepSecondRows);
     }
-    outFrame = std::move(result);
-    return QRT::kResult_Success;
+    return result;
 }
 
 void CompositorProducer::GetFrameHash(QRT::Guid& outHash, const MF::FrameTime& inTime,
