@@ -100,8 +100,9 @@ void MultiplyAlpha(const Pixels& inPixels, const MF::IVideoFrame& inFrame, Facto
     std::uint32_t originX = 0;
     std::uint32_t originY = 0;
     inFrame.GetOriginOffset(originX, originY);
-    const auto dx = static_cast<std::int32_t>(originX);
-    const auto dy = static_cast<std::int32_t>(originY);
+    const bool hasOrigin = originX != MF::kNoOriginOffset || originY != MF::kNoOriginOffset;
+    const auto dx = hasOrigin ? static_cast<std::int32_t>(originX) : 0;
+    const auto dy = hasOrigin ? static_cast<std::int32_t>(originY) : 0;
     for (std::int32_t y = 0; y < inPixels.mHeight; ++y)
     {
         if (inPixels.mFloat)

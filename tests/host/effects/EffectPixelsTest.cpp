@@ -4,6 +4,7 @@
 // unwritten and formats staged through float.
 
 #include "FX/EffectCatalogue.h"
+#include "QRT/Allocated.h"
 #include "VF/VideoFrame.h"
 
 #include <algorithm>
@@ -59,7 +60,8 @@ FrameRef Ramp(mt::PixelFormat inFormat)
 }
 
 FrameRef Render(std::string_view inMatch, std::map<std::string, std::string> inParams,
-                FrameRef inFrame, float inScale = 1.0f)
+                FrameRef inFrame, float inScale = 1.0f, const LayerInputs& inLayers = {},
+                QRT::Result inStatus = QRT::kResult_Success)
 {
     BE::EffectSettings settings;
     settings.mMatchName = std::string(inMatch);
@@ -69,7 +71,8 @@ FrameRef Render(std::string_view inMatch, std::map<std::string, std::string> inP
     RenderContext context;
     context.mQuality = 4;
     context.mScale = inScale;
-    EXPECT_EQ(made.mEffect->Render(context, inFrame, {}), QRT::kResult_Success);
+    context.mTime = mt::TickTime::FromFrame(7, mt::kFrameRate_Video25);
+    EXPECT_EQ(made.mEffect->Render(context, inFrame, inLayers), inStatus);
     return inFrame;
 }
 
@@ -316,6 +319,64 @@ TEST(EffectPixels, ASharedFrameIsNeverWrittenAndOtherFormatsAreStaged)
         EXPECT_EQ(std::memcmp(frame->GetBaseAddress(), before.data(), before.size()), 0);
         EXPECT_NE(std::memcmp(result->GetBaseAddress(), before.data(), 4), 0);
     }
+}
+
+// A layer that answers one frame (or a status) and records the time asked.
+class FakeLayer : public QRT::Implements<ILayerInput>
+{
+public:
+    FakeLayer(FrameRef inFrame, QRT::Result inStatus)
+        : mFrame(std::move(inFrame))
+        , mStatus(inStatus)
+    {
+    }
+    QRT::Result RenderLayer(mt::TickTime inTime, FrameRef& outFrame) override
+    {
+        mAsked = inTime;
+        outFrame = mFrame;
+        return mStatus;
+    }
+    mt::TickTime mAsked = mt::kTime_Invalid;
+
+protected:
+    ~FakeLayer() = default;
+
+private:
+    FrameRef mFrame;
+    QRT::Result mStatus;
+};
+
+TEST(EffectPixels, DifferenceMatteKeysWhatMatchesTheLayerAtTheEffectsTime)
+{
+    // Red components against a layer of grey 100: differences 0, 20, 60, 100.
+    const double reds[] = {100, 120, 160, 200};
+    FrameRef grey = MakeFrame(4, 1);
+    for (int x = 0; x < 4; ++x)
+        Set(*grey, x, 0, {100, 100, 100, 255});
+    for (const bool invert : {false, true})
+    {
+        SCOPED_TRACE(invert);
+        FrameRef frame = MakeFrame(4, 1);
+        for (int x = 0; x < 4; ++x)
+            Set(*frame, x, 0, {100, 100, reds[x], 255});
+        auto layer = QRT::Allocated<FakeLayer>::CreateInstance(grey, QRT::kResult_Success);
+        const FrameRef result = Render(kMatch_DifferenceMatte,
+                                       {{"layer", "1"},
+                                        {"threshold", "10"},
+                                        {"softness", "20"},
+                                        {"invert", invert ? "true" : "false"}},
+                                       frame, 1.0f, {QRT::InterfaceRef<ILayerInput>(layer.Get())});
+        EXPECT_EQ(layer->mAsked, mt::TickTime::FromFrame(7, mt::kFrameRate_Video25));
+        for (int x = 0; x < 4; ++x)
+        {
+            const double keep = std::clamp(((reds[x] - 100) / 255 - 0.1) / 0.2, 0.0, 1.0);
+            EXPECT_NEAR(At(*result, x, 0, 3), 255 * (invert ? 1 - keep : keep), 1.0) << x;
+        }
+    }
+    // A layer's failure is the effect's.
+    auto failing = QRT::Allocated<FakeLayer>::CreateInstance(FrameRef(), QRT::kResult_NotFound);
+    Render(kMatch_TrackMatte, {{"matte", "1"}}, MakeFrame(2, 1), 1.0f,
+           {QRT::InterfaceRef<ILayerInput>(failing.Get())}, QRT::kResult_NotFound);
 }
 
 } // namespace
