@@ -1,18 +1,22 @@
-// Mattes read from another layer of the sequence: the track matte (the
-// alpha or the luma of a layer becomes the clip's alpha) and the difference
-// matte (the clip is made transparent where it matches a layer). The layer
+// Mattes: the track matte (the alpha or the luma of another layer of the
+// sequence becomes the clip's alpha), the image matte (the same with a still
+// image) and the difference matte (the clip is made transparent where it
+// matches a layer). The layer
 // is the first layer input; its picture is the layer at the effect's time,
 // drawn at the render's size, and lines up with the clip's pixels after the
 // clip frame's origin offset.
 
 #include "EffectBase.h"
 #include "FX/EffectCatalogue.h"
+#include "VF/PngFile.h"
 #include "VF/VideoFrame.h"
 #include "VF/VideoFrameManipulators.h"
 
 #include <algorithm>
 #include <cmath>
 #include <cstdint>
+#include <mutex>
+#include <string>
 #include <vector>
 
 namespace FX::detail
@@ -43,44 +47,35 @@ struct LayerPicture
     }
 };
 
-// The first layer's picture at the context's time; empty when there is no
-// layer or it shows nothing there.
-QRT::Result ReadLayer(const RenderContext& inContext, const LayerInputs& inLayers,
-                      LayerPicture& outPicture)
+// inFrame as a picture of inWidth x inHeight (scaled when its size differs).
+QRT::Result ToPicture(const FrameRef& inFrame, std::int32_t inWidth, std::int32_t inHeight,
+                      std::uint32_t inQuality, LayerPicture& outPicture)
 {
     outPicture = {};
-    if (inLayers.empty() || !inLayers.front())
-        return QRT::kResult_Success;
-    FrameRef frame;
-    QRT::Result status = inLayers.front()->RenderLayer(inContext.mTime, frame);
-    if (QRT::Failed(status) || !frame)
-        return status;
-    const QRT::ParamRect bounds = frame->GetBounds();
     FrameRef staged = VF::CreateVideoFrame(
-        mvxmediatypes::kPixelFormat_BGRA_4444_32f, static_cast<std::uint32_t>(bounds.Width()),
-        static_cast<std::uint32_t>(bounds.Height()), frame->GetPixelAspectRatio(), false, false);
+        mvxmediatypes::kPixelFormat_BGRA_4444_32f, static_cast<std::uint32_t>(inWidth),
+        static_cast<std::uint32_t>(inHeight), inFrame->GetPixelAspectRatio(), false, false);
     if (!staged)
         return kIR_UnsupportedFormat;
-    status = VF::VideoFrameManipulators::CopyFrame(
-        frame, staged, static_cast<mvxmediatypes::RenderQuality>(inContext.mQuality));
+    const QRT::Result status = VF::VideoFrameManipulators::CopyFrame(
+        inFrame, staged, static_cast<mvxmediatypes::RenderQuality>(inQuality));
     if (QRT::Failed(status))
         return status;
-    outPicture.mWidth = bounds.Width();
-    outPicture.mHeight = bounds.Height();
-    outPicture.mBgra.resize(static_cast<std::size_t>(bounds.Width()) *
-                            static_cast<std::size_t>(bounds.Height()) * 4);
-    const bool opaque = !frame->HasAlpha();
+    outPicture.mWidth = inWidth;
+    outPicture.mHeight = inHeight;
+    outPicture.mBgra.resize(static_cast<std::size_t>(inWidth) * static_cast<std::size_t>(inHeight) *
+                            4);
+    const bool opaque = !inFrame->HasAlpha();
     const bool premultiplied =
-        frame->GetAlphaChannel() == mvxmediatypes::kAlphaChannel_Premultiplied;
-    for (std::int32_t y = 0; y < bounds.Height(); ++y)
+        inFrame->GetAlphaChannel() == mvxmediatypes::kAlphaChannel_Premultiplied;
+    for (std::int32_t y = 0; y < inHeight; ++y)
     {
         const auto* row = reinterpret_cast<const float*>(
             static_cast<const std::uint8_t*>(staged->GetBaseAddress()) +
             static_cast<std::ptrdiff_t>(y) * staged->GetRowBytes());
         float* out =
-            &outPicture
-                 .mBgra[static_cast<std::size_t>(y) * static_cast<std::size_t>(bounds.Width()) * 4];
-        for (std::int32_t x = 0; x < 4 * bounds.Width(); x += 4)
+            &outPicture.mBgra[static_cast<std::size_t>(y) * static_cast<std::size_t>(inWidth) * 4];
+        for (std::int32_t x = 0; x < 4 * inWidth; x += 4)
         {
             const float alpha = opaque ? 1.0f : row[x + 3];
             const float unpremultiply = premultiplied && alpha > 0.0f ? 1.0f / alpha : 1.0f;
@@ -90,6 +85,22 @@ QRT::Result ReadLayer(const RenderContext& inContext, const LayerInputs& inLayer
         }
     }
     return QRT::kResult_Success;
+}
+
+// The first layer's picture at the context's time; empty when there is no
+// layer or it shows nothing there.
+QRT::Result ReadLayer(const RenderContext& inContext, const LayerInputs& inLayers,
+                      LayerPicture& outPicture)
+{
+    outPicture = {};
+    if (inLayers.empty() || !inLayers.front())
+        return QRT::kResult_Success;
+    FrameRef frame;
+    const QRT::Result status = inLayers.front()->RenderLayer(inContext.mTime, frame);
+    if (QRT::Failed(status) || !frame)
+        return status;
+    const QRT::ParamRect bounds = frame->GetBounds();
+    return ToPicture(frame, bounds.Width(), bounds.Height(), inContext.mQuality, outPicture);
 }
 
 // Multiplies the alpha of every pixel of inPixels by inFactor(x, y, b, g, r)
@@ -150,6 +161,25 @@ constexpr ParamSpec kTrackMatteParams[] = {
     {"invert", ParamType::kBool, 0.0, 0.0, 1.0},
 };
 
+// Multiplies the clip's alpha by inMatte's alpha, or its luma over black
+// (luma times alpha), or one minus either when inverted.
+QRT::Result ApplyMatte(const RenderContext& inContext, FrameRef& ioFrame,
+                       const LayerPicture& inMatte, bool inLuma, bool inInvert)
+{
+    return RenderAlpha(
+        inContext, ioFrame,
+        [&](const Pixels& inPixels, const MF::IVideoFrame& inFrame)
+        {
+            MultiplyAlpha(inPixels, inFrame,
+                          [&](std::int32_t inX, std::int32_t inY, float, float, float)
+                          {
+                              const float* m = inMatte.At(inX, inY);
+                              const float value = inLuma ? Luma(m[2], m[1], m[0]) * m[3] : m[3];
+                              return inInvert ? 1.0f - value : value;
+                          });
+        });
+}
+
 // Track matte: the clip's alpha is multiplied by the matte layer's alpha, or
 // by its luma over black (luma times alpha), or by one minus either when
 // inverted. Without a matte picture the matte is clear: the clip vanishes,
@@ -166,21 +196,67 @@ public:
         const QRT::Result status = ReadLayer(inContext, inLayers, matte);
         if (QRT::Failed(status))
             return status;
-        const bool luma = Value(1, inContext) >= 0.5;
-        const bool invert = Value(2, inContext) >= 0.5;
-        return RenderAlpha(
-            inContext, ioFrame,
-            [&](const Pixels& inPixels, const MF::IVideoFrame& inFrame)
-            {
-                MultiplyAlpha(inPixels, inFrame,
-                              [&](std::int32_t inX, std::int32_t inY, float, float, float)
-                              {
-                                  const float* m = matte.At(inX, inY);
-                                  const float value = luma ? Luma(m[2], m[1], m[0]) * m[3] : m[3];
-                                  return invert ? 1.0f - value : value;
-                              });
-            });
+        return ApplyMatte(inContext, ioFrame, matte, Value(1, inContext) >= 0.5,
+                          Value(2, inContext) >= 0.5);
     }
+};
+
+constexpr ParamSpec kImageMatteParams[] = {
+    {"using", ParamType::kChoice, 0.0, 0.0, 1.0, 0.0, kMatteKinds},
+    {"invert", ParamType::kBool, 0.0, 0.0, 1.0},
+};
+
+// Image matte: as the track matte, with a still PNG image, scaled to the
+// frame, as the matte. The image's path is the effect's opaque data; it is
+// read at the first render, once. A path that cannot be read fails every
+// render with the reader's status.
+class ImageMatteEffect : public EffectBase
+{
+public:
+    explicit ImageMatteEffect(EffectSetup inSetup)
+        : EffectBase(std::move(inSetup))
+    {
+    }
+
+    QRT::Result Render(const RenderContext& inContext, FrameRef& ioFrame,
+                       const LayerInputs& /*inLayers*/) override
+    {
+        std::call_once(
+            mRead,
+            [&]
+            {
+                MF::BinaryData path;
+                if (!GetOpaqueData(path))
+                {
+                    mStatus = VF::kResult_PngCannotOpen;
+                    return;
+                }
+                const auto bytes = path.GetBytes();
+                mStatus = VF::ReadPngFile(std::string(bytes.begin(), bytes.end()), mImage).mResult;
+            });
+        if (QRT::Failed(mStatus))
+            return mStatus;
+        // The delivered picture's size; the frame's own without one.
+        QRT::ParamRect size = inContext.mFrameRect;
+        if (size.Width() <= 0 || size.Height() <= 0)
+            size = ioFrame ? ioFrame->GetBounds() : size;
+        LayerPicture matte;
+        const QRT::Result status =
+            ToPicture(mImage, size.Width(), size.Height(), inContext.mQuality, matte);
+        if (QRT::Failed(status))
+            return status;
+        return ApplyMatte(inContext, ioFrame, matte, Value(0, inContext) >= 0.5,
+                          Value(1, inContext) >= 0.5);
+    }
+
+protected:
+    ~ImageMatteEffect() = default;
+
+private:
+    // Guards the one read of the image; mImage and mStatus are fixed after it.
+    std::once_flag mRead;
+    FrameRef mImage;
+    QRT::Result mStatus = QRT::kResult_Success;
 };
 
 constexpr ParamSpec kDifferenceMatteParams[] = {
@@ -234,6 +310,7 @@ public:
 void AddMatteEffects(std::vector<EffectEntry>& ioEntries)
 {
     ioEntries.push_back({kMatch_TrackMatte, kTrackMatteParams, &Make<TrackMatteEffect>});
+    ioEntries.push_back({kMatch_ImageMatte, kImageMatteParams, &Make<ImageMatteEffect>});
     ioEntries.push_back(
         {kMatch_DifferenceMatte, kDifferenceMatteParams, &Make<DifferenceMatteEffect>});
 }

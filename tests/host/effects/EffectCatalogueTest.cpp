@@ -60,7 +60,7 @@ TEST(EffectCatalogue, EveryNameMakesAnEffectWithDistinctInstanceNumbers)
         EXPECT_EQ(made.mEffect->GetDuration(), TickTime::FromSeconds(2));
         EXPECT_TRUE(instances.insert(made.mEffect->GetInstanceID()).second);
     }
-    EXPECT_EQ(instances.size(), 21u);
+    EXPECT_EQ(instances.size(), 22u);
 }
 
 struct ClampCase

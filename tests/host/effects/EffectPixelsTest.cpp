@@ -5,12 +5,14 @@
 
 #include "FX/EffectCatalogue.h"
 #include "QRT/Allocated.h"
+#include "VF/PngFile.h"
 #include "VF/VideoFrame.h"
 
 #include <algorithm>
 #include <cmath>
 #include <cstring>
 #include <random>
+#include <tuple>
 
 #include <gtest/gtest.h>
 
@@ -346,7 +348,7 @@ private:
     QRT::Result mStatus;
 };
 
-TEST(EffectPixels, DifferenceMatteKeysWhatMatchesTheLayerAtTheEffectsTime)
+TEST(EffectPixels, MattesKeyByTheirLayerOrImage)
 {
     // Red components against a layer of grey 100: differences 0, 20, 60, 100.
     const double reds[] = {100, 120, 160, 200};
@@ -373,6 +375,26 @@ TEST(EffectPixels, DifferenceMatteKeysWhatMatchesTheLayerAtTheEffectsTime)
             EXPECT_NEAR(At(*result, x, 0, 3), 255 * (invert ? 1 - keep : keep), 1.0) << x;
         }
     }
+    // An image matte reads its PNG (the opaque data): luma of white and black.
+    FrameRef image = MakeFrame(2, 1);
+    Set(*image, 0, 0, {255, 255, 255, 255});
+    Set(*image, 1, 0, {0, 0, 0, 255});
+    const std::string path = ::testing::TempDir() + "/image-matte.png";
+    ASSERT_TRUE(VF::WritePngFile(path, image).Succeeded());
+    for (const auto& [file, status, alphas] :
+         {std::tuple{path, QRT::kResult_Success, std::array{255.0, 0.0}},
+          std::tuple{path + ".missing", VF::kResult_PngCannotOpen, std::array{255.0, 255.0}}})
+    {
+        BE::EffectSettings settings{std::string(kMatch_ImageMatte), {{"using", "luma"}}, {}, {}};
+        settings.mOpaqueData = MF::BinaryData(file.data(), file.size());
+        FrameRef frame = MakeFrame(2, 1);
+        Set(*frame, 0, 0, {10, 20, 30, 255});
+        Set(*frame, 1, 0, {10, 20, 30, 255});
+        EXPECT_EQ(CreateEffect(settings).mEffect->Render({}, frame, {}), status);
+        EXPECT_EQ(At(*frame, 0, 0, 3), alphas[0]);
+        EXPECT_EQ(At(*frame, 1, 0, 3), alphas[1]);
+    }
+
     // A layer's failure is the effect's.
     auto failing = QRT::Allocated<FakeLayer>::CreateInstance(FrameRef(), QRT::kResult_NotFound);
     Render(kMatch_TrackMatte, {{"matte", "1"}}, MakeFrame(2, 1), 1.0f,

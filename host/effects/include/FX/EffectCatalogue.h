@@ -40,6 +40,7 @@ inline constexpr std::string_view kMatch_MultiplyKey = "KX.VNTR Legacy Key Multi
 inline constexpr std::string_view kMatch_ScreenKey = "KX.VNTR Legacy Key Screen";
 inline constexpr std::string_view kMatch_RemoveMatte = "KX.VNTR Legacy Key Remove Matte";
 inline constexpr std::string_view kMatch_TrackMatte = "KX.VNTR Legacy Key Track Matte";
+inline constexpr std::string_view kMatch_ImageMatte = "KX.VNTR Legacy Key Image Matte";
 inline constexpr std::string_view kMatch_DifferenceMatte = "KX.VNTR Legacy Key Difference Matte";
 inline constexpr std::string_view kMatch_CornerPin = "KX.VNTR Corner Pin";
 inline constexpr std::string_view kMatch_GarbageMatte = "KX.VNTR Garbage Matte";
