@@ -109,8 +109,12 @@ public:
             return conformed;
         for (std::size_t i = 0; i < mSetup.mOperators.size(); ++i)
         {
+            // A setup may leave out the layer lists of operators that read none.
+            static const SubTreeRenderList sNoLayers;
+            const SubTreeRenderList& layers =
+                i < mSetup.mLayerInputs.size() ? mSetup.mLayerInputs[i] : sNoLayers;
             const QRT::Result status = mSetup.mOperators[i]->ApplyOperator(
-                OperatorTime(inTime), mapped, inParams, mSetup.mLayerInputs[i], frame, 0);
+                OperatorTime(inTime), mapped, inParams, layers, frame, 0);
             if (QRT::Failed(status))
                 return status;
         }

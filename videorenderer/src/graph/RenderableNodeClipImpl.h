@@ -54,7 +54,8 @@ struct ClipProducerSetup
     QRT::InterfaceRef<IRenderableNodeProducer> mInput;
     // In application order.
     std::vector<QRT::InterfaceRef<IRenderableNodeOperator>> mOperators;
-    // Parallel to mOperators: the layers each operator reads.
+    // Parallel to mOperators: the layers each operator reads (missing
+    // entries read none).
     std::vector<SubTreeRenderList> mLayerInputs;
     // With a frame hold whose filters apply: the clip time the operators are
     // evaluated at (as the motion is); kTime_Invalid otherwise.
