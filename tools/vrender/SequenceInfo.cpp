@@ -73,6 +73,8 @@ std::string MediaName(const BE::ISequenceMedia& inMedia)
         return "solid " + FormatColor(settings.mColor);
     case BE::MediaKind::kSequence:
         return "sequence \"" + settings.mLocation + "\"";
+    case BE::MediaKind::kMulticam:
+        return "multicam, angle " + std::to_string(settings.mMulticam.mSelected + 1);
     }
     return {};
 }
