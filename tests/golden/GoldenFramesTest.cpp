@@ -208,7 +208,8 @@ TEST_P(GoldenFramesTest, FramesMatchTheirGoldenLines)
 }
 
 INSTANTIATE_TEST_SUITE_P(Timelines, GoldenFramesTest,
-                         ::testing::Values("effects", "layers", "motion", "retime", "transitions"));
+                         ::testing::Values("effects", "layers", "motion", "multicam", "retime",
+                                           "transitions"));
 
 } // namespace
 } // namespace ML
