@@ -74,7 +74,13 @@ std::string MediaName(const BE::ISequenceMedia& inMedia)
     case BE::MediaKind::kSequence:
         return "sequence \"" + settings.mLocation + "\"";
     case BE::MediaKind::kMulticam:
-        return "multicam, angle " + std::to_string(settings.mMulticam.mSelected + 1);
+    {
+        const auto angles = QRT::QueryRef<BE::IMulticamMedia>(
+            QRT::InterfaceRef<BE::ISequenceMedia>(const_cast<BE::ISequenceMedia*>(&inMedia)));
+        return "multicam of " + std::to_string(angles ? angles->GetAngleCount() : 0) +
+               " angles, angle " + std::to_string(settings.mMulticam.mSelected) +
+               (settings.mMulticam.mShowProgram ? " outlined in a grid" : " shown");
+    }
     }
     return {};
 }
