@@ -208,8 +208,8 @@ TEST_P(GoldenFramesTest, FramesMatchTheirGoldenLines)
 }
 
 INSTANTIATE_TEST_SUITE_P(Timelines, GoldenFramesTest,
-                         ::testing::Values("adjustment", "effects", "layers", "motion", "retime",
-                                           "transitions"));
+                         ::testing::Values("adjustment", "effects", "layers", "motion", "multicam",
+                                           "retime", "transitions"));
 
 } // namespace
 } // namespace ML

@@ -73,6 +73,14 @@ std::string MediaName(const BE::ISequenceMedia& inMedia)
         return "solid " + FormatColor(settings.mColor);
     case BE::MediaKind::kSequence:
         return "sequence \"" + settings.mLocation + "\"";
+    case BE::MediaKind::kMulticam:
+    {
+        const auto angles = QRT::QueryRef<BE::IMulticamMedia>(
+            QRT::InterfaceRef<BE::ISequenceMedia>(const_cast<BE::ISequenceMedia*>(&inMedia)));
+        return "multicam of " + std::to_string(angles ? angles->GetAngleCount() : 0) +
+               " angles, angle " + std::to_string(settings.mMulticam.mSelected) +
+               (settings.mMulticam.mShowProgram ? " outlined in a grid" : " shown");
+    }
     }
     return {};
 }

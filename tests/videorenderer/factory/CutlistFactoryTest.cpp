@@ -221,6 +221,42 @@ TEST_F(CutlistFactoryTest, TransitionsTakeTheirTrackOverTheirTime)
     }
 }
 
+TEST_F(CutlistFactoryTest, AMulticamItemPlaysItsAnglesThroughAMulticamNode)
+{
+    const auto cutlistOf = [&](int inSelected)
+    {
+        return SequenceCutlist(
+            Sequence(R"({"items": [{"end": "10f", "media": {"multicam": {"angles": [{"pattern": )"
+                     R"("pattern:moving?size=64x36"}, {"color": "#FF204060"}], "selected": )" +
+                     std::to_string(inSelected) + "}}}]}"));
+    };
+    const auto child = [](const QRT::InterfaceRef<MF::IRenderableNode>& inNode, std::uint32_t inAt)
+    {
+        TickTime offset;
+        QRT::InterfaceRef<MF::IRenderableNode> node;
+        EXPECT_EQ(inNode->GetInput(inAt, offset, node), QRT::kResult_Success);
+        return node;
+    };
+    const CutlistRef cutlist = cutlistOf(1);
+    const std::vector<Segment> segments = Segments(cutlist);
+    ASSERT_EQ(Describe(segments), "0-10/1");
+    QRT::InterfaceRef<MF::IRenderableNode> segment;
+    ASSERT_EQ(cutlist->GetNodeByHash(segments[0].mHash, segment), QRT::kResult_Success);
+    const auto multicam = child(child(segment, 0), 0);
+    EXPECT_EQ(multicam->GetNodeType().ToStringView(), "RenderableNodeMulticamImpl");
+    ASSERT_EQ(multicam->GetInputCount(), 2u);
+    for (std::uint32_t i = 0; i < 2; ++i)
+    {
+        const auto angle = child(multicam, i);
+        EXPECT_EQ(angle->GetNodeType().ToStringView(), "RenderableNodeMediaImpl");
+        MF::RenderablePropertyValue selected;
+        angle->GetProperty(QRT::ImmutableString::CreateStatic("MediaNode::SelectedMulticamTrack"),
+                           selected);
+        EXPECT_EQ(selected, "1");
+    }
+    EXPECT_NE(Segments(cutlistOf(0))[0].mHash, segments[0].mHash);
+}
+
 TEST_F(CutlistFactoryTest, EditsChangeTheHashesOfTheSegmentsTheyTouchOnly)
 {
     // Track 0: A [0, 20) and B [40, 60); track 1: C [10, 30).

@@ -16,6 +16,7 @@
 #include "factory/TransitionPlacement.h"
 #include "graph/RenderableNodeAdjustmentImpl.h"
 #include "graph/RenderableNodeEffectImpl.h"
+#include "graph/RenderableNodeMulticamImpl.h"
 #include "graph/RenderableNodeTransitionImpl.h"
 #include "graph/SequenceNodes.h"
 
@@ -346,11 +347,36 @@ public:
 
         ClipNodeSetup clip;
         clip.mTrackItem = item;
-        clip.mInput = CreateMediaNode(media);
+        clip.mInput = MediaInput(media);
         clip.mOperators = EffectNodes(Require(item).GetSettings(), inContext, media.mStreamLabel,
                                       inLayers, inTrack.mTrackIndex);
         clip.mTrackID = inTrack.mTrackIndex;
         return clip;
+    }
+
+    // The node of a media in a clip's subtree: its media node, or for a
+    // multicam media a multicam node over the subtrees of its angles, each
+    // played through the same item.
+    NodeRef MediaInput(const MediaNodeSetup& inSetup)
+    {
+        const auto multicam = QRT::QueryRef<BE::IMulticamMedia>(inSetup.mMedia);
+        if (!multicam)
+            return CreateMediaNode(inSetup);
+        const BE::MulticamSettings& settings = inSetup.mMedia->GetMediaSettings().mMulticam;
+        MulticamNodeSetup node;
+        node.mSource = multicam;
+        node.mSelectedTrack = settings.mSelected;
+        node.mShowProgram = settings.mShowProgram;
+        node.mRecording = settings.mRecording;
+        for (std::size_t i = 0; i < multicam->GetAngleCount(); ++i)
+        {
+            MediaNodeSetup angle = inSetup;
+            angle.mMedia = multicam->GetAngle(i);
+            angle.mNestedCutlist = NestedCutlist(Require(angle.mMedia));
+            angle.mSelectedMulticamTrack = settings.mSelected;
+            node.mAngles.push_back(MediaInput(angle));
+        }
+        return CreateMulticamNode(node);
     }
 
     // The sealed effect nodes of an item's effects, in order; its opacity
@@ -507,8 +533,9 @@ public:
         setup.mMedia = media;
         setup.mSequence.mPixelAspectRatio = mvxmediatypes::kPixelAspectRatio_Square;
         setup.mSequence.mFrameRate = mvxmediatypes::kFrameRate_Zero;
-        setup.mNestedCutlist = TreeBuilder().NestedCutlist(*media);
-        const NodeRef node = CreateMediaNode(setup);
+        TreeBuilder builder;
+        setup.mNestedCutlist = builder.NestedCutlist(*media);
+        const NodeRef node = builder.MediaInput(setup);
         TickTime duration = kTime_Max;
         if ((node->GetRenderFlags() & kRenderFlag_TimeInvariant) == 0)
             duration = Require(QRT::QueryRef<BE::IMediaDuration>(inMedia)).GetDuration();

@@ -234,6 +234,9 @@ void RenderableNodeMediaImpl::BuildSourceChain(const MediaNodeSetup& inSetup)
     if (nested)
         SetProperty(Key("MediaNode::NestedSequenceHash"),
                     inSetup.mNestedCutlist->GetCutlistHash().ToString(), true);
+    if (inSetup.mSelectedMulticamTrack)
+        SetTypedProperty(Key("MediaNode::SelectedMulticamTrack"), *inSetup.mSelectedMulticamTrack,
+                         true);
     SetTypedProperty(Key("MediaNode::TrackItemIsMuted"), inSetup.mMuted, true);
     SetTypedProperty(Key("MediaNode::ClipSpeed"), clip.mSpeed, false);
     SetTypedProperty(Key("MediaNode::ClipBackwards"), clip.mReverse, false);

@@ -21,6 +21,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -47,6 +48,9 @@ struct MediaNodeSetup
     // For a nested-sequence media: the nested sequence's cutlist, built and
     // sealed by the factory. Empty for other media.
     QRT::InterfaceRef<MF::IRenderableCutlist> mNestedCutlist;
+    // For an angle of a multicam media: the multicam's selected angle
+    // ("MediaNode::SelectedMulticamTrack"). Unset for other media.
+    std::optional<std::uint64_t> mSelectedMulticamTrack;
 };
 
 // A sealed "RenderableNodeMediaImpl".

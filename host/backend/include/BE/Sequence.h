@@ -44,6 +44,14 @@ struct MediaResult
 // file that does not exist is not a failure: the media is offline.
 MediaResult CreateMedia(const MediaSettings& inSettings, const SequenceRef& inNested = {});
 
+// Makes a multicam media (kMulticam settings) over inAngles, which answers
+// IMulticamMedia. Its stream is the settings' stream, else the first
+// angle's; its length the longest angle's unless the settings give one; it
+// is a still when every angle is. Input contracts: inSettings.mKind is
+// kMulticam, at least one angle, none empty, mMulticam.mSelected below the
+// number of angles.
+MediaRef CreateMulticamMedia(const MediaSettings& inSettings, std::vector<MediaRef> inAngles);
+
 // An item playing inMedia. Input contracts: inMedia is not empty,
 // mEnd > mStart, a speed that is finite, non-zero and at most kMaxClipSpeed
 // in magnitude.

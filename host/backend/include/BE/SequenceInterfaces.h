@@ -15,6 +15,8 @@
 //   IMediaStream       one video stream of a media
 //   IMediaDuration     the media's length (answered by the media)
 //   IStillRanges       where the media's picture does not change (the media)
+//   IMulticamMedia     the camera angles of a multicam media (answered by
+//                      multicam media alone)
 //   ISequenceOverlay   a cutlist laid over a sequence's own
 //
 // Every object is immutable once built (BE/Sequence.h), so every operation
@@ -185,6 +187,21 @@ public:
 
 protected:
     ~IStillRanges() = default;
+};
+
+// The angles of a multicam media, in the order the selected index counts
+// them; which one is shown is the media's MediaSettings::mMulticam.
+class IMulticamMedia : public QRT::QRTUnknown
+{
+public:
+    QRT_INTERFACE_ID("{8b0d5e3a-61c4-4f2e-9a57-c2e41d7b0f93}");
+
+    virtual std::size_t GetAngleCount() const noexcept = 0;
+    // Input contract: inIndex < GetAngleCount().
+    virtual QRT::InterfaceRef<ISequenceMedia> GetAngle(std::size_t inIndex) const = 0;
+
+protected:
+    ~IMulticamMedia() = default;
 };
 
 // A cutlist that is rendered in place of a sequence's own wherever it has

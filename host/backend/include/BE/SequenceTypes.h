@@ -202,13 +202,29 @@ enum class MediaKind
     kPattern,
     kSolid,
     kSequence,
+    // Camera angles (each a media of its own) of which one is shown.
+    kMulticam,
+};
+
+// How a multicam media shows its angles.
+struct MulticamSettings
+{
+    // The angle shown (an index into the angles).
+    std::uint64_t mSelected = 0;
+    // Show every angle in a grid, the selected one outlined, instead of the
+    // selected angle alone.
+    bool mShowProgram = false;
+    // The editor is recording angle switches.
+    bool mRecording = false;
+
+    friend bool operator==(const MulticamSettings&, const MulticamSettings&) = default;
 };
 
 struct MediaSettings
 {
     MediaKind mKind = MediaKind::kFile;
     // kFile, kStill: the path as given; kPattern: the "pattern:" text;
-    // kSequence: the nested sequence's name; kSolid: empty.
+    // kSequence: the nested sequence's name; kSolid, kMulticam: empty.
     // Solids: the colour is mColor; the picture made is opaque, the alpha
     // byte is kept for the renderer to apply.
     std::string mLocation;
@@ -228,6 +244,8 @@ struct MediaSettings
     std::optional<StreamSettings> mStream;
     // The media's length when the material cannot tell or is to be cut.
     std::optional<mvxmediatypes::TickTime> mDuration;
+    // kMulticam: the angle shown and how (the angles are IMulticamMedia's).
+    MulticamSettings mMulticam;
 
     friend bool operator==(const MediaSettings&, const MediaSettings&) = default;
 };

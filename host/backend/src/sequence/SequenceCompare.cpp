@@ -21,6 +21,16 @@ bool SameMedia(const MediaRef& inLeft, const MediaRef& inRight)
         QRT::InterfaceRef<IMediaDuration>(inLeft)->GetDuration() !=
             QRT::InterfaceRef<IMediaDuration>(inRight)->GetDuration())
         return false;
+    const auto leftCam = QRT::QueryRef<IMulticamMedia>(inLeft);
+    const auto rightCam = QRT::QueryRef<IMulticamMedia>(inRight);
+    if (leftCam || rightCam)
+    {
+        if (!leftCam || !rightCam || leftCam->GetAngleCount() != rightCam->GetAngleCount())
+            return false;
+        for (std::size_t i = 0; i < leftCam->GetAngleCount(); ++i)
+            if (!SameMedia(leftCam->GetAngle(i), rightCam->GetAngle(i)))
+                return false;
+    }
     const SequenceRef left = inLeft->GetNestedSequence();
     const SequenceRef right = inRight->GetNestedSequence();
     if (!left || !right)

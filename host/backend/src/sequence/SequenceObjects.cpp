@@ -264,6 +264,8 @@ mt::TickTime DurationOfSource(const VideoSourceRef& inSource)
 MediaResult CreateMedia(const MediaSettings& inSettings, const SequenceRef& inNested)
 {
     MVX_INPUT_CONTRACT((inSettings.mKind == MediaKind::kSequence) == static_cast<bool>(inNested));
+    // Multicam media are made from their angles (CreateMulticamMedia).
+    MVX_INPUT_CONTRACT(inSettings.mKind != MediaKind::kMulticam);
     MediaResult result;
     VideoSourceRef source;
     StreamSettings stream = inSettings.mStream.value_or(StreamSettings());
@@ -323,6 +325,8 @@ MediaResult CreateMedia(const MediaSettings& inSettings, const SequenceRef& inNe
         duration = inNested->GetEnd();
         break;
     }
+    case MediaKind::kMulticam:
+        break;
     }
     if (source)
     {

@@ -62,6 +62,8 @@ private:
     EffectSettings ReadEffect(const Node& inNode, mt::FrameRate inRate);
     MediaRef ReadMedia(const Node& inNode, const SequenceSettings& inSequence);
     SequenceRef NestedSequence(const Node& inNode, const std::string& inName);
+    std::vector<MediaRef> ReadMulticam(const Node& inNode, const SequenceSettings& inSequence,
+                                       MulticamSettings& outSettings);
 
     const Json& mRoot;
     const std::string mBaseFolder;
@@ -288,18 +290,43 @@ SequenceRef TimelineReader::NestedSequence(const Node& inNode, const std::string
     return Build(found->second);
 }
 
+std::vector<MediaRef> TimelineReader::ReadMulticam(const Node& inNode,
+                                                   const SequenceSettings& inSequence,
+                                                   MulticamSettings& outSettings)
+{
+    CheckKeys(inNode.Value(), inNode.Path(), {"angles", "selected", "showProgram", "recording"});
+    std::vector<MediaRef> angles;
+    for (const Node& angle : inNode.Elements("angles"))
+        angles.push_back(ReadMedia(angle, inSequence));
+    if (angles.empty())
+        Fail(inNode.PathOf("angles"), "a multicam needs at least one angle");
+    if (inNode.Has("selected"))
+        outSettings.mSelected =
+            static_cast<std::uint64_t>(inNode.Child("selected").AsInteger(0, INT64_MAX));
+    if (outSettings.mSelected >= angles.size())
+        Fail(inNode.PathOf("selected"), "angle " + std::to_string(outSettings.mSelected) +
+                                            " is selected but the multicam has " +
+                                            std::to_string(angles.size()) +
+                                            " angles (counted from 0)");
+    outSettings.mShowProgram = inNode.Bool("showProgram", false);
+    outSettings.mRecording = inNode.Bool("recording", false);
+    return angles;
+}
+
 MediaRef TimelineReader::ReadMedia(const Node& inNode, const SequenceSettings& inSequence)
 {
     const mt::FrameRate rate = inSequence.mFrameRate;
-    static constexpr std::string_view kKinds[] = {"file", "still", "pattern", "color", "sequence"};
+    static constexpr std::string_view kKinds[] = {"file",  "still",    "pattern",
+                                                  "color", "sequence", "multicam"};
     CheckKeys(inNode.Value(), inNode.Path(),
-              {"file", "still", "pattern", "color", "sequence", "offline", "pending", "draft",
-               "opaque", "colorProfile", "stream", "duration"});
+              {"file", "still", "pattern", "color", "sequence", "multicam", "offline", "pending",
+               "draft", "opaque", "colorProfile", "stream", "duration"});
     // Items naming the same material share one media object. A solid
-    // without a stream takes the sequence's picture, so its key does too.
+    // without a stream takes the sequence's picture, so its key does too,
+    // and so does a multicam's, whose angles may be such solids.
     std::string key = inNode.Value().dump();
     const bool sequencePicture = inNode.Has("color") && !inNode.Has("stream");
-    if (sequencePicture)
+    if (sequencePicture || inNode.Has("multicam"))
         key += std::to_string(inSequence.mWidth) + "x" + std::to_string(inSequence.mHeight) + "@" +
                std::to_string(rate.GetTicksPerFrame()) + ":" +
                std::to_string(inSequence.mPixelAspectRatio.GetNumerator()) + "/" +
@@ -317,10 +344,13 @@ MediaRef TimelineReader::ReadMedia(const Node& inNode, const SequenceSettings& i
         }
     if (kinds != 1)
         Fail(inNode.Path(), "a media needs exactly one of \"file\", \"still\", \"pattern\", "
-                            "\"color\" and \"sequence\"");
+                            "\"color\", \"sequence\" and \"multicam\"");
     SequenceRef nested;
+    std::vector<MediaRef> angles;
     const std::string kindKey(kKinds[static_cast<std::size_t>(settings.mKind)]);
-    if (settings.mKind == MediaKind::kSolid)
+    if (settings.mKind == MediaKind::kMulticam)
+        angles = ReadMulticam(inNode.Child(kindKey), inSequence, settings.mMulticam);
+    else if (settings.mKind == MediaKind::kSolid)
         settings.mColor = inNode.Color("color", settings.mColor);
     else
         settings.mLocation = inNode.String(kindKey);
@@ -356,6 +386,12 @@ MediaRef TimelineReader::ReadMedia(const Node& inNode, const SequenceSettings& i
         settings.mDuration = duration;
     }
 
+    if (settings.mKind == MediaKind::kMulticam)
+    {
+        MediaRef multicam = CreateMulticamMedia(settings, std::move(angles));
+        mMedia.emplace(key, multicam);
+        return multicam;
+    }
     const MediaResult made = CreateMedia(settings, nested);
     if (!made.mMedia)
         Fail(inNode.PathOf(kindKey), made.mStatus.mMessage);

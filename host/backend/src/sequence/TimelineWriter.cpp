@@ -85,14 +85,35 @@ Json StreamJson(const StreamSettings& inStream)
     return stream;
 }
 
+Json MediaJson(const ISequenceMedia& inMedia, const SequenceSettings& inSequence);
+
+Json MulticamJson(const ISequenceMedia& inMedia, const SequenceSettings& inSequence)
+{
+    const QRT::InterfaceRef<IMulticamMedia> multicam(
+        QRT::InterfaceRef<ISequenceMedia>(const_cast<ISequenceMedia*>(&inMedia)));
+    const MulticamSettings& settings = inMedia.GetMediaSettings().mMulticam;
+    Json angles = Json::array();
+    for (std::size_t i = 0; i < multicam->GetAngleCount(); ++i)
+        angles.push_back(MediaJson(*multicam->GetAngle(i), inSequence));
+    Json json;
+    json["angles"] = std::move(angles);
+    json["selected"] = settings.mSelected;
+    PutIf(json, "showProgram", settings.mShowProgram, false);
+    PutIf(json, "recording", settings.mRecording, false);
+    return json;
+}
+
 Json MediaJson(const ISequenceMedia& inMedia, const SequenceSettings& inSequence)
 {
     const mt::FrameRate rate = inSequence.mFrameRate;
-    static constexpr const char* kKinds[] = {"file", "still", "pattern", "color", "sequence"};
+    static constexpr const char* kKinds[] = {"file",  "still",    "pattern",
+                                             "color", "sequence", "multicam"};
     const MediaSettings& settings = inMedia.GetMediaSettings();
     Json media;
     const char* kind = kKinds[static_cast<int>(settings.mKind)];
-    if (settings.mKind == MediaKind::kSolid)
+    if (settings.mKind == MediaKind::kMulticam)
+        media[kind] = MulticamJson(inMedia, inSequence);
+    else if (settings.mKind == MediaKind::kSolid)
         media[kind] = ColorText(settings.mColor);
     else
         media[kind] = settings.mLocation;
@@ -256,6 +277,20 @@ Json SequenceJson(const SequenceRef& inSequence)
 
 // Nested sequences before the sequences that play them, each once.
 void CollectSequences(const SequenceRef& inSequence, std::set<const ISequence*>& ioSeen,
+                      std::set<std::string>& ioNames, std::vector<SequenceRef>& ioOrder);
+
+// The sequences a media plays: its nested one, or those of its angles.
+void CollectNested(const MediaRef& inMedia, std::set<const ISequence*>& ioSeen,
+                   std::set<std::string>& ioNames, std::vector<SequenceRef>& ioOrder)
+{
+    if (const SequenceRef nested = inMedia->GetNestedSequence())
+        CollectSequences(nested, ioSeen, ioNames, ioOrder);
+    if (const auto multicam = QRT::QueryRef<IMulticamMedia>(inMedia))
+        for (std::size_t i = 0; i < multicam->GetAngleCount(); ++i)
+            CollectNested(multicam->GetAngle(i), ioSeen, ioNames, ioOrder);
+}
+
+void CollectSequences(const SequenceRef& inSequence, std::set<const ISequence*>& ioSeen,
                       std::set<std::string>& ioNames, std::vector<SequenceRef>& ioOrder)
 {
     if (!ioSeen.insert(inSequence.Get()).second)
@@ -265,8 +300,7 @@ void CollectSequences(const SequenceRef& inSequence, std::set<const ISequence*>&
     {
         const QRT::InterfaceRef<IVideoTrack> track = group->GetTrack(t);
         for (std::size_t i = 0; i < track->GetItemCount(); ++i)
-            if (const SequenceRef nested = track->GetItem(i)->GetMedia()->GetNestedSequence())
-                CollectSequences(nested, ioSeen, ioNames, ioOrder);
+            CollectNested(track->GetItem(i)->GetMedia(), ioSeen, ioNames, ioOrder);
     }
     MVX_INPUT_CONTRACT(ioNames.insert(inSequence->GetName()).second);
     ioOrder.push_back(inSequence);

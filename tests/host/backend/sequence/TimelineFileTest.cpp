@@ -56,6 +56,10 @@ BE::SequenceRef FullModel(const std::string& inFolder)
     nested.mKind = BE::MediaKind::kSequence;
     nested.mLocation = "Inner";
 
+    BE::MediaSettings multicam;
+    multicam.mKind = BE::MediaKind::kMulticam;
+    multicam.mMulticam = {1, true, true};
+
     BE::TrackItemSettings full = Item(0, 2);
     full.mFlags = 5;
     full.mBlendMode = kIR_BlendMode_Multiply;
@@ -98,6 +102,8 @@ BE::SequenceRef FullModel(const std::string& inFolder)
     builder.AddTrack();
     builder.AddItem(0, full, Media(file));
     builder.AddItem(0, Item(3, 4), Media(still));
+    builder.AddItem(0, Item(4, 6),
+                    BE::CreateMulticamMedia(multicam, {Media(nested, inner), Media(solid)}));
     builder.AddItem(0, adjustment, Media(solid));
     builder.AddItem(1, Item(1, 5), Media(nested, inner));
     builder.AddItem(1, Item(5, 6), Pattern("pattern:gradient?size=32x32"));
@@ -336,7 +342,15 @@ INSTANTIATE_TEST_SUITE_P(
         ErrorCase{"TwoMediaKinds",
                   Doc({"{\"end\": 1, \"media\": {\"file\": \"a\", \"color\": \"#000000\"}}"}),
                   kItem0 + "/media: a media needs exactly one of \"file\", \"still\", "
-                           "\"pattern\", \"color\" and \"sequence\""},
+                           "\"pattern\", \"color\", \"sequence\" and \"multicam\""},
+        ErrorCase{"MulticamWithoutAngles",
+                  Doc({"{\"end\": 1, \"media\": {\"multicam\": {\"angles\": []}}}"}),
+                  kItem0 + "/media/multicam/angles: a multicam needs at least one angle"},
+        ErrorCase{"MulticamSelectsNoAngle",
+                  Doc({"{\"end\": 1, \"media\": {\"multicam\": {\"angles\": [{\"pattern\": "
+                       "\"pattern:bars\"}], \"selected\": 1}}}"}),
+                  kItem0 + "/media/multicam/selected: angle 1 is selected but the multicam has "
+                           "1 angles (counted from 0)"},
         ErrorCase{"MissingMedia", Doc({"{\"end\": 1}"}), kItem0 + ": missing key \"media\""},
         ErrorCase{"MissingEnd", Doc({"{" + kBars + "}"}),
                   kItem0 + ": missing key \"end\" (or \"duration\")"},
