@@ -1,0 +1,57 @@
+#pragma once
+
+// Explicitly vectorised kernels of the Gaussian Blur (Highway, chosen for the
+// processor on first use). The blur works on lines of "steps": a step is
+// kBlurStepFloats contiguous floats (the four premultiplied components of
+// kBlurStepPixels pixels, one pixel of each of kBlurStepPixels rows or columns
+// side by side), and a line is count steps a stride apart. Beyond a line's ends
+// its end steps repeat.
+//
+// Threads: every function is re-entrant; buffers passed in are the caller's.
+
+#include <cstddef>
+#include <cstdint>
+
+namespace FX::detail::Simd
+{
+
+inline constexpr int kBlurStepPixels = 16;
+inline constexpr int kBlurStepFloats = kBlurStepPixels * 4;
+
+// One direction of the blur: three running box sums of radii boxRadii, or, when
+// taps is set, a symmetric convolution with weights taps[0] (the centre) to
+// taps[tapRadius] (the outermost pair).
+struct BlurLineKernel
+{
+    int boxRadii[3] = {0, 0, 0};
+    // Steps in each ring of the box passes: a power of two above twice the
+    // largest radius plus one.
+    int ringSteps = 0;
+    const float* taps = nullptr;
+    int tapRadius = 0;
+};
+
+// Blurs the line of inCount steps at inSource (steps inSourceStride floats
+// apart) into outTarget (outTargetStride apart); the result is that of the
+// line extended without end by its end steps. ioRingA and ioRingB hold
+// inKernel.ringSteps steps each (box passes only); no buffers may overlap.
+void BlurLine(const float* inSource, std::ptrdiff_t inSourceStride, float* outTarget,
+              std::ptrdiff_t outTargetStride, int inCount, const BlurLineKernel& inKernel,
+              float* ioRingA, float* ioRingB);
+
+// inCount 8-bit straight B, G, R, A pixels at inRow to premultiplied floats in
+// 0..1, each pixel's four floats inStride floats after the one before.
+void LoadPremultiplied8(const std::uint8_t* inRow, int inCount, float* outValues,
+                        std::ptrdiff_t inStride);
+
+// The reverse: premultiplied floats back to straight 8-bit pixels, rounded
+// (colour 0 where alpha is 0).
+void StoreStraight8(const float* inValues, std::ptrdiff_t inStride, int inCount,
+                    std::uint8_t* outRow);
+
+// A line of steps whose step x holds pixel x of inRows (at most
+// kBlurStepPixels) rows, as StoreStraight8 into row r at outRows[r].
+void StoreStraight8Block(const float* inValues, int inCount, int inRows,
+                         std::uint8_t* const* outRows);
+
+} // namespace FX::detail::Simd
