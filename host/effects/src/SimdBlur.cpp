@@ -1,8 +1,7 @@
 // Vectorised Gaussian Blur kernels (SimdBlur.h).
 //
 // A line's steps are whole multiples of the vector, so a step is a fixed number
-// of vectors held in registers. The box passes run together in one sweep, their
-// intermediate steps in two small rings that stay in the first-level cache. Pixel
+// of vectors held in registers, with the recursive filter's state. Pixel
 // conversions work on whole vectors (a pixel per 128-bit block) where pixels
 // are contiguous, else one pixel per 128-bit vector, which every target but the
 // one-lane fallback has.
@@ -28,75 +27,68 @@ constexpr std::size_t kLanes = hn::MaxLanes(Tag());
 constexpr std::size_t kVectors = kBlurStepFloats / kLanes;
 static_assert(kVectors * kLanes == kBlurStepFloats);
 
-// The three box passes in one sweep along the line extended by its end steps
-// (as far as the three radii reach together): the first pass's running sum
-// takes the entering input step minus the leaving one, its outputs go into
-// ring A, from which the second pass takes its entering and leaving steps
-// likewise, into ring B for the third, whose outputs are the line's.
-void BoxChain(const float* inSource, std::ptrdiff_t inSourceStride, float* outTarget,
-              std::ptrdiff_t outTargetStride, int inCount, const BlurLineKernel& inKernel,
-              float* ioRingA, float* ioRingB)
+// The recursive form: each section runs forward (the causal half of the
+// kernel, written to the target) and backward (the rest, added to it), both
+// started in the steady state of the line's end step repeated without end.
+void RecursivePass(const float* inSource, std::ptrdiff_t inSourceStride, float* outTarget,
+                   std::ptrdiff_t outTargetStride, int inCount, const BlurLineKernel& inKernel)
 {
     const Tag d;
     using V = hn::Vec<Tag>;
-    const int* radii = inKernel.boxRadii;
-    const int widths[3] = {2 * radii[0] + 1, 2 * radii[1] + 1, 2 * radii[2] + 1};
-    const V scales[3] = {hn::Set(d, 1.0f / static_cast<float>(widths[0])),
-                         hn::Set(d, 1.0f / static_cast<float>(widths[1])),
-                         hn::Set(d, 1.0f / static_cast<float>(widths[2]))};
-    const int reach = radii[0] + radii[1] + radii[2];
-    const int mask = inKernel.ringSteps - 1;
-    auto input = [&](int inIndex)
-    { return inSource + std::clamp(inIndex - reach, 0, inCount - 1) * inSourceStride; };
-    auto ringA = [&](int inIndex) { return ioRingA + (inIndex & mask) * kBlurStepFloats; };
-    auto ringB = [&](int inIndex) { return ioRingB + (inIndex & mask) * kBlurStepFloats; };
-    V sums[3][kVectors];
-    for (auto& pass : sums)
-        for (V& sum : pass)
-            sum = hn::Zero(d);
-    // Adds step inEntering (and takes away inLeaving, when there is one) to
-    // the sums of one pass and writes their means to outMeans.
-    auto slide = [&](V* ioSums, const V& inScale, const float* inEntering, const float* inLeaving,
-                     float* outMeans)
+    const BlurLineKernel::Section& s0 = inKernel.sections[0];
+    const BlurLineKernel::Section& s1 = inKernel.sections[1];
+    const V e10 = hn::Set(d, s0.e1), e20 = hn::Set(d, s0.e2);
+    const V e11 = hn::Set(d, s1.e1), e21 = hn::Set(d, s1.e2);
+    auto in = [&](int inIndex) { return inSource + inIndex * inSourceStride; };
+    auto out = [&](int inIndex) { return outTarget + inIndex * outTargetStride; };
+    // Per vector: the input one step back (forward) or ahead (backward) and
+    // two before it, and each section's last two outputs.
+    V x1[kVectors], x2[kVectors], y0[kVectors], y0p[kVectors], y1[kVectors], y1p[kVectors];
     {
+        const V b00 = hn::Set(d, s0.b0), b10 = hn::Set(d, s0.b1);
+        const V b01 = hn::Set(d, s1.b0), b11 = hn::Set(d, s1.b1);
         for (std::size_t v = 0; v < kVectors; ++v)
         {
-            const V entering = hn::LoadU(d, inEntering + v * kLanes);
-            ioSums[v] = inLeaving ? hn::Add(ioSums[v],
-                                            hn::Sub(entering, hn::LoadU(d, inLeaving + v * kLanes)))
-                                  : hn::Add(ioSums[v], entering);
-            hn::StoreU(hn::Mul(ioSums[v], inScale), d, outMeans + v * kLanes);
+            x1[v] = hn::LoadU(d, in(0) + v * kLanes);
+            y0[v] = y0p[v] = hn::Mul(x1[v], hn::Set(d, s0.forwardSteady));
+            y1[v] = y1p[v] = hn::Mul(x1[v], hn::Set(d, s1.forwardSteady));
         }
-    };
-    // Step j of the extended input completes the first pass's window centred
-    // on j - r0 (once j has reached a full window), and so on down the chain.
-    const int length = inCount + 2 * reach;
-    for (int j = 0; j < length; ++j)
-    {
-        const int a = j - radii[0];
-        slide(sums[0], scales[0], input(j), j >= widths[0] ? input(j - widths[0]) : nullptr,
-              ringA(a));
-        const int aCount = j - (widths[0] - 1);
-        if (aCount < 0)
-            continue;
-        const int b = a - radii[1];
-        slide(sums[1], scales[1], ringA(a), aCount >= widths[1] ? ringA(a - widths[1]) : nullptr,
-              ringB(b));
-        const int bCount = aCount - (widths[1] - 1);
-        if (bCount < 0)
-            continue;
-        const int c = b - radii[2];
-        const int cCount = bCount - (widths[2] - 1);
-        // The last pass writes only its full windows, the line's steps.
-        if (cCount < 0)
-        {
+        for (int n = 0; n < inCount; ++n)
             for (std::size_t v = 0; v < kVectors; ++v)
-                sums[2][v] = hn::Add(sums[2][v], hn::LoadU(d, ringB(b) + v * kLanes));
-            continue;
-        }
-        slide(sums[2], scales[2], ringB(b), bCount >= widths[2] ? ringB(b - widths[2]) : nullptr,
-              outTarget + (c - reach) * outTargetStride);
+            {
+                const V x = hn::LoadU(d, in(n) + v * kLanes);
+                const V a = hn::NegMulAdd(
+                    e20, y0p[v],
+                    hn::NegMulAdd(e10, y0[v], hn::MulAdd(b10, x1[v], hn::Mul(b00, x))));
+                const V b = hn::NegMulAdd(
+                    e21, y1p[v],
+                    hn::NegMulAdd(e11, y1[v], hn::MulAdd(b11, x1[v], hn::Mul(b01, x))));
+                y0p[v] = y0[v], y0[v] = a, y1p[v] = y1[v], y1[v] = b, x1[v] = x;
+                hn::StoreU(hn::Add(a, b), d, out(n) + v * kLanes);
+            }
     }
+    const V c10 = hn::Set(d, s0.c1), c20 = hn::Set(d, s0.c2);
+    const V c11 = hn::Set(d, s1.c1), c21 = hn::Set(d, s1.c2);
+    for (std::size_t v = 0; v < kVectors; ++v)
+    {
+        x1[v] = x2[v] = hn::LoadU(d, in(inCount - 1) + v * kLanes);
+        y0[v] = y0p[v] = hn::Mul(x1[v], hn::Set(d, s0.backwardSteady));
+        y1[v] = y1p[v] = hn::Mul(x1[v], hn::Set(d, s1.backwardSteady));
+    }
+    for (int n = inCount - 1; n >= 0; --n)
+        for (std::size_t v = 0; v < kVectors; ++v)
+        {
+            const V a = hn::NegMulAdd(
+                e20, y0p[v],
+                hn::NegMulAdd(e10, y0[v], hn::MulAdd(c20, x2[v], hn::Mul(c10, x1[v]))));
+            const V b = hn::NegMulAdd(
+                e21, y1p[v],
+                hn::NegMulAdd(e11, y1[v], hn::MulAdd(c21, x2[v], hn::Mul(c11, x1[v]))));
+            y0p[v] = y0[v], y0[v] = a, y1p[v] = y1[v], y1[v] = b;
+            x2[v] = x1[v], x1[v] = hn::LoadU(d, in(n) + v * kLanes);
+            float* target = out(n) + v * kLanes;
+            hn::StoreU(hn::Add(hn::LoadU(d, target), hn::Add(a, b)), d, target);
+        }
 }
 
 // The symmetric convolution with inKernel's taps.
@@ -141,14 +133,12 @@ void TapPass(const float* inSource, std::ptrdiff_t inSourceStride, float* outTar
 }
 
 void BlurLineImpl(const float* inSource, std::ptrdiff_t inSourceStride, float* outTarget,
-                  std::ptrdiff_t outTargetStride, int inCount, const BlurLineKernel& inKernel,
-                  float* ioRingA, float* ioRingB)
+                  std::ptrdiff_t outTargetStride, int inCount, const BlurLineKernel& inKernel)
 {
     if (inKernel.taps)
         TapPass(inSource, inSourceStride, outTarget, outTargetStride, inCount, inKernel);
     else
-        BoxChain(inSource, inSourceStride, outTarget, outTargetStride, inCount, inKernel, ioRingA,
-                 ioRingB);
+        RecursivePass(inSource, inSourceStride, outTarget, outTargetStride, inCount, inKernel);
 }
 
 #if HWY_TARGET == HWY_SCALAR
@@ -286,12 +276,10 @@ HWY_EXPORT(Store8Impl);
 HWY_EXPORT(Store8BlockImpl);
 
 void BlurLine(const float* inSource, std::ptrdiff_t inSourceStride, float* outTarget,
-              std::ptrdiff_t outTargetStride, int inCount, const BlurLineKernel& inKernel,
-              float* ioScratchA, float* ioScratchB)
+              std::ptrdiff_t outTargetStride, int inCount, const BlurLineKernel& inKernel)
 {
     HWY_DYNAMIC_DISPATCH(BlurLineImpl)
-    (inSource, inSourceStride, outTarget, outTargetStride, inCount, inKernel, ioScratchA,
-     ioScratchB);
+    (inSource, inSourceStride, outTarget, outTargetStride, inCount, inKernel);
 }
 
 void LoadPremultiplied8(const std::uint8_t* inRow, int inCount, float* outValues,

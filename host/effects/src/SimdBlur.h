@@ -18,26 +18,31 @@ namespace FX::detail::Simd
 inline constexpr int kBlurStepPixels = 16;
 inline constexpr int kBlurStepFloats = kBlurStepPixels * 4;
 
-// One direction of the blur: three running box sums of radii boxRadii, or, when
-// taps is set, a symmetric convolution with weights taps[0] (the centre) to
-// taps[tapRadius] (the outermost pair).
+// One direction of the blur: when taps is set, a symmetric convolution with
+// weights taps[0] (the centre) to taps[tapRadius] (the outermost pair); else a
+// recursive filter of two second-order sections, each run forward as
+//   y[n] = b0 x[n] + b1 x[n-1] - e1 y[n-1] - e2 y[n-2]
+// and backward as
+//   z[n] = c1 x[n+1] + c2 x[n+2] - e1 z[n+1] - e2 z[n+2],
+// the result the sum of the four; forwardSteady and backwardSteady are each
+// direction's output for a constant input of 1.
 struct BlurLineKernel
 {
-    int boxRadii[3] = {0, 0, 0};
-    // Steps in each ring of the box passes: a power of two above twice the
-    // largest radius plus one.
-    int ringSteps = 0;
+    struct Section
+    {
+        float b0 = 0, b1 = 0, c1 = 0, c2 = 0, e1 = 0, e2 = 0;
+        float forwardSteady = 0, backwardSteady = 0;
+    };
+    Section sections[2];
     const float* taps = nullptr;
     int tapRadius = 0;
 };
 
 // Blurs the line of inCount steps at inSource (steps inSourceStride floats
-// apart) into outTarget (outTargetStride apart); the result is that of the
-// line extended without end by its end steps. ioRingA and ioRingB hold
-// inKernel.ringSteps steps each (box passes only); no buffers may overlap.
+// apart) into outTarget (outTargetStride apart, not overlapping the source);
+// the result is that of the line extended without end by its end steps.
 void BlurLine(const float* inSource, std::ptrdiff_t inSourceStride, float* outTarget,
-              std::ptrdiff_t outTargetStride, int inCount, const BlurLineKernel& inKernel,
-              float* ioRingA, float* ioRingB);
+              std::ptrdiff_t outTargetStride, int inCount, const BlurLineKernel& inKernel);
 
 // inCount 8-bit straight B, G, R, A pixels at inRow to premultiplied floats in
 // 0..1, each pixel's four floats inStride floats after the one before.
