@@ -1,7 +1,7 @@
 // Vectorised Gaussian Blur kernels (SimdBlur.h).
 //
 // A line's steps are whole multiples of the vector, so a step is a fixed number
-// of vectors held in registers, with the recursive filter's state. Pixel
+// of vectors. Pixel
 // conversions work on whole vectors (a pixel per 128-bit block) where pixels
 // are contiguous, else one pixel per 128-bit vector, which every target but the
 // one-lane fallback has.
@@ -30,65 +30,70 @@ static_assert(kVectors * kLanes == kBlurStepFloats);
 // The recursive form: each section runs forward (the causal half of the
 // kernel, written to the target) and backward (the rest, added to it), both
 // started in the steady state of the line's end step repeated without end.
+// The line is swept once per group of kGroup vectors, whose state then fits
+// in registers; each new output depends on the previous one through one
+// multiply-add only, so the sections' chains overlap.
 void RecursivePass(const float* inSource, std::ptrdiff_t inSourceStride, float* outTarget,
                    std::ptrdiff_t outTargetStride, int inCount, const BlurLineKernel& inKernel)
 {
     const Tag d;
     using V = hn::Vec<Tag>;
+    constexpr std::size_t kGroup = kVectors >= 2 ? 2 : 1;
     const BlurLineKernel::Section& s0 = inKernel.sections[0];
     const BlurLineKernel::Section& s1 = inKernel.sections[1];
     const V e10 = hn::Set(d, s0.e1), e20 = hn::Set(d, s0.e2);
     const V e11 = hn::Set(d, s1.e1), e21 = hn::Set(d, s1.e2);
-    auto in = [&](int inIndex) { return inSource + inIndex * inSourceStride; };
-    auto out = [&](int inIndex) { return outTarget + inIndex * outTargetStride; };
-    // Per vector: the input one step back (forward) or ahead (backward) and
-    // two before it, and each section's last two outputs.
-    V x1[kVectors], x2[kVectors], y0[kVectors], y0p[kVectors], y1[kVectors], y1p[kVectors];
+    const V b00 = hn::Set(d, s0.b0), b10 = hn::Set(d, s0.b1);
+    const V b01 = hn::Set(d, s1.b0), b11 = hn::Set(d, s1.b1);
+    const V c10 = hn::Set(d, s0.c1), c20 = hn::Set(d, s0.c2);
+    const V c11 = hn::Set(d, s1.c1), c21 = hn::Set(d, s1.c2);
+    for (std::size_t group = 0; group < kVectors; group += kGroup)
     {
-        const V b00 = hn::Set(d, s0.b0), b10 = hn::Set(d, s0.b1);
-        const V b01 = hn::Set(d, s1.b0), b11 = hn::Set(d, s1.b1);
-        for (std::size_t v = 0; v < kVectors; ++v)
+        const float* in = inSource + group * kLanes;
+        float* out = outTarget + group * kLanes;
+        // Per vector: the input one step back (forward) or ahead (backward)
+        // and the one before it, and each section's last two outputs.
+        V x1[kGroup], x2[kGroup], y0[kGroup], y0p[kGroup], y1[kGroup], y1p[kGroup];
+        for (std::size_t v = 0; v < kGroup; ++v)
         {
-            x1[v] = hn::LoadU(d, in(0) + v * kLanes);
+            x1[v] = hn::LoadU(d, in + v * kLanes);
             y0[v] = y0p[v] = hn::Mul(x1[v], hn::Set(d, s0.forwardSteady));
             y1[v] = y1p[v] = hn::Mul(x1[v], hn::Set(d, s1.forwardSteady));
         }
         for (int n = 0; n < inCount; ++n)
-            for (std::size_t v = 0; v < kVectors; ++v)
+            for (std::size_t v = 0; v < kGroup; ++v)
             {
-                const V x = hn::LoadU(d, in(n) + v * kLanes);
+                const V x = hn::LoadU(d, in + n * inSourceStride + v * kLanes);
                 const V a = hn::NegMulAdd(
-                    e20, y0p[v],
-                    hn::NegMulAdd(e10, y0[v], hn::MulAdd(b10, x1[v], hn::Mul(b00, x))));
+                    e10, y0[v],
+                    hn::NegMulAdd(e20, y0p[v], hn::MulAdd(b10, x1[v], hn::Mul(b00, x))));
                 const V b = hn::NegMulAdd(
-                    e21, y1p[v],
-                    hn::NegMulAdd(e11, y1[v], hn::MulAdd(b11, x1[v], hn::Mul(b01, x))));
+                    e11, y1[v],
+                    hn::NegMulAdd(e21, y1p[v], hn::MulAdd(b11, x1[v], hn::Mul(b01, x))));
                 y0p[v] = y0[v], y0[v] = a, y1p[v] = y1[v], y1[v] = b, x1[v] = x;
-                hn::StoreU(hn::Add(a, b), d, out(n) + v * kLanes);
+                hn::StoreU(hn::Add(a, b), d, out + n * outTargetStride + v * kLanes);
+            }
+        for (std::size_t v = 0; v < kGroup; ++v)
+        {
+            x1[v] = x2[v] = hn::LoadU(d, in + (inCount - 1) * inSourceStride + v * kLanes);
+            y0[v] = y0p[v] = hn::Mul(x1[v], hn::Set(d, s0.backwardSteady));
+            y1[v] = y1p[v] = hn::Mul(x1[v], hn::Set(d, s1.backwardSteady));
+        }
+        for (int n = inCount - 1; n >= 0; --n)
+            for (std::size_t v = 0; v < kGroup; ++v)
+            {
+                const V a = hn::NegMulAdd(
+                    e10, y0[v],
+                    hn::NegMulAdd(e20, y0p[v], hn::MulAdd(c20, x2[v], hn::Mul(c10, x1[v]))));
+                const V b = hn::NegMulAdd(
+                    e11, y1[v],
+                    hn::NegMulAdd(e21, y1p[v], hn::MulAdd(c21, x2[v], hn::Mul(c11, x1[v]))));
+                y0p[v] = y0[v], y0[v] = a, y1p[v] = y1[v], y1[v] = b;
+                x2[v] = x1[v], x1[v] = hn::LoadU(d, in + n * inSourceStride + v * kLanes);
+                float* target = out + n * outTargetStride + v * kLanes;
+                hn::StoreU(hn::Add(hn::LoadU(d, target), hn::Add(a, b)), d, target);
             }
     }
-    const V c10 = hn::Set(d, s0.c1), c20 = hn::Set(d, s0.c2);
-    const V c11 = hn::Set(d, s1.c1), c21 = hn::Set(d, s1.c2);
-    for (std::size_t v = 0; v < kVectors; ++v)
-    {
-        x1[v] = x2[v] = hn::LoadU(d, in(inCount - 1) + v * kLanes);
-        y0[v] = y0p[v] = hn::Mul(x1[v], hn::Set(d, s0.backwardSteady));
-        y1[v] = y1p[v] = hn::Mul(x1[v], hn::Set(d, s1.backwardSteady));
-    }
-    for (int n = inCount - 1; n >= 0; --n)
-        for (std::size_t v = 0; v < kVectors; ++v)
-        {
-            const V a = hn::NegMulAdd(
-                e20, y0p[v],
-                hn::NegMulAdd(e10, y0[v], hn::MulAdd(c20, x2[v], hn::Mul(c10, x1[v]))));
-            const V b = hn::NegMulAdd(
-                e21, y1p[v],
-                hn::NegMulAdd(e11, y1[v], hn::MulAdd(c21, x2[v], hn::Mul(c11, x1[v]))));
-            y0p[v] = y0[v], y0[v] = a, y1p[v] = y1[v], y1[v] = b;
-            x2[v] = x1[v], x1[v] = hn::LoadU(d, in(n) + v * kLanes);
-            float* target = out(n) + v * kLanes;
-            hn::StoreU(hn::Add(hn::LoadU(d, target), hn::Add(a, b)), d, target);
-        }
 }
 
 // The symmetric convolution with inKernel's taps.
