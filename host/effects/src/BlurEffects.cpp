@@ -118,48 +118,60 @@ struct LineKernel
     Simd::BlurLineKernel mSimd;
 };
 
-// Pixels [inX, inX + inCount) of row inY as premultiplied floats, each pixel's
-// four inStride floats after the one before.
-void LoadPremultiplied(const Pixels& inPixels, int inX, int inY, int inCount, float* outValues,
-                       std::ptrdiff_t inStride)
+// Pixels [inX, inX + inCount) of rows [inY, inY + inRows) as premultiplied
+// floats: row r's pixel i at outValues + r * inRowFloats + i * inPixelFloats.
+void LoadPremultiplied(const Pixels& inPixels, int inX, int inY, int inRows, int inCount,
+                       float* outValues, std::ptrdiff_t inRowFloats, std::ptrdiff_t inPixelFloats)
 {
     if (!inPixels.mFloat)
-        return Simd::LoadPremultiplied8(inPixels.Row<std::uint8_t>(inY) + inX * 4, inCount,
-                                        outValues, inStride);
-    const float* p = inPixels.Row<float>(inY) + inX * 4;
-    for (int i = 0; i < inCount * 4; i += 4, outValues += inStride)
+        return Simd::LoadPremultiplied8(inPixels.Row<std::uint8_t>(inY) + inX * 4,
+                                        inPixels.mRowBytes, inRows, inCount, outValues, inRowFloats,
+                                        inPixelFloats);
+    for (int r = 0; r < inRows; ++r)
     {
-        const float a = p[i + 3];
-        outValues[0] = p[i] * a, outValues[1] = p[i + 1] * a;
-        outValues[2] = p[i + 2] * a, outValues[3] = a;
+        const float* p = inPixels.Row<float>(inY + r) + inX * 4;
+        float* values = outValues + r * inRowFloats;
+        for (int i = 0; i < inCount * 4; i += 4, values += inPixelFloats)
+        {
+            const float a = p[i + 3];
+            values[0] = p[i] * a, values[1] = p[i + 1] * a;
+            values[2] = p[i + 2] * a, values[3] = a;
+        }
     }
 }
 
 // The same pixels back from premultiplied floats.
-void StoreStraight(const Pixels& inPixels, int inX, int inY, int inCount, const float* inValues,
-                   std::ptrdiff_t inStride)
+void StoreStraight(const Pixels& inPixels, int inX, int inY, int inRows, int inCount,
+                   const float* inValues, std::ptrdiff_t inRowFloats, std::ptrdiff_t inPixelFloats)
 {
     if (!inPixels.mFloat)
-        return Simd::StoreStraight8(inValues, inStride, inCount,
-                                    inPixels.Row<std::uint8_t>(inY) + inX * 4);
-    float* p = inPixels.Row<float>(inY) + inX * 4;
-    for (int i = 0; i < inCount * 4; i += 4, inValues += inStride)
+        return Simd::StoreStraight8(inValues, inRowFloats, inPixelFloats, inRows, inCount,
+                                    inPixels.Row<std::uint8_t>(inY) + inX * 4, inPixels.mRowBytes);
+    for (int r = 0; r < inRows; ++r)
     {
-        const float a = inValues[3], k = a > 0.0f ? 1.0f / a : 0.0f;
-        p[i] = inValues[0] * k, p[i + 1] = inValues[1] * k;
-        p[i + 2] = inValues[2] * k, p[i + 3] = a;
+        float* p = inPixels.Row<float>(inY + r) + inX * 4;
+        const float* values = inValues + r * inRowFloats;
+        for (int i = 0; i < inCount * 4; i += 4, values += inPixelFloats)
+        {
+            const float a = values[3], k = a > 0.0f ? 1.0f / a : 0.0f;
+            p[i] = values[0] * k, p[i + 1] = values[1] * k;
+            p[i + 2] = values[2] * k, p[i + 3] = a;
+        }
     }
 }
 
 // The working buffers of one render, premultiplied BGRA floats: the plane
-// between the two directions and an input and an output line of steps as long
-// as the longer side.
+// between the two directions, in blocks of kStep rows (the last padded) laid
+// out as the row pass reads them, and an input and an output line of steps
+// as long as the longer side.
 struct BlurBuffers
 {
     void Reserve(int inWidth, int inHeight)
     {
         const auto longer = static_cast<std::size_t>(std::max(inWidth, inHeight));
-        mPlane.resize(static_cast<std::size_t>(inWidth) * static_cast<std::size_t>(inHeight) * 4);
+        const auto blocks = static_cast<std::size_t>((inHeight + Simd::kBlurStepPixels - 1) /
+                                                     Simd::kBlurStepPixels);
+        mPlane.resize(blocks * static_cast<std::size_t>(inWidth) * Simd::kBlurStepFloats);
         mIn.resize(longer * Simd::kBlurStepFloats);
         mOut.resize(longer * Simd::kBlurStepFloats);
     }
@@ -205,7 +217,7 @@ private:
                             BlurBuffers& ioBuffers, bool inToPlane)
     {
         const int width = inPixels.mWidth, height = inPixels.mHeight;
-        const std::ptrdiff_t planeStride = static_cast<std::ptrdiff_t>(width) * 4;
+        const std::ptrdiff_t blockFloats = static_cast<std::ptrdiff_t>(width) * kStepFloats;
         float* in = ioBuffers.mIn.data();
         float* out = ioBuffers.mOut.data();
         for (int x = 0; x < width; x += kStep)
@@ -213,21 +225,20 @@ private:
             const int count = std::min(kStep, width - x);
             if (count < kStep)
                 std::fill(ioBuffers.mIn.begin(), ioBuffers.mIn.end(), 0.0f);
-            for (int y = 0; y < height; ++y)
-                LoadPremultiplied(inPixels, x, y, count, in + y * kStepFloats, 4);
-            // A whole strip goes straight into the plane.
-            const bool direct = inToPlane && count == kStep;
-            float* target = direct ? ioBuffers.mPlane.data() + x * 4 : out;
-            Simd::BlurLine(in, kStepFloats, target, direct ? planeStride : kStepFloats, height,
-                           inKernel);
-            for (int y = 0; !direct && y < height; ++y)
+            LoadPremultiplied(inPixels, x, 0, height, count, in, kStepFloats, 4);
+            Simd::BlurLine(in, kStepFloats, out, kStepFloats, height, inKernel);
+            if (!inToPlane)
             {
-                const float* line = out + y * kStepFloats;
-                if (inToPlane)
-                    std::copy(line, line + count * 4,
-                              ioBuffers.mPlane.data() + y * planeStride + x * 4);
-                else
-                    StoreStraight(inPixels, x, y, count, line, 4);
+                StoreStraight(inPixels, x, 0, height, count, out, kStepFloats, 4);
+                continue;
+            }
+            for (int y = 0; y < height; ++y)
+            {
+                float* block = ioBuffers.mPlane.data() + (y / kStep) * blockFloats +
+                               x * kStepFloats + (y % kStep) * 4;
+                for (int i = 0; i < count; ++i)
+                    std::memcpy(block + i * kStepFloats, out + y * kStepFloats + i * 4,
+                                4 * sizeof(float));
             }
         }
     }
@@ -238,38 +249,21 @@ private:
                          BlurBuffers& ioBuffers, bool inFromPlane)
     {
         const int width = inPixels.mWidth, height = inPixels.mHeight;
-        const auto rowFloats = static_cast<std::size_t>(width) * 4;
-        float* in = ioBuffers.mIn.data();
+        const std::ptrdiff_t blockFloats = static_cast<std::ptrdiff_t>(width) * kStepFloats;
         float* out = ioBuffers.mOut.data();
         for (int y = 0; y < height; y += kStep)
         {
             const int count = std::min(kStep, height - y);
-            if (count < kStep)
-                std::fill(ioBuffers.mIn.begin(), ioBuffers.mIn.end(), 0.0f);
-            for (int r = 0; r < count; ++r)
+            float* in = ioBuffers.mPlane.data() + (y / kStep) * blockFloats;
+            if (!inFromPlane)
             {
-                float* line = in + r * 4;
-                if (!inFromPlane)
-                {
-                    LoadPremultiplied(inPixels, 0, y + r, width, line, kStepFloats);
-                    continue;
-                }
-                const float* source =
-                    ioBuffers.mPlane.data() + rowFloats * static_cast<std::size_t>(y + r);
-                for (int x = 0; x < width; ++x)
-                    std::memcpy(line + x * kStepFloats, source + x * 4, 4 * sizeof(float));
+                in = ioBuffers.mIn.data();
+                if (count < kStep)
+                    std::fill(ioBuffers.mIn.begin(), ioBuffers.mIn.end(), 0.0f);
+                LoadPremultiplied(inPixels, 0, y, count, width, in, 4, kStepFloats);
             }
             Simd::BlurLine(in, kStepFloats, out, kStepFloats, width, inKernel);
-            if (inPixels.mFloat)
-            {
-                for (int r = 0; r < count; ++r)
-                    StoreStraight(inPixels, 0, y + r, width, out + r * 4, kStepFloats);
-                continue;
-            }
-            std::uint8_t* rows[kStep];
-            for (int r = 0; r < count; ++r)
-                rows[r] = inPixels.Row<std::uint8_t>(y + r);
-            Simd::StoreStraight8Block(out, width, count, rows);
+            StoreStraight(inPixels, 0, y, count, width, out, 4, kStepFloats);
         }
     }
 

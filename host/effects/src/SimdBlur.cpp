@@ -148,7 +148,7 @@ void BlurLineImpl(const float* inSource, std::ptrdiff_t inSourceStride, float* o
 
 #if HWY_TARGET == HWY_SCALAR
 // The one-lane fallback: plain loops.
-void Load8Impl(const std::uint8_t* inRow, int inCount, float* outValues, std::ptrdiff_t inStride)
+void Load8Row(const std::uint8_t* inRow, int inCount, float* outValues, std::ptrdiff_t inStride)
 {
     for (int i = 0; i < inCount; ++i, inRow += 4, outValues += inStride)
     {
@@ -159,7 +159,7 @@ void Load8Impl(const std::uint8_t* inRow, int inCount, float* outValues, std::pt
     }
 }
 
-void Store8Impl(const float* inValues, std::ptrdiff_t inStride, int inCount, std::uint8_t* outRow)
+void Store8Row(const float* inValues, std::ptrdiff_t inStride, int inCount, std::uint8_t* outRow)
 {
     for (int i = 0; i < inCount; ++i, inValues += inStride, outRow += 4)
     {
@@ -171,11 +171,6 @@ void Store8Impl(const float* inValues, std::ptrdiff_t inStride, int inCount, std
             outRow[c] = static_cast<std::uint8_t>(std::clamp(scaled, 0, 255));
         }
     }
-}
-void Store8BlockImpl(const float* inValues, int inCount, int inRows, std::uint8_t* const* outRows)
-{
-    for (int r = 0; r < inRows; ++r)
-        Store8Impl(inValues + r * 4, kBlurStepFloats, inCount, outRows[r]);
 }
 #else
 // 1 / inAlpha where inAlpha > 0, else 0: the estimate and one Newton step,
@@ -217,7 +212,7 @@ hn::Vec<hn::RebindToSigned<D>> Straighten(D inD, hn::Vec<D> inValues)
     return hn::ConvertTo(di, hn::MulAdd(straight, hn::Set(inD, 255.0f), hn::Set(inD, 0.5f)));
 }
 
-void Load8Impl(const std::uint8_t* inRow, int inCount, float* outValues, std::ptrdiff_t inStride)
+void Load8Row(const std::uint8_t* inRow, int inCount, float* outValues, std::ptrdiff_t inStride)
 {
     const Tag d;
     constexpr int kPixels = static_cast<int>(kLanes / 4);
@@ -230,7 +225,7 @@ void Load8Impl(const std::uint8_t* inRow, int inCount, float* outValues, std::pt
         hn::StoreU(Premultiply(d4, inRow + i * 4), d4, outValues + i * inStride);
 }
 
-void Store8Impl(const float* inValues, std::ptrdiff_t inStride, int inCount, std::uint8_t* outRow)
+void Store8Row(const float* inValues, std::ptrdiff_t inStride, int inCount, std::uint8_t* outRow)
 {
     const Tag d;
     constexpr int kPixels = static_cast<int>(kLanes / 4);
@@ -247,9 +242,10 @@ void Store8Impl(const float* inValues, std::ptrdiff_t inStride, int inCount, std
                    outRow + i * 4);
 }
 
-// A block line (step x holds pixel x of inRows rows) into those rows: every
-// vector of a step is converted at once, then its pixels go to their rows.
-void Store8BlockImpl(const float* inValues, int inCount, int inRows, std::uint8_t* const* outRows)
+// Block layout (pixel x of row r at inValues + x * kBlurStepFloats + r * 4):
+// every vector of a step is converted at once, then its pixels go to their rows.
+void Store8Block(const float* inValues, int inRows, int inCount, std::uint8_t* outFirst,
+                 std::ptrdiff_t inRowBytes)
 {
     const Tag d;
     constexpr int kPixels = static_cast<int>(kLanes / 4);
@@ -258,15 +254,33 @@ void Store8BlockImpl(const float* inValues, int inCount, int inRows, std::uint8_
     for (int x = 0; x < inCount; ++x, inValues += kBlurStepFloats)
         for (int r0 = 0; r0 < inRows; r0 += kPixels)
         {
-            alignas(16) std::uint32_t pixels[kPixels > 4 ? kPixels : 4];
+            std::uint32_t pixels[kPixels > 4 ? kPixels : 4];
             const auto codes = hn::DemoteTo(d8, Straighten(d, hn::LoadU(d, inValues + r0 * 4)));
             hn::StoreU(hn::BitCast(d32, codes), d32, pixels);
             const int rows = std::min(kPixels, inRows - r0);
             for (int r = 0; r < rows; ++r)
-                std::memcpy(outRows[r0 + r] + x * 4, &pixels[r], 4);
+                std::memcpy(outFirst + (r0 + r) * inRowBytes + x * 4, &pixels[r], 4);
         }
 }
 #endif
+
+void Load8Impl(const std::uint8_t* inFirst, std::ptrdiff_t inRowBytes, int inRows, int inCount,
+               float* outValues, std::ptrdiff_t inRowFloats, std::ptrdiff_t inPixelFloats)
+{
+    for (int r = 0; r < inRows; ++r)
+        Load8Row(inFirst + r * inRowBytes, inCount, outValues + r * inRowFloats, inPixelFloats);
+}
+
+void Store8Impl(const float* inValues, std::ptrdiff_t inRowFloats, std::ptrdiff_t inPixelFloats,
+                int inRows, int inCount, std::uint8_t* outFirst, std::ptrdiff_t inRowBytes)
+{
+#if HWY_TARGET != HWY_SCALAR
+    if (inRowFloats == 4 && inPixelFloats == kBlurStepFloats)
+        return Store8Block(inValues, inRows, inCount, outFirst, inRowBytes);
+#endif
+    for (int r = 0; r < inRows; ++r)
+        Store8Row(inValues + r * inRowFloats, inPixelFloats, inCount, outFirst + r * inRowBytes);
+}
 
 } // namespace FX::detail::Simd::HWY_NAMESPACE
 HWY_AFTER_NAMESPACE();
@@ -278,7 +292,6 @@ namespace FX::detail::Simd
 HWY_EXPORT(BlurLineImpl);
 HWY_EXPORT(Load8Impl);
 HWY_EXPORT(Store8Impl);
-HWY_EXPORT(Store8BlockImpl);
 
 void BlurLine(const float* inSource, std::ptrdiff_t inSourceStride, float* outTarget,
               std::ptrdiff_t outTargetStride, int inCount, const BlurLineKernel& inKernel)
@@ -287,22 +300,19 @@ void BlurLine(const float* inSource, std::ptrdiff_t inSourceStride, float* outTa
     (inSource, inSourceStride, outTarget, outTargetStride, inCount, inKernel);
 }
 
-void LoadPremultiplied8(const std::uint8_t* inRow, int inCount, float* outValues,
-                        std::ptrdiff_t inStride)
+void LoadPremultiplied8(const std::uint8_t* inFirst, std::ptrdiff_t inRowBytes, int inRows,
+                        int inCount, float* outValues, std::ptrdiff_t inRowFloats,
+                        std::ptrdiff_t inPixelFloats)
 {
-    HWY_DYNAMIC_DISPATCH(Load8Impl)(inRow, inCount, outValues, inStride);
+    HWY_DYNAMIC_DISPATCH(Load8Impl)
+    (inFirst, inRowBytes, inRows, inCount, outValues, inRowFloats, inPixelFloats);
 }
 
-void StoreStraight8(const float* inValues, std::ptrdiff_t inStride, int inCount,
-                    std::uint8_t* outRow)
+void StoreStraight8(const float* inValues, std::ptrdiff_t inRowFloats, std::ptrdiff_t inPixelFloats,
+                    int inRows, int inCount, std::uint8_t* outFirst, std::ptrdiff_t inRowBytes)
 {
-    HWY_DYNAMIC_DISPATCH(Store8Impl)(inValues, inStride, inCount, outRow);
-}
-
-void StoreStraight8Block(const float* inValues, int inCount, int inRows,
-                         std::uint8_t* const* outRows)
-{
-    HWY_DYNAMIC_DISPATCH(Store8BlockImpl)(inValues, inCount, inRows, outRows);
+    HWY_DYNAMIC_DISPATCH(Store8Impl)
+    (inValues, inRowFloats, inPixelFloats, inRows, inCount, outFirst, inRowBytes);
 }
 
 } // namespace FX::detail::Simd

@@ -44,19 +44,16 @@ struct BlurLineKernel
 void BlurLine(const float* inSource, std::ptrdiff_t inSourceStride, float* outTarget,
               std::ptrdiff_t outTargetStride, int inCount, const BlurLineKernel& inKernel);
 
-// inCount 8-bit straight B, G, R, A pixels at inRow to premultiplied floats in
-// 0..1, each pixel's four floats inStride floats after the one before.
-void LoadPremultiplied8(const std::uint8_t* inRow, int inCount, float* outValues,
-                        std::ptrdiff_t inStride);
+// inCount 8-bit straight B, G, R, A pixels of each of inRows rows (the first
+// at inFirst, each inRowBytes after the one before) to premultiplied floats in
+// 0..1: row r's pixel i at outValues + r * inRowFloats + i * inPixelFloats.
+void LoadPremultiplied8(const std::uint8_t* inFirst, std::ptrdiff_t inRowBytes, int inRows,
+                        int inCount, float* outValues, std::ptrdiff_t inRowFloats,
+                        std::ptrdiff_t inPixelFloats);
 
-// The reverse: premultiplied floats back to straight 8-bit pixels, rounded
-// (colour 0 where alpha is 0).
-void StoreStraight8(const float* inValues, std::ptrdiff_t inStride, int inCount,
-                    std::uint8_t* outRow);
-
-// A line of steps whose step x holds pixel x of inRows (at most
-// kBlurStepPixels) rows, as StoreStraight8 into row r at outRows[r].
-void StoreStraight8Block(const float* inValues, int inCount, int inRows,
-                         std::uint8_t* const* outRows);
+// The reverse, from premultiplied floats back to straight 8-bit pixels,
+// rounded (colour 0 where alpha is 0).
+void StoreStraight8(const float* inValues, std::ptrdiff_t inRowFloats, std::ptrdiff_t inPixelFloats,
+                    int inRows, int inCount, std::uint8_t* outFirst, std::ptrdiff_t inRowBytes);
 
 } // namespace FX::detail::Simd
