@@ -38,7 +38,7 @@ void RecursivePass(const float* inSource, std::ptrdiff_t inSourceStride, float* 
 {
     const Tag d;
     using V = hn::Vec<Tag>;
-    constexpr std::size_t kGroup = kVectors >= 2 ? 2 : 1;
+    constexpr std::size_t kGroup = kVectors >= 4 ? 4 : 1;
     const BlurLineKernel::Section& s0 = inKernel.sections[0];
     const BlurLineKernel::Section& s1 = inKernel.sections[1];
     const V e10 = hn::Set(d, s0.e1), e20 = hn::Set(d, s0.e2);
