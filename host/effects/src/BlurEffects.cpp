@@ -21,7 +21,6 @@
 #include "SimdBlur.h"
 
 #include <algorithm>
-#include <array>
 #include <cmath>
 #include <complex>
 #include <cstring>
