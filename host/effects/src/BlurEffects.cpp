@@ -41,7 +41,7 @@ constexpr ParamSpec kBlurParams[] = {
 };
 
 // Below this standard deviation the blur convolves with the sampled Gaussian.
-constexpr double kRecursiveFrom = 3.0;
+constexpr double kRecursiveFrom = 1.5;
 // The sampled Gaussian reaches this many standard deviations out.
 constexpr double kTapReach = 4.0;
 
