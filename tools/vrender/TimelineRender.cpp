@@ -11,6 +11,7 @@
 #include "MF/RenderableCutlistFactory.h"
 #include "ML/RenderableCutlistSource.h"
 #include "RenderJob.h"
+#include "TX/TransitionCatalogue.h"
 
 #include <cstdio>
 #include <set>
@@ -90,8 +91,9 @@ RenderOutcome RunTimelineRender(const RenderOptions& inOptions,
     outcome.mExitCode = 1;
     const BE::TimelineLoadResult loaded =
         inOptions.mBuiltInTimeline
-            ? BE::ParseTimeline(GetDemoTimelineText(), kDemoTimelineName, ".", FX::CheckEffect)
-            : BE::LoadTimelineFile(inOptions.mMedia, FX::CheckEffect);
+            ? BE::ParseTimeline(GetDemoTimelineText(), kDemoTimelineName, ".", FX::CheckEffect,
+                                TX::CheckTransition)
+            : BE::LoadTimelineFile(inOptions.mMedia, FX::CheckEffect, TX::CheckTransition);
     if (!loaded.Succeeded())
     {
         outcome.mError = loaded.mError;

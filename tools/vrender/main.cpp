@@ -26,6 +26,7 @@
 #include "PendingOutput.h"
 #include "Progress.h"
 #include "RenderJob.h"
+#include "TX/TransitionCatalogue.h"
 
 #include <atomic>
 #include <cerrno>
@@ -139,9 +140,10 @@ public:
 int RunTimelineInfo(const std::string& inPath)
 {
     const BE::TimelineLoadResult loaded =
-        inPath.empty() ? BE::ParseTimeline(vrender::GetDemoTimelineText(),
-                                           vrender::kDemoTimelineName, ".", FX::CheckEffect)
-                       : BE::LoadTimelineFile(inPath, FX::CheckEffect);
+        inPath.empty()
+            ? BE::ParseTimeline(vrender::GetDemoTimelineText(), vrender::kDemoTimelineName, ".",
+                                FX::CheckEffect, TX::CheckTransition)
+            : BE::LoadTimelineFile(inPath, FX::CheckEffect, TX::CheckTransition);
     if (!loaded.Succeeded())
     {
         std::fprintf(stderr, "vrender: %s\n", loaded.mError.c_str());

@@ -1,20 +1,31 @@
-// Gaussian Blur: three box blurs in a row along each blurred direction,
-// whose widths are chosen so that their sum of variances is that of the
-// Gaussian (the box widths differ by at most two pixels). Each box pass is
-// a running sum, so the cost per pixel does not grow with the blurriness.
-// The blur works on premultiplied float components (so transparent pixels
-// lend no colour) and repeats the edge pixels beyond the picture.
+// Gaussian Blur, separable: each blurred direction is filtered along lines of
+// the picture. Small standard deviations (below kRecursiveFrom pixels)
+// convolve with the sampled Gaussian itself, out to four deviations; larger
+// ones run a fourth-order recursive filter (two second-order sections, forward
+// and backward) whose impulse response is the sampled Gaussian to within 0.06 %
+// of its peak, so the cost per pixel does not grow with the blurriness. On an
+// 8-bit picture the result is within 1 code value of the true Gaussian.
 //
-// The effect keeps its working planes between frames (a fresh 1080p plane
-// would cost more to touch than the blur itself), so it renders one frame
-// at a time: it is not re-entrant.
+// The blur works on premultiplied float components (so transparent pixels lend
+// no colour) and repeats the edge pixels beyond the picture. Columns are
+// blurred first, in strips of 16 columns, into a float plane; rows then in
+// blocks of 16 rows, each block interleaved so that one step along the rows is
+// 16 pixels of contiguous floats (SimdBlur.h).
+//
+// The working buffers are kept between frames (a fresh 1080p plane would cost
+// more to touch than the blur itself), one set per frame being rendered, so
+// several frames may render at once.
 
 #include "EffectBase.h"
 #include "FX/EffectCatalogue.h"
+#include "SimdBlur.h"
 
 #include <algorithm>
-#include <array>
 #include <cmath>
+#include <complex>
+#include <cstring>
+#include <memory>
+#include <mutex>
 
 namespace FX::detail
 {
@@ -29,231 +40,252 @@ constexpr ParamSpec kBlurParams[] = {
     {"dimensions", ParamType::kChoice, 0.0, 0.0, 2.0, 0.0, kDimensions},
 };
 
-constexpr int kPasses = 3;
+// Below this standard deviation the blur convolves with the sampled Gaussian.
+constexpr double kRecursiveFrom = 1.5;
+// The sampled Gaussian reaches this many standard deviations out.
+constexpr double kTapReach = 4.0;
 
-// The radii of the three boxes for standard deviation inSigma.
-std::array<int, kPasses> BoxRadii(double inSigma)
+// exp(-x * x / 2) for x >= 0 as the sum over two terms of
+// (a cos(w x) + b sin(w x)) exp(-l x): the recursive filter's kernel, in
+// standard deviations.
+struct Term
 {
-    const double ideal = std::sqrt(12.0 * inSigma * inSigma / kPasses + 1.0);
-    int lower = static_cast<int>(std::floor(ideal));
-    if (lower % 2 == 0)
-        --lower;
-    const int upper = lower + 2;
-    const double m = (12.0 * inSigma * inSigma - kPasses * lower * lower - 4.0 * kPasses * lower -
-                      3.0 * kPasses) /
-                     (-4.0 * lower - 4.0);
-    const int smaller = static_cast<int>(std::lround(m));
-    std::array<int, kPasses> radii{};
-    for (int i = 0; i < kPasses; ++i)
-        radii[static_cast<std::size_t>(i)] = ((i < smaller ? lower : upper) - 1) / 2;
-    return radii;
-}
+    double a, b, w, l;
+};
+constexpr Term kTerms[2] = {{1.6800, 3.7350, 0.6318, 1.7830}, {-0.6803, -0.2598, 1.9970, 1.7230}};
 
-// One box pass of radius inRadius along a line of inCount steps, each step
-// kLanes contiguous floats (a pixel's four components, or a strip of pixels
-// of one row), steps inInStride floats apart in inSource and inOutStride
-// apart in outTarget. Beyond the line's ends its end steps repeat.
-template <int kLanes>
-void BoxLine(const float* inSource, std::ptrdiff_t inInStride, float* outTarget,
-             std::ptrdiff_t inOutStride, int inCount, int inRadius)
+// One blurred direction: the vector kernel's description and the weights it
+// points at.
+struct LineKernel
 {
-    const float scale = 1.0f / static_cast<float>(2 * inRadius + 1);
-    float sum[kLanes];
-    auto step = [&](int inIndex)
-    { return inSource + std::clamp(inIndex, 0, inCount - 1) * inInStride; };
-    for (int c = 0; c < kLanes; ++c)
-        sum[c] = 0.0f;
-    for (int i = -inRadius - 1; i < inRadius; ++i)
+    explicit LineKernel(double inSigma)
     {
-        const float* in = step(i);
-        for (int c = 0; c < kLanes; ++c)
-            sum[c] += in[c];
-    }
-    auto emit = [&](int inIndex, const float* inAdded, const float* inRemoved)
-    {
-        float* out = outTarget + inIndex * inOutStride;
-        for (int c = 0; c < kLanes; ++c)
+        if (inSigma >= kRecursiveFrom)
         {
-            sum[c] += inAdded[c] - inRemoved[c];
-            out[c] = sum[c] * scale;
+            Recursive(inSigma);
+            return;
         }
-    };
-    // The steps whose window reaches past an end take the clamped reads.
-    const int safeFrom = std::min(inCount, inRadius + 1);
-    const int safeTo = std::max(safeFrom, inCount - inRadius);
-    for (int i = 0; i < safeFrom; ++i)
-        emit(i, step(i + inRadius), step(i - inRadius - 1));
-    for (int i = safeFrom; i < safeTo; ++i)
-        emit(i, inSource + (i + inRadius) * inInStride, inSource + (i - inRadius - 1) * inInStride);
-    for (int i = safeTo; i < inCount; ++i)
-        emit(i, step(i + inRadius), step(i - inRadius - 1));
-}
+        const int radius = static_cast<int>(std::ceil(kTapReach * inSigma));
+        std::vector<double> weights(static_cast<std::size_t>(radius) + 1);
+        double total = 0.0;
+        for (int t = 0; t <= radius; ++t)
+        {
+            weights[static_cast<std::size_t>(t)] = std::exp(-0.5 * t * t / (inSigma * inSigma));
+            total += (t == 0 ? 1.0 : 2.0) * weights[static_cast<std::size_t>(t)];
+        }
+        for (double w : weights)
+            mTaps.push_back(static_cast<float>(w / total));
+        mSimd.taps = mTaps.data();
+        mSimd.tapRadius = radius;
+    }
 
-// Pixels [inX, inX + inCount) of row inY as premultiplied floats, each pixel's
-// four inStride floats after the one before.
-template <std::ptrdiff_t inStride = 4>
-void LoadPremultiplied(const Pixels& inPixels, int inX, int inY, int inCount, float* outValues)
-{
-    if (inPixels.mFloat)
+    // Term k at sample n >= 0 is Re(c p^n) with c = a - ib, p = exp((-l + iw) / sigma):
+    // a section with poles p and its conjugate, numerator Re(c) - Re(c conj(p)) z^-1.
+    // The feedback is rounded to float first and the whole kernel (causal half
+    // plus the mirrored rest without its centre) scaled to a gain of exactly 1
+    // with the rounded poles, so a flat picture stays flat however wide the
+    // blur.
+    void Recursive(double inSigma)
     {
-        const float* p = inPixels.Row<float>(inY) + inX * 4;
-        for (int i = 0; i < inCount * 4; i += 4, outValues += inStride)
+        double b0[2], b1[2], e1[2], e2[2], total = 0.0;
+        for (int k = 0; k < 2; ++k)
+        {
+            const std::complex<double> c(kTerms[k].a, -kTerms[k].b);
+            const std::complex<double> p =
+                std::exp(std::complex<double>(-kTerms[k].l, kTerms[k].w) / inSigma);
+            e1[k] = static_cast<float>(-2.0 * p.real());
+            e2[k] = static_cast<float>(std::norm(p));
+            b0[k] = c.real();
+            b1[k] = -(c * std::conj(p)).real();
+            const double causal = (b0[k] + b1[k]) / (1.0 + e1[k] + e2[k]);
+            total += 2.0 * causal - b0[k];
+        }
+        for (int k = 0; k < 2; ++k)
+        {
+            Simd::BlurLineKernel::Section& s = mSimd.sections[k];
+            const double f0 = b0[k] / total, f1 = b1[k] / total;
+            const double c1 = f1 - e1[k] * f0, c2 = -e2[k] * f0;
+            s.b0 = static_cast<float>(f0), s.b1 = static_cast<float>(f1);
+            s.c1 = static_cast<float>(c1), s.c2 = static_cast<float>(c2);
+            s.e1 = static_cast<float>(e1[k]), s.e2 = static_cast<float>(e2[k]);
+            s.forwardSteady = static_cast<float>((f0 + f1) / (1.0 + e1[k] + e2[k]));
+            s.backwardSteady = static_cast<float>((c1 + c2) / (1.0 + e1[k] + e2[k]));
+        }
+    }
+
+    std::vector<float> mTaps;
+    Simd::BlurLineKernel mSimd;
+};
+
+// Pixels [inX, inX + inCount) of rows [inY, inY + inRows) as premultiplied
+// floats: row r's pixel i at outValues + r * inRowFloats + i * inPixelFloats.
+void LoadPremultiplied(const Pixels& inPixels, int inX, int inY, int inRows, int inCount,
+                       float* outValues, std::ptrdiff_t inRowFloats, std::ptrdiff_t inPixelFloats)
+{
+    if (!inPixels.mFloat)
+        return Simd::LoadPremultiplied8(inPixels.Row<std::uint8_t>(inY) + inX * 4,
+                                        inPixels.mRowBytes, inRows, inCount, outValues, inRowFloats,
+                                        inPixelFloats);
+    for (int r = 0; r < inRows; ++r)
+    {
+        const float* p = inPixels.Row<float>(inY + r) + inX * 4;
+        float* values = outValues + r * inRowFloats;
+        for (int i = 0; i < inCount * 4; i += 4, values += inPixelFloats)
         {
             const float a = p[i + 3];
-            outValues[0] = p[i] * a, outValues[1] = p[i + 1] * a;
-            outValues[2] = p[i + 2] * a, outValues[3] = a;
+            values[0] = p[i] * a, values[1] = p[i + 1] * a;
+            values[2] = p[i + 2] * a, values[3] = a;
         }
-        return;
-    }
-    const std::uint8_t* p = inPixels.Row<std::uint8_t>(inY) + inX * 4;
-    for (int i = 0; i < inCount * 4; i += 4, outValues += inStride)
-    {
-        const float a = kUnit8[p[i + 3]];
-        outValues[0] = kUnit8[p[i]] * a, outValues[1] = kUnit8[p[i + 1]] * a;
-        outValues[2] = kUnit8[p[i + 2]] * a, outValues[3] = a;
     }
 }
 
 // The same pixels back from premultiplied floats.
-template <std::ptrdiff_t inStride = 4>
-void StoreStraight(const Pixels& inPixels, int inX, int inY, int inCount, const float* inValues)
+void StoreStraight(const Pixels& inPixels, int inX, int inY, int inRows, int inCount,
+                   const float* inValues, std::ptrdiff_t inRowFloats, std::ptrdiff_t inPixelFloats)
 {
-    auto inverse = [](float inAlpha) { return inAlpha > 0.0f ? 1.0f / inAlpha : 0.0f; };
-    if (inPixels.mFloat)
+    if (!inPixels.mFloat)
+        return Simd::StoreStraight8(inValues, inRowFloats, inPixelFloats, inRows, inCount,
+                                    inPixels.Row<std::uint8_t>(inY) + inX * 4, inPixels.mRowBytes);
+    for (int r = 0; r < inRows; ++r)
     {
-        float* p = inPixels.Row<float>(inY) + inX * 4;
-        for (int i = 0; i < inCount * 4; i += 4, inValues += inStride)
+        float* p = inPixels.Row<float>(inY + r) + inX * 4;
+        const float* values = inValues + r * inRowFloats;
+        for (int i = 0; i < inCount * 4; i += 4, values += inPixelFloats)
         {
-            const float a = inValues[3], k = inverse(a);
-            p[i] = inValues[0] * k, p[i + 1] = inValues[1] * k;
-            p[i + 2] = inValues[2] * k, p[i + 3] = a;
+            const float a = values[3], k = a > 0.0f ? 1.0f / a : 0.0f;
+            p[i] = values[0] * k, p[i + 1] = values[1] * k;
+            p[i + 2] = values[2] * k, p[i + 3] = a;
         }
-        return;
-    }
-    std::uint8_t* p = inPixels.Row<std::uint8_t>(inY) + inX * 4;
-    for (int i = 0; i < inCount * 4; i += 4, inValues += inStride)
-    {
-        const float a = inValues[3], k = inverse(a);
-        p[i] = ToByte(inValues[0] * k), p[i + 1] = ToByte(inValues[1] * k);
-        p[i + 2] = ToByte(inValues[2] * k), p[i + 3] = ToByte(a);
     }
 }
+
+// The working buffers of one render, premultiplied BGRA floats: the plane
+// between the two directions, in blocks of kStep rows (the last padded) laid
+// out as the row pass reads them, and an input and an output line of steps
+// as long as the longer side.
+struct BlurBuffers
+{
+    void Reserve(int inWidth, int inHeight)
+    {
+        const auto longer = static_cast<std::size_t>(std::max(inWidth, inHeight));
+        const auto blocks = static_cast<std::size_t>((inHeight + Simd::kBlurStepPixels - 1) /
+                                                     Simd::kBlurStepPixels);
+        mPlane.resize(blocks * static_cast<std::size_t>(inWidth) * Simd::kBlurStepFloats);
+        mIn.resize(longer * Simd::kBlurStepFloats);
+        mOut.resize(longer * Simd::kBlurStepFloats);
+    }
+
+    std::vector<float> mPlane;
+    std::vector<float> mIn;
+    std::vector<float> mOut;
+};
+
+constexpr int kStep = Simd::kBlurStepPixels;
+constexpr std::ptrdiff_t kStepFloats = Simd::kBlurStepFloats;
 
 class GaussianBlurEffect : public EffectBase
 {
 public:
     using EffectBase::EffectBase;
-    bool IsReentrant() const override { return false; }
+    bool IsReentrant() const override { return true; }
 
 protected:
     QRT::Result RenderInPlace(const RenderContext& inContext, const Pixels& inPixels) override
     {
         const double sigma = Value(0, inContext) * inContext.mScale;
         const int dimensions = static_cast<int>(Value(1, inContext));
-        const int width = inPixels.mWidth, height = inPixels.mHeight;
-        if (sigma < 0.2 || width == 0 || height == 0)
+        if (sigma < 0.2 || inPixels.mWidth == 0 || inPixels.mHeight == 0)
             return QRT::kResult_Success;
-        const std::array<int, kPasses> radii = BoxRadii(sigma);
+        std::unique_ptr<BlurBuffers> buffers = Lease();
+        const LineKernel kernel(sigma);
+        buffers->Reserve(inPixels.mWidth, inPixels.mHeight);
         const bool horizontal = dimensions != 2, vertical = dimensions != 1;
-        // Rows are blurred in blocks of kStrip rows (the last few one at a
-        // time) in two block buffers, which stay in the cache; columns in
-        // strips of kStrip pixels, for the same reason. Between the two the
-        // plane holds the horizontally blurred picture.
-        const std::size_t rowFloats = static_cast<std::size_t>(width) * 4;
-        const std::size_t stripFloats = static_cast<std::size_t>(height) * kStrip * 4;
-        mRowA.resize(rowFloats);
-        mRowB.resize(rowFloats);
         if (vertical)
-        {
-            mPlane.resize(rowFloats * static_cast<std::size_t>(height));
-            mStripA.resize(stripFloats);
-            mStripB.resize(stripFloats);
-        }
-        float* rowA = mRowA.data();
-        float* rowB = mRowB.data();
-        constexpr std::ptrdiff_t kStripStride = kStrip * 4;
-        int firstSingleRow = 0;
+            BlurColumns(inPixels, kernel.mSimd, *buffers, horizontal);
         if (horizontal)
-        {
-            // Blocks of kStrip rows, interleaved so that one step along the
-            // rows is kStrip pixels of contiguous floats.
-            mRowA.resize(rowFloats * kStrip);
-            mRowB.resize(rowFloats * kStrip);
-            rowA = mRowA.data();
-            rowB = mRowB.data();
-            for (; firstSingleRow + kStrip <= height; firstSingleRow += kStrip)
-            {
-                const int y0 = firstSingleRow;
-                for (int r = 0; r < kStrip; ++r)
-                    LoadPremultiplied<kStripStride>(inPixels, 0, y0 + r, width, rowA + r * 4);
-                BoxLine<kStrip * 4>(rowA, kStripStride, rowB, kStripStride, width, radii[0]);
-                BoxLine<kStrip * 4>(rowB, kStripStride, rowA, kStripStride, width, radii[1]);
-                BoxLine<kStrip * 4>(rowA, kStripStride, rowB, kStripStride, width, radii[2]);
-                for (int r = 0; r < kStrip; ++r)
-                {
-                    if (!vertical)
-                    {
-                        StoreStraight<kStripStride>(inPixels, 0, y0 + r, width, rowB + r * 4);
-                        continue;
-                    }
-                    float* target = mPlane.data() + rowFloats * static_cast<std::size_t>(y0 + r);
-                    const float* source = rowB + r * 4;
-                    for (int x = 0; x < width; ++x)
-                        for (int c = 0; c < 4; ++c)
-                            target[x * 4 + c] = source[x * kStripStride + c];
-                }
-            }
-        }
-        for (int y = firstSingleRow; y < height; ++y)
-        {
-            float* target =
-                vertical ? mPlane.data() + rowFloats * static_cast<std::size_t>(y) : rowA;
-            LoadPremultiplied(inPixels, 0, y, width, horizontal ? rowA : target);
-            if (horizontal)
-            {
-                BoxLine<4>(rowA, 4, rowB, 4, width, radii[0]);
-                BoxLine<4>(rowB, 4, rowA, 4, width, radii[1]);
-                BoxLine<4>(rowA, 4, vertical ? target : rowB, 4, width, radii[2]);
-            }
-            if (!vertical)
-                StoreStraight(inPixels, 0, y, width, horizontal ? rowB : target);
-        }
-        if (!vertical)
-            return QRT::kResult_Success;
-        const auto planeStride = static_cast<std::ptrdiff_t>(rowFloats);
-        for (int x = 0; x + kStrip <= width; x += kStrip)
-        {
-            BoxLine<kStrip * 4>(mPlane.data() + x * 4, planeStride, mStripA.data(), kStripStride,
-                                height, radii[0]);
-            BoxLine<kStrip * 4>(mStripA.data(), kStripStride, mStripB.data(), kStripStride, height,
-                                radii[1]);
-            BoxLine<kStrip * 4>(mStripB.data(), kStripStride, mStripA.data(), kStripStride, height,
-                                radii[2]);
-            for (int y = 0; y < height; ++y)
-                StoreStraight(inPixels, x, y, kStrip, mStripA.data() + y * kStripStride);
-        }
-        // The last columns, fewer than a strip, one pixel at a time.
-        for (int x = width - width % kStrip; x < width; ++x)
-        {
-            BoxLine<4>(mPlane.data() + x * 4, planeStride, mStripA.data(), 4, height, radii[0]);
-            BoxLine<4>(mStripA.data(), 4, mStripB.data(), 4, height, radii[1]);
-            BoxLine<4>(mStripB.data(), 4, mStripA.data(), 4, height, radii[2]);
-            for (int y = 0; y < height; ++y)
-                StoreStraight(inPixels, x, y, 1, mStripA.data() + y * 4);
-        }
+            BlurRows(inPixels, kernel.mSimd, *buffers, vertical);
+        Return(std::move(buffers));
         return QRT::kResult_Success;
     }
 
 private:
-    static constexpr int kStrip = 16;
+    // Columns, in strips of kStep (the last may be narrower: its spare lanes
+    // are blurred too, and dropped), from the picture into the plane
+    // (inToPlane) or back into the picture.
+    static void BlurColumns(const Pixels& inPixels, const Simd::BlurLineKernel& inKernel,
+                            BlurBuffers& ioBuffers, bool inToPlane)
+    {
+        const int width = inPixels.mWidth, height = inPixels.mHeight;
+        const std::ptrdiff_t blockFloats = static_cast<std::ptrdiff_t>(width) * kStepFloats;
+        float* in = ioBuffers.mIn.data();
+        float* out = ioBuffers.mOut.data();
+        for (int x = 0; x < width; x += kStep)
+        {
+            const int count = std::min(kStep, width - x);
+            if (count < kStep)
+                std::fill(ioBuffers.mIn.begin(), ioBuffers.mIn.end(), 0.0f);
+            LoadPremultiplied(inPixels, x, 0, height, count, in, kStepFloats, 4);
+            Simd::BlurLine(in, kStepFloats, out, kStepFloats, height, inKernel);
+            if (!inToPlane)
+            {
+                StoreStraight(inPixels, x, 0, height, count, out, kStepFloats, 4);
+                continue;
+            }
+            for (int y = 0; y < height; ++y)
+            {
+                float* block = ioBuffers.mPlane.data() + (y / kStep) * blockFloats +
+                               x * kStepFloats + (y % kStep) * 4;
+                for (int i = 0; i < count; ++i)
+                    std::memcpy(block + i * kStepFloats, out + y * kStepFloats + i * 4,
+                                4 * sizeof(float));
+            }
+        }
+    }
 
-    // The working buffers, premultiplied BGRA floats, reused from frame to
-    // frame. Touched only inside RenderInPlace, which the caller serialises.
-    std::vector<float> mRowA;
-    std::vector<float> mRowB;
-    std::vector<float> mPlane;
-    std::vector<float> mStripA;
-    std::vector<float> mStripB;
+    // Rows, in blocks of kStep (the last may hold fewer), from the plane
+    // (inFromPlane) or the picture into the picture.
+    static void BlurRows(const Pixels& inPixels, const Simd::BlurLineKernel& inKernel,
+                         BlurBuffers& ioBuffers, bool inFromPlane)
+    {
+        const int width = inPixels.mWidth, height = inPixels.mHeight;
+        const std::ptrdiff_t blockFloats = static_cast<std::ptrdiff_t>(width) * kStepFloats;
+        float* out = ioBuffers.mOut.data();
+        for (int y = 0; y < height; y += kStep)
+        {
+            const int count = std::min(kStep, height - y);
+            float* in = ioBuffers.mPlane.data() + (y / kStep) * blockFloats;
+            if (!inFromPlane)
+            {
+                in = ioBuffers.mIn.data();
+                if (count < kStep)
+                    std::fill(ioBuffers.mIn.begin(), ioBuffers.mIn.end(), 0.0f);
+                LoadPremultiplied(inPixels, 0, y, count, width, in, 4, kStepFloats);
+            }
+            Simd::BlurLine(in, kStepFloats, out, kStepFloats, width, inKernel);
+            StoreStraight(inPixels, 0, y, count, width, out, 4, kStepFloats);
+        }
+    }
+
+    std::unique_ptr<BlurBuffers> Lease()
+    {
+        std::lock_guard lock(mSpareMutex);
+        if (mSpare.empty())
+            return std::make_unique<BlurBuffers>();
+        std::unique_ptr<BlurBuffers> buffers = std::move(mSpare.back());
+        mSpare.pop_back();
+        return buffers;
+    }
+
+    void Return(std::unique_ptr<BlurBuffers> inBuffers)
+    {
+        std::lock_guard lock(mSpareMutex);
+        mSpare.push_back(std::move(inBuffers));
+    }
+
+    // Guards mSpare: the buffer sets of finished renders, one per frame that
+    // rendered at once, reused by the next.
+    std::mutex mSpareMutex;
+    std::vector<std::unique_ptr<BlurBuffers>> mSpare;
 };
 
 } // namespace

@@ -217,4 +217,10 @@ TransitionCreation CreateTransition(const BE::TransitionSettings& inSettings)
     return creation;
 }
 
+BE::EffectCheckResult CheckTransition(const BE::TransitionSettings& inSettings)
+{
+    TransitionCreation creation = CreateTransition(inSettings);
+    return {std::move(creation.mError), std::move(creation.mWarnings)};
+}
+
 } // namespace TX

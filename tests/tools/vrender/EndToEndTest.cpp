@@ -130,13 +130,14 @@ TEST_F(EndToEndTest, ATimelineClipThatFailsToReadFailsItsFrameOnly)
               "vrender: " + reason + "; written black\nvrender: " + reason + " (written black)\n");
     EXPECT_EQ(NumberFrames(going.mOut), (std::vector<int>{1, 1, 0, 1, 2, 3, -1, 1}));
 
-    // What the renderer cannot build is the timeline's fault, said as such.
+    // What the renderer cannot build is the timeline's fault, said as such at load.
     std::ofstream(timeline) << R"({"sequences": [{"name": "T", "tracks": [{"items": [{"end": 1,
         "media": {"color": "#404040"}, "transitions": [{"match": "X", "start": 0, "end": 1}]}]}]}]})";
     const auto refused = Run({"render", timeline, "-o", "-"});
     EXPECT_EQ(refused.mExitCode, 1);
     EXPECT_EQ(refused.mErr, "vrender: " + timeline +
-                                ": unknown transition match name \"X\" on item 0 of track 0\n");
+                                ":2: /sequences/0/tracks/0/items/0/transitions/0/match: unknown "
+                                "transition match name \"X\"\n");
 }
 
 TEST_F(EndToEndTest, AFrameLargerThanTheMemoryBudgetIsRefusedBeforeRendering)

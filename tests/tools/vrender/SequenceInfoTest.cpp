@@ -71,4 +71,36 @@ TEST_F(SequenceInfoRunTest, WarnsOncePerMissingFileAndRefusesABadTimeline)
     EXPECT_EQ(refused.mOut, "");
 }
 
+// Transitions are checked at load: a clamped parameter is warned of, an
+// unknown transition refuses the file, each naming the file, line and place.
+TEST_F(SequenceInfoRunTest, TransitionsAreCheckedAtLoad)
+{
+    const std::string place = ":3: /sequences/0/tracks/0/items/0/transitions/0";
+    const struct
+    {
+        const char* mTransition;
+        int mExitCode;
+        std::string mErr;
+    } cases[] = {
+        {R"("TX.Wipe", "params": {"start": "150"})", 0,
+         "vrender: warning: " + place +
+             ": transition \"TX.Wipe\": parameter \"start\" 150 clamped to 100\n"},
+        {R"("TX.Spin")", 2,
+         "vrender: " + place + "/match: unknown transition match name \"TX.Spin\"\n"},
+    };
+    for (const auto& c : cases)
+    {
+        const std::string path = (mDirectory / "t.json").string();
+        std::ofstream(path) << "{\"sequences\": [{\"name\": \"S\", \"tracks\": [{\"items\": [\n"
+                               "  {\"end\": 1, \"media\": {\"color\": \"#102030\"},\n"
+                               "   \"transitions\": [{\"start\": 0.5, \"end\": 1, \"match\": "
+                            << c.mTransition << "}]}]}]}]}";
+        const vrendertest::RunResult run = Run({"info", path});
+        EXPECT_EQ(run.mExitCode, c.mExitCode);
+        std::string expected = c.mErr;
+        expected.insert(expected.find(place), path);
+        EXPECT_EQ(run.mErr, expected);
+    }
+}
+
 } // namespace

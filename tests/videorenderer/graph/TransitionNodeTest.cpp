@@ -198,5 +198,34 @@ TEST(TransitionNodeTest, RendersOverAnAbsentInputAndPassesFailuresOn)
               a->mFailureStatus);
 }
 
+// Fixed mode: the caller's two frames are dissolved (the producers are never
+// asked) and each frame hash is new, even for the same request.
+TEST(TransitionNodeTest, FixedModeRendersTheSuppliedFramesUnderAFreshHash)
+{
+    auto unused = QRT::Allocated<vrtest::TestProducer>::CreateInstance();
+    unused->mFailure = vrtest::ProducerFailure::kStatus;
+    ML::TransitionProducerSetup setup;
+    setup.mTransition = Transition();
+    setup.mParameters = setup.mTransition->GetParameters();
+    setup.mFixed = true;
+    const std::uint8_t colours[2] = {40, 200};
+    for (std::size_t i = 0; i < 2; ++i)
+    {
+        setup.mSides[i].mProducer = ProducerRef(unused.Get());
+        setup.mSides[i].mFixedFrame = vrtest::MakeFrame(8, 4);
+        vrtest::Fill(*setup.mSides[i].mFixedFrame, {colours[i], colours[i], colours[i], 255});
+    }
+    const ProducerRef producer = ML::CreateTransitionNodeProducer(setup);
+    const ML::CutlistRenderParams params = At(250);
+    QRT::InterfaceRef<MF::IVideoFrame> frame;
+    ASSERT_EQ(producer->ProduceFrame(params.GetFrameTime(), params, frame), QRT::kResult_Success);
+    EXPECT_TRUE(vrtest::IsFilledWith(frame, {80, 80, 80, 255}));
+    QRT::Guid first, second;
+    producer->GetFrameHash(first, params.GetFrameTime(), params);
+    producer->GetFrameHash(second, params.GetFrameTime(), params);
+    EXPECT_NE(first, second);
+    EXPECT_EQ(unused->LastHashTime(), MF::FrameTime());
+}
+
 } // namespace
 } // namespace graphtest

@@ -44,17 +44,21 @@ QRT::InterfaceRef<MF::IRenderableNode> CreateTransitionNode(const TransitionNode
 
 // What a transition producer is made of: per input its offset, its producer
 // (may be empty) and its geometry per field; the host transition, its
-// settings and the node hash.
+// settings and the node hash. In fixed mode the two inputs are the frames
+// the caller supplies (either may be empty) instead of producers, and every
+// frame hash is fresh, so a fixed render is never shared or cached.
 struct TransitionProducerSetup
 {
     struct Side
     {
         mvxmediatypes::TickTime mOffset = mvxmediatypes::kTime_Zero;
         QRT::InterfaceRef<IRenderableNodeProducer> mProducer;
+        QRT::InterfaceRef<MF::IVideoFrame> mFixedFrame;
         MotionRecord mFirstField;
         MotionRecord mSecondField;
     };
     Side mSides[2];
+    bool mFixed = false;
     QRT::InterfaceRef<TX::ITransition> mTransition;
     TX::TransitionParameters mParameters;
     QRT::Guid mNodeHash;

@@ -45,10 +45,10 @@ bool IsPremultiplied(const MF::IVideoFrame& inFrame)
 // Made per request by the node, used by one thread at a time; holds the
 // input producers, the host transition and values only.
 //
-// Frame hash: "TransitionNodeProducer"; per input its producer's frame hash
-// at its input time and its two geometry records (64 bytes each), or the nil
-// hash without a producer; then the request's pixel aspect ratio (8 bytes),
-// width (4), height (4), the node hash (16), the requested frame time (16),
+// Frame hash: "TransitionNodeProducer"; in fixed mode a fresh unique value,
+// else per input its producer's frame hash at its input time and its two
+// geometry records (64 bytes each), or the nil hash without a producer; then the request's pixel
+// aspect ratio (8 bytes), width (4), height (4), the node hash (16), the requested frame time (16),
 // quality (4), secondary quality (4) and pixel format (8).
 class TransitionNodeProducer : public QRT::Implements<IRenderableNodeProducer>
 {
@@ -71,13 +71,16 @@ public:
         for (std::size_t index = 0; index < 2; ++index)
         {
             const TransitionProducerSetup::Side& side = mSetup.mSides[index];
-            if (!side.mProducer)
-                continue;
-            FrameRef frame;
-            const QRT::Result status =
-                side.mProducer->ProduceFrame(InputTime(inTime, side.mOffset), inParams, frame);
-            if (QRT::Failed(status))
-                return status;
+            FrameRef frame = side.mFixedFrame;
+            if (!mSetup.mFixed)
+            {
+                if (!side.mProducer)
+                    continue;
+                const QRT::Result status =
+                    side.mProducer->ProduceFrame(InputTime(inTime, side.mOffset), inParams, frame);
+                if (QRT::Failed(status))
+                    return status;
+            }
             if (!frame)
                 continue;
             frame = ApplyMotion(frame, GeometryOnly(side.mFirstField),
@@ -104,8 +107,12 @@ public:
     {
         QRT::HashValue hash;
         QRT::MixHash::MixInString(hash, kProducerHashText);
+        if (mSetup.mFixed)
+            QRT::MixHash::MixInGuid(hash, QRT::Guid::CreateUnique());
         for (const TransitionProducerSetup::Side& side : mSetup.mSides)
         {
+            if (mSetup.mFixed)
+                continue;
             if (!side.mProducer)
             {
                 QRT::MixHash::MixInGuid(hash, QRT::Guid());

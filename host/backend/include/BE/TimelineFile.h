@@ -28,16 +28,17 @@
 namespace BE
 {
 
-// What the loader asks of each effect it reads, when the caller gives it a
-// check: an error (empty when the effect is acceptable) that refuses the
-// file, and warnings that it keeps. Both are plain texts; the loader adds the
-// file and the effect's place.
+// What the loader asks of each effect and each transition it reads, when the
+// caller gives it a check: an error (empty when it is acceptable) that refuses
+// the file, and warnings that it keeps. Both are plain texts; the loader adds
+// the file and the effect's or transition's place.
 struct EffectCheckResult
 {
     std::string mError;
     std::vector<std::string> mWarnings;
 };
 using EffectCheck = std::function<EffectCheckResult(const EffectSettings&)>;
+using TransitionCheck = std::function<EffectCheckResult(const TransitionSettings&)>;
 
 struct TimelineLoadResult
 {
@@ -49,20 +50,23 @@ struct TimelineLoadResult
     std::vector<SequenceRef> mSequences;
     // Media files that do not exist, each once, as resolved, in file order.
     std::vector<std::string> mMissingFiles;
-    // The effect check's warnings, each as "file: place: warning".
+    // The checks' warnings, each as "file: place: warning".
     std::vector<std::string> mWarnings;
 
     bool Succeeded() const { return mError.empty(); }
 };
 
 // Reads and loads inPath; relative media paths are taken from inPath's folder.
-// inCheck, when given, is asked about every effect of every item.
-TimelineLoadResult LoadTimelineFile(const std::string& inPath, const EffectCheck& inCheck = {});
+// inCheck, when given, is asked about every effect of every item, and
+// inTransitionCheck about every transition.
+TimelineLoadResult LoadTimelineFile(const std::string& inPath, const EffectCheck& inCheck = {},
+                                    const TransitionCheck& inTransitionCheck = {});
 
 // Loads inText; inFileName names the text in messages, inBaseFolder is the
 // folder relative media paths are taken from.
 TimelineLoadResult ParseTimeline(std::string_view inText, const std::string& inFileName,
-                                 const std::string& inBaseFolder, const EffectCheck& inCheck = {});
+                                 const std::string& inBaseFolder, const EffectCheck& inCheck = {},
+                                 const TransitionCheck& inTransitionCheck = {});
 
 // The timeline text of inMain and of every sequence it nests (those first),
 // two-space indented, keys that hold their default value left out. Loading

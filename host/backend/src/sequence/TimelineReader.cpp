@@ -27,10 +27,12 @@ constexpr std::size_t kMaxNestingDepth = 64;
 class TimelineReader
 {
 public:
-    TimelineReader(const Json& inRoot, std::string inBaseFolder, const EffectCheck& inCheck)
+    TimelineReader(const Json& inRoot, std::string inBaseFolder, const EffectCheck& inCheck,
+                   const TransitionCheck& inTransitionCheck)
         : mRoot(inRoot)
         , mBaseFolder(std::move(inBaseFolder))
         , mCheck(inCheck)
+        , mTransitionCheck(inTransitionCheck)
     {
     }
 
@@ -68,6 +70,7 @@ private:
     const Json& mRoot;
     const std::string mBaseFolder;
     const EffectCheck& mCheck;
+    const TransitionCheck& mTransitionCheck;
     std::vector<Node> mNodes;
     std::vector<Entry> mEntries;
     std::unordered_map<std::string, std::size_t> mByName;
@@ -222,6 +225,14 @@ TrackItemSettings TimelineReader::ReadItem(const Node& inNode, mt::FrameRate inR
                                                SecondsText(settings.mEnd) + ")");
         settings.mReverse = transition.Bool("reverse", false);
         settings.mParams = transition.StringMap("params");
+        if (mTransitionCheck)
+        {
+            const EffectCheckResult checked = mTransitionCheck(settings);
+            if (!checked.mError.empty())
+                Fail(transition.PathOf("match"), checked.mError);
+            for (const std::string& warning : checked.mWarnings)
+                mWarnings.emplace_back(transition.Path(), warning);
+        }
         item.mTransitions.push_back(std::move(settings));
     }
     return item;
@@ -409,7 +420,8 @@ std::string Located(const std::string& inFileName, std::optional<int> inLine)
 } // namespace
 
 TimelineLoadResult ParseTimeline(std::string_view inText, const std::string& inFileName,
-                                 const std::string& inBaseFolder, const EffectCheck& inCheck)
+                                 const std::string& inBaseFolder, const EffectCheck& inCheck,
+                                 const TransitionCheck& inTransitionCheck)
 {
     TimelineLoadResult result;
     Json root;
@@ -433,7 +445,7 @@ TimelineLoadResult ParseTimeline(std::string_view inText, const std::string& inF
     }
     try
     {
-        TimelineReader reader(root, inBaseFolder, inCheck);
+        TimelineReader reader(root, inBaseFolder, inCheck, inTransitionCheck);
         result = reader.Read();
         for (const auto& [place, warning] : reader.mWarnings)
             result.mWarnings.push_back(Located(inFileName, FindLineOfValue(inText, place)) + ": " +
@@ -449,7 +461,8 @@ TimelineLoadResult ParseTimeline(std::string_view inText, const std::string& inF
     return result;
 }
 
-TimelineLoadResult LoadTimelineFile(const std::string& inPath, const EffectCheck& inCheck)
+TimelineLoadResult LoadTimelineFile(const std::string& inPath, const EffectCheck& inCheck,
+                                    const TransitionCheck& inTransitionCheck)
 {
     std::ifstream file(inPath, std::ios::binary);
     std::ostringstream text;
@@ -462,7 +475,8 @@ TimelineLoadResult LoadTimelineFile(const std::string& inPath, const EffectCheck
         return result;
     }
     const std::filesystem::path folder = std::filesystem::path(inPath).parent_path();
-    return ParseTimeline(text.str(), inPath, folder.empty() ? "." : folder.string(), inCheck);
+    return ParseTimeline(text.str(), inPath, folder.empty() ? "." : folder.string(), inCheck,
+                         inTransitionCheck);
 }
 
 } // namespace BE

@@ -24,6 +24,7 @@
 // match name is refused with a message that names it.
 
 #include "BE/SequenceTypes.h"
+#include "BE/TimelineFile.h"
 #include "QRT/InterfaceRef.h"
 #include "TX/Transition.h"
 
@@ -53,5 +54,10 @@ struct TransitionCreation
 };
 
 TransitionCreation CreateTransition(const BE::TransitionSettings& inSettings);
+
+// The timeline loader's check (BE::TransitionCheck): CreateTransition's error
+// and warnings, so that a transition it would refuse refuses the file and a
+// clamped parameter is warned of at load.
+BE::EffectCheckResult CheckTransition(const BE::TransitionSettings& inSettings);
 
 } // namespace TX
