@@ -10,7 +10,9 @@
 #include "TestFrames.h"
 #include "graph/RenderableNodeEffectImpl.h"
 
+#include <atomic>
 #include <set>
+#include <thread>
 
 #include <gtest/gtest.h>
 
@@ -27,10 +29,12 @@ using NodeRef = QRT::InterfaceRef<MF::IRenderableNode>;
 class TestEffect : public QRT::Implements<FX::IEffect>
 {
 public:
-    TestEffect(std::string inMatch, bool inTimeVariant, std::vector<FX::EffectParam> inParams)
+    TestEffect(std::string inMatch, bool inTimeVariant, std::vector<FX::EffectParam> inParams,
+               bool inReentrant = true)
         : mMatch(std::move(inMatch))
         , mTimeVariant(inTimeVariant)
         , mParams(std::move(inParams))
+        , mReentrant(inReentrant)
     {
     }
     const std::string& GetMatchName() const override { return mMatch; }
@@ -43,18 +47,34 @@ public:
     bool HasDuration() const override { return false; }
     TickTime GetDuration() const override { return {}; }
     bool IsTimeVariant() const override { return mTimeVariant; }
-    bool IsReentrant() const override { return true; }
+    bool IsReentrant() const override { return mReentrant; }
     std::uint32_t GetInstanceID() const override { return 0; }
+    // Counts the renders and notes whether two ever ran at once: each render
+    // waits a little for a second one to come in beside it.
     QRT::Result Render(const FX::RenderContext&, QRT::InterfaceRef<MF::IVideoFrame>&,
                        const FX::LayerInputs&) override
     {
+        ++mRenders;
+        bool together = mInside.fetch_add(1) > 0;
+        for (int spin = 0; spin < 2000 && !together; ++spin)
+        {
+            std::this_thread::yield();
+            together = mInside.load() > 1;
+        }
+        mOverlapped = mOverlapped || together;
+        --mInside;
         return QRT::kResult_Success;
     }
+
+    std::atomic<int> mRenders{0};
+    std::atomic<bool> mOverlapped{false};
 
 private:
     std::string mMatch;
     bool mTimeVariant;
     std::vector<FX::EffectParam> mParams;
+    bool mReentrant;
+    std::atomic<int> mInside{0};
 };
 
 NodeRef Node(const QRT::InterfaceRef<FX::IEffect>& inEffect, const std::string& inLabel = {})
@@ -215,6 +235,33 @@ TEST(EffectNodeTest, AnOperatorRendersAtTheClipsTimeNotTheInputs)
         effect->ApplyOperator(clipTime, inputTime, vrtest::MakeParams(4, 2), *sNoLayers, frame, 0),
         QRT::kResult_Success);
     EXPECT_TRUE(vrtest::IsFilledWith(frame, {128, 128, 128, 255}));
+}
+
+TEST(EffectNodeTest, AnEffectThatMayNotRunTwiceAtOnceRendersOneFrameAtATime)
+{
+    // Four threads render through operators of one node; without the node's
+    // lock the effect's renders meet.
+    const auto effect = QRT::Allocated<TestEffect>::CreateInstance(
+        "Serial", false, std::vector<FX::EffectParam>{}, false);
+    const NodeRef node = Node(QRT::InterfaceRef<FX::IEffect>(effect.Get()));
+    static const SubTreeRenderList* const sNoLayers = new SubTreeRenderList();
+    {
+        std::vector<std::jthread> threads;
+        for (int t = 0; t < 4; ++t)
+            threads.emplace_back(
+                [&]
+                {
+                    for (int i = 0; i < 5; ++i)
+                    {
+                        QRT::InterfaceRef<MF::IVideoFrame> frame = vrtest::MakeFrame(4, 2);
+                        EXPECT_EQ(Operator(node)->ApplyOperator({}, {}, vrtest::MakeParams(4, 2),
+                                                                *sNoLayers, frame, 0),
+                                  QRT::kResult_Success);
+                    }
+                });
+    }
+    EXPECT_EQ(effect->mRenders.load(), 20);
+    EXPECT_FALSE(effect->mOverlapped.load());
 }
 
 } // namespace
