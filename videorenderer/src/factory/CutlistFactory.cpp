@@ -17,6 +17,7 @@
 #include "graph/RenderableNodeAdjustmentImpl.h"
 #include "graph/RenderableNodeEffectImpl.h"
 #include "graph/RenderableNodeMulticamImpl.h"
+#include "graph/RenderableNodePreviewImpl.h"
 #include "graph/RenderableNodeTransitionImpl.h"
 #include "graph/SequenceNodes.h"
 
@@ -448,11 +449,13 @@ private:
 
 const MF::TickTimeRangeList kWholeTime{{kTime_Min, kTime_Max}};
 
-CutlistRef SealOneSegment(TickTime inStart, TickTime inEnd, const NodeRef& inInput)
+// inInput's time zero lies at inInputOffset.
+CutlistRef SealOneSegment(TickTime inStart, TickTime inEnd, const NodeRef& inInput,
+                          TickTime inInputOffset = kTime_Zero)
 {
     const QRT::InterfaceRef<RenderableNodeCompositorImpl> compositor =
         RenderableNodeCompositorImpl::Create();
-    compositor->AddTrackInput(inInput, kTime_Zero, 0);
+    compositor->AddTrackInput(inInput, inInputOffset, 0);
     compositor->MakeImmutable();
     const QRT::InterfaceRef<IMutableCutlist> cutlist = CreateMutableCutlist(QRT::ImmutableString());
     cutlist->AddSegment(inStart, inEnd, kTime_Zero, compositor->GetSelfReference());
@@ -543,20 +546,34 @@ public:
         return QRT::kResult_Success;
     }
 
-    // Preview nodes are made from the host's preview objects, which this
-    // host does not have: no object answers their interfaces.
-    QRT::Result CreatePreviewCutlist(const MF::HostObjectRef& /*inPreview*/,
+    // A preview of a sequence range lies over that range of the sequence.
+    QRT::Result CreatePreviewCutlist(const MF::HostObjectRef& inPreview,
                                      CutlistRef& outCutlist) override
     {
         outCutlist.Reset();
-        return QRT::kResult_NotFound;
+        const auto range = QRT::QueryRef<BE::IPreviewRange>(inPreview);
+        if (!range)
+            return QRT::kResult_NotFound;
+        const QRT::InterfaceRef<BE::IPreviewNode> preview = range->GetPreview();
+        const BE::PreviewSettings& settings = Require(preview).GetPreviewSettings();
+        outCutlist = SealOneSegment(settings.mStart, settings.mEnd, CreatePreviewNode(preview),
+                                    settings.mStart);
+        return QRT::kResult_Success;
     }
 
-    QRT::Result CreatePreviewSourceCutlist(const MF::HostObjectRef& /*inPreviewSource*/,
+    // A preview file played on its own starts at time zero.
+    QRT::Result CreatePreviewSourceCutlist(const MF::HostObjectRef& inPreviewSource,
                                            CutlistRef& outCutlist) override
     {
         outCutlist.Reset();
-        return QRT::kResult_NotFound;
+        const auto file = QRT::QueryRef<BE::IPreviewFileSource>(inPreviewSource);
+        if (!file)
+            return QRT::kResult_NotFound;
+        const QRT::InterfaceRef<BE::IPreviewNode> preview = file->GetPreview();
+        const BE::PreviewSettings& settings = Require(preview).GetPreviewSettings();
+        outCutlist =
+            SealOneSegment(kTime_Zero, settings.mEnd - settings.mStart, CreatePreviewNode(preview));
+        return QRT::kResult_Success;
     }
 
     QRT::Result CreateMergedCutlist(const std::vector<CutlistRef>& inCutlists,
