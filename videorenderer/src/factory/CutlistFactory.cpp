@@ -449,13 +449,11 @@ private:
 
 const MF::TickTimeRangeList kWholeTime{{kTime_Min, kTime_Max}};
 
-// inInput's time zero lies at inInputOffset.
-CutlistRef SealOneSegment(TickTime inStart, TickTime inEnd, const NodeRef& inInput,
-                          TickTime inInputOffset = kTime_Zero)
+CutlistRef SealOneSegment(TickTime inStart, TickTime inEnd, const NodeRef& inInput)
 {
     const QRT::InterfaceRef<RenderableNodeCompositorImpl> compositor =
         RenderableNodeCompositorImpl::Create();
-    compositor->AddTrackInput(inInput, inInputOffset, 0);
+    compositor->AddTrackInput(inInput, kTime_Zero, 0);
     compositor->MakeImmutable();
     const QRT::InterfaceRef<IMutableCutlist> cutlist = CreateMutableCutlist(QRT::ImmutableString());
     cutlist->AddSegment(inStart, inEnd, kTime_Zero, compositor->GetSelfReference());
@@ -546,7 +544,8 @@ public:
         return QRT::kResult_Success;
     }
 
-    // A preview of a sequence range lies over that range of the sequence.
+    // A preview of a sequence range lies over that range of the sequence;
+    // the segment's node time 0 at its start is the file's first frame.
     QRT::Result CreatePreviewCutlist(const MF::HostObjectRef& inPreview,
                                      CutlistRef& outCutlist) override
     {
@@ -556,8 +555,7 @@ public:
             return QRT::kResult_NotFound;
         const QRT::InterfaceRef<BE::IPreviewNode> preview = range->GetPreview();
         const BE::PreviewSettings& settings = Require(preview).GetPreviewSettings();
-        outCutlist = SealOneSegment(settings.mStart, settings.mEnd, CreatePreviewNode(preview),
-                                    settings.mStart);
+        outCutlist = SealOneSegment(settings.mStart, settings.mEnd, CreatePreviewNode(preview));
         return QRT::kResult_Success;
     }
 
