@@ -312,6 +312,12 @@ TEST_F(PreviewCutlistTest, KeysFollowTheMediaNodesWithTheInstanceHashedAndFrameB
         EXPECT_EQ(value, key.mValue);
         EXPECT_EQ(impl.FindHashedProperty(name) != nullptr, key.mHashed);
     }
+    // Its prefetch reaches the file's frames through its own producer.
+    RenderableNodePrefetchList prefetches;
+    CutlistRenderParams params = vrtest::MakeParams(16, 8);
+    params.mFrameRate = mt::kFrameRate_Video2997;
+    impl.Prefetch({Video(0), Video(3)}, params, prefetches);
+    EXPECT_EQ(prefetches.size(), 1u);
     // The material takes part in the hash: another file, another node.
     BE::PreviewSettings moved = Settings();
     moved.mPath = mCopy;
