@@ -4,7 +4,6 @@
 
 #include "BE/Preview.h"
 #include "BE/Sequence.h"
-#include "MF/RenderableCutlistFactory.h"
 #include "ML/CutlistRenderer.h"
 #include "TestFrames.h"
 #include "VF/SharedVideoFrameCache.h"
@@ -25,46 +24,40 @@ namespace
 {
 
 namespace mt = mvxmediatypes;
-using mt::TickTime;
 using CutlistRef = QRT::InterfaceRef<MF::IRenderableCutlist>;
-using NodeRef = QRT::InterfaceRef<MF::IRenderableNode>;
+using PreviewRef = QRT::InterfaceRef<BE::IPreviewNode>;
 using mvxcore::debug::DebugDatabase;
 using vrtest::FrameRef;
+constexpr auto kRange = BE::PreviewKind::kSequenceRange;
+constexpr auto kFile = BE::PreviewKind::kFileSource;
 
-constexpr int kFileFrames = 6;
-
-TickTime Video(double inFrames)
+mt::TickTime Video(double inFrames)
 {
-    return TickTime::TicksToTime(
+    return mt::TickTime::TicksToTime(
         static_cast<std::int64_t>(inFrames * mt::kFrameRate_Video2997.GetTicksPerFrame()));
-}
-
-// The grey level of file frame inFrame (Y'; neutral chroma).
-std::uint8_t Level(int inFrame)
-{
-    return static_cast<std::uint8_t>(30 + 35 * inFrame);
 }
 
 class PreviewCutlistTest : public ::testing::Test
 {
 protected:
+    // Six 16x8 frames at 29.97, frame n of grey level 30 + 35 n.
     void SetUp() override
     {
         VF::SharedVideoFrameCache::Clear();
         std::ofstream file(mPath, std::ios::binary);
         file << "YUV4MPEG2 W16 H8 F30000:1001 Ip A1:1 C444\n";
-        for (int frame = 0; frame < kFileFrames; ++frame)
+        for (int frame = 0; frame < 6; ++frame)
             file << "FRAME\n"
-                 << std::string(16 * 8, static_cast<char>(Level(frame)))
-                 << std::string(2 * 16 * 8, static_cast<char>(128));
+                 << std::string(128, static_cast<char>(30 + 35 * frame))
+                 << std::string(256, '\x80');
     }
     void TearDown() override
     {
         DebugDatabase::ClearAll();
         std::filesystem::remove(mPath);
-        std::filesystem::remove(mCopy);
     }
 
+    // The material over sequence frames [10, 16).
     BE::PreviewSettings Settings() const
     {
         BE::PreviewSettings settings;
@@ -76,215 +69,121 @@ protected:
                             mt::kFieldType_Progressive,
                             mt::kAlphaChannel_None};
         settings.mStart = Video(10);
-        settings.mEnd = Video(10 + kFileFrames);
+        settings.mEnd = Video(16);
         return settings;
-    }
-
-    QRT::InterfaceRef<BE::IPreviewNode> Preview(const BE::PreviewSettings& inSettings,
-                                                BE::PreviewKind inKind) const
-    {
-        const BE::PreviewResult made = BE::CreatePreview(inSettings, inKind);
-        EXPECT_TRUE(made.mPreview) << made.mStatus.mMessage;
-        return made.mPreview;
     }
 
     QRT::Result Build(const QRT::InterfaceRef<QRT::QRTUnknown>& inObject, BE::PreviewKind inKind,
                       CutlistRef& outCutlist) const
     {
-        return inKind == BE::PreviewKind::kSequenceRange
-                   ? mFactory->CreatePreviewCutlist(inObject, outCutlist)
-                   : mFactory->CreatePreviewSourceCutlist(inObject, outCutlist);
+        return inKind == kRange ? mFactory->CreatePreviewCutlist(inObject, outCutlist)
+                                : mFactory->CreatePreviewSourceCutlist(inObject, outCutlist);
     }
 
-    // The cutlist's frame at inTime, 16x8 BGRA.
-    static FrameRef RenderAt(const CutlistRef& inCutlist, TickTime inTime)
+    // The cutlist's 16x8 BGRA frame at inTime.
+    static FrameRef RenderAt(const CutlistRef& inCutlist, mt::TickTime inTime)
     {
         CutlistRenderParams params = vrtest::MakeParams(16, 8, MF::FrameTime(inTime));
         params.mFrameRate = mt::kFrameRate_Video2997;
-        params.mQuality = 4;
         QRT::InterfaceRef<IRenderableNodeProducer> producer;
         MF::FrameTime local;
-        EXPECT_EQ(CutlistRenderer::GetProducerForCutlist(inCutlist, params, producer, local),
-                  QRT::kResult_Success);
-        EXPECT_TRUE(producer);
+        EXPECT_EQ(CutlistRenderer::GetProducerForCutlist(inCutlist, params, producer, local), 0);
         return CutlistRenderer::RenderFrameFromCutlist(producer, params, local,
                                                        {mt::kPixelFormat_BGRA_4444_8u}, false);
     }
 
     // The first pixel of file frame inFrame as the file's own source gives it.
-    static vrtest::Bgra FilePixel(const QRT::InterfaceRef<BE::IPreviewNode>& inPreview, int inFrame)
+    static vrtest::Bgra FilePixel(const PreviewRef& inPreview, int inFrame)
     {
         FrameRef frame;
         EXPECT_EQ(inPreview->GetVideoSource()->GetVideoFrame(
-                      Video(inFrame), BE::VideoFrameRequest(), MF::BinaryData(), BE::ColorProfile(),
-                      BE::Deprecated::kFrameRequestFlag_Read, frame),
-                  QRT::kResult_Success);
+                      Video(inFrame), {}, {}, {}, BE::Deprecated::kFrameRequestFlag_Read, frame),
+                  0);
         const auto* pixel = static_cast<const std::uint8_t*>(frame->GetBaseAddress());
         return {pixel[0], pixel[1], pixel[2], pixel[3]};
     }
 
-    // Named after the test, so that tests run at once do not share files.
     const std::string mPath = ::testing::TempDir() +
                               ::testing::UnitTest::GetInstance()->current_test_info()->name() +
                               ".y4m";
-    const std::string mCopy = mPath + ".copy.y4m";
     const QRT::InterfaceRef<MF::IRenderableCutlistFactory> mFactory = CreateCutlistFactory();
 };
 
 TEST_F(PreviewCutlistTest, OneSegmentOverThePreviewShowingTheFileFramesOnEitherPath)
 {
-    constexpr auto kRange = BE::PreviewKind::kSequenceRange;
-    constexpr auto kFile = BE::PreviewKind::kFileSource;
-    struct Probe
+    enum class Path
     {
-        double mAt; // video frames, in cutlist time
-        int mFileFrame;
+        kNew,
+        kSwitch,
+        kLegacyRenderer,
+        kLegacyFile
     };
     struct Case
     {
         const char* mName;
         BE::PreviewKind mKind;
-        bool mSwitch, mLegacyRenderer, mLegacyFile;
-        mt::PulldownCadence mCadence;
-        double mStart, mEnd; // the segment, in video frames
-        bool mNewPath;
-        const char* mRemovePulldown;
-        std::vector<Probe> mProbes;
+        Path mPath;
+        bool mPulldown;
+        std::vector<std::pair<double, int>> mFileFrameAt; // cutlist frame, file frame
     };
+    // Film frame 3 (3.75 video frames in) is the whole video frame 4 of an
+    // AA cadence; read raw, that time falls in video frame 3.
     const std::vector<Case> cases = {
-        {"range",
-         kRange,
-         false,
-         false,
-         false,
-         mt::kPulldownCadence_None,
-         10,
-         16,
-         true,
-         "0",
-         {{10, 0}, {13, 3}, {15.5, 5}}},
-        {"file",
-         kFile,
-         false,
-         false,
-         false,
-         mt::kPulldownCadence_None,
-         0,
-         6,
-         true,
-         "0",
-         {{0, 0}, {4, 4}}},
-        {"range, switch",
-         kRange,
-         true,
-         false,
-         false,
-         mt::kPulldownCadence_None,
-         10,
-         16,
-         false,
-         "0",
-         {{11, 1}, {15, 5}}},
-        {"file, legacy renderer",
-         kFile,
-         false,
-         true,
-         false,
-         mt::kPulldownCadence_None,
-         0,
-         6,
-         false,
-         "0",
-         {{2, 2}}},
-        {"file, legacy file",
-         kFile,
-         false,
-         false,
-         true,
-         mt::kPulldownCadence_None,
-         0,
-         6,
-         false,
-         "0",
-         {{3, 3}}},
-        // Film frame 3 (3.75 video frames in) is the whole video frame 4 of
-        // an AA cadence; read raw, that time falls in video frame 3.
-        {"file, pulldown",
-         kFile,
-         false,
-         false,
-         false,
-         mt::kPulldownCadence_23_AA,
-         0,
-         6,
-         true,
-         "1",
-         {{0, 0}, {3.75, 4}}},
-        {"file, pulldown, switch",
-         kFile,
-         true,
-         false,
-         false,
-         mt::kPulldownCadence_23_AA,
-         0,
-         6,
-         false,
-         "0",
-         {{3.75, 3}}},
+        {"range", kRange, Path::kNew, false, {{10, 0}, {13, 3}, {15.5, 5}}},
+        {"file", kFile, Path::kNew, false, {{0, 0}, {4, 4}}},
+        {"range, switch", kRange, Path::kSwitch, false, {{11, 1}}},
+        {"legacy renderer", kFile, Path::kLegacyRenderer, false, {{2, 2}}},
+        {"legacy file", kFile, Path::kLegacyFile, false, {{3, 3}}},
+        {"pulldown", kFile, Path::kNew, true, {{0, 0}, {3.75, 4}}},
+        {"pulldown, switch", kFile, Path::kSwitch, true, {{3.75, 3}}},
     };
     for (const Case& c : cases)
     {
         SCOPED_TRACE(c.mName);
         DebugDatabase::ClearAll();
-        if (c.mSwitch)
+        if (c.mPath == Path::kSwitch)
             DebugDatabase::SetValue("DisableNewMediaNodeRenderer", "true");
         BE::PreviewSettings settings = Settings();
-        settings.mLegacyRenderer = c.mLegacyRenderer;
-        settings.mLegacyFile = c.mLegacyFile;
-        settings.mPulldownCadence = c.mCadence;
-        const QRT::InterfaceRef<BE::IPreviewNode> preview = Preview(settings, c.mKind);
-        ASSERT_TRUE(preview);
+        settings.mLegacyRenderer = c.mPath == Path::kLegacyRenderer;
+        settings.mLegacyFile = c.mPath == Path::kLegacyFile;
+        if (c.mPulldown)
+            settings.mPulldownCadence = mt::kPulldownCadence_23_AA;
+        const PreviewRef preview = BE::CreatePreview(settings, c.mKind).mPreview;
         CutlistRef cutlist;
         ASSERT_EQ(Build(preview, c.mKind, cutlist), QRT::kResult_Success);
         ASSERT_EQ(cutlist->GetSegmentCount(), 1u);
-        TickTime start, end, offset;
+        mt::TickTime start, end, offset;
         QRT::Guid hash;
-        ASSERT_EQ(cutlist->GetSegment(0, start, end, offset, hash), QRT::kResult_Success);
-        EXPECT_EQ(start, Video(c.mStart));
-        EXPECT_EQ(end, Video(c.mEnd));
-
-        NodeRef root, node;
-        ASSERT_EQ(cutlist->GetNodeByHash(hash, root), QRT::kResult_Success);
-        ASSERT_EQ(root->GetInputCount(), 1u);
-        ASSERT_EQ(root->GetInput(0, offset, node), QRT::kResult_Success);
+        QRT::InterfaceRef<MF::IRenderableNode> root, node;
+        ASSERT_EQ(cutlist->GetSegment(0, start, end, offset, hash), 0);
+        EXPECT_EQ(start, Video(c.mKind == kRange ? 10 : 0));
+        EXPECT_EQ(end, Video(c.mKind == kRange ? 16 : 6));
+        ASSERT_EQ(cutlist->GetNodeByHash(hash, root), 0);
+        ASSERT_EQ(root->GetInput(0, offset, node), 0);
         const auto* impl = dynamic_cast<const RenderableNodePreviewImpl*>(node.Get());
         ASSERT_NE(impl, nullptr);
-        EXPECT_EQ(node->GetNodeType(),
-                  QRT::ImmutableString::CreateStatic("RenderableNodePreviewImpl"));
-        EXPECT_EQ(QRT::QueryRef<BE::IPreviewNode>(node)->GetPreviewSettings().mPath, mPath);
-        EXPECT_EQ(impl->UsesNewRenderer(), c.mNewPath);
-        const auto* remove = impl->FindHashedProperty(
-            QRT::ImmutableString::CreateStatic("MediaNode::StreamRemovePulldown"));
-        ASSERT_NE(remove, nullptr);
-        EXPECT_EQ(*remove, c.mRemovePulldown);
-
-        for (const Probe& probe : c.mProbes)
+        EXPECT_EQ(QRT::QueryRef<BE::IPreviewNode>(node)->GetVideoSource(),
+                  preview->GetVideoSource());
+        const bool newPath = c.mPath == Path::kNew;
+        EXPECT_EQ(impl->UsesNewRenderer(), newPath);
+        EXPECT_EQ(*impl->FindHashedProperty(
+                      QRT::ImmutableString::CreateStatic("MediaNode::StreamRemovePulldown")),
+                  newPath && c.mPulldown ? "1" : "0");
+        for (const auto& [at, fileFrame] : c.mFileFrameAt)
         {
-            SCOPED_TRACE(probe.mAt);
-            const FrameRef frame = RenderAt(cutlist, Video(probe.mAt));
+            SCOPED_TRACE(at);
+            const FrameRef frame = RenderAt(cutlist, Video(at));
             ASSERT_TRUE(frame);
             EXPECT_EQ(frame->GetBounds(), QRT::ParamRect(0, 0, 16, 8));
-            EXPECT_TRUE(vrtest::IsFilledWith(frame, FilePixel(preview, probe.mFileFrame)));
+            EXPECT_TRUE(vrtest::IsFilledWith(frame, FilePixel(preview, fileFrame)));
         }
     }
 }
 
 TEST_F(PreviewCutlistTest, KeysFollowTheMediaNodesWithTheInstanceHashedAndFrameBlendNot)
 {
-    const QRT::InterfaceRef<BE::IPreviewNode> preview =
-        Preview(Settings(), BE::PreviewKind::kFileSource);
-    ASSERT_TRUE(preview);
-    const NodeRef node = CreatePreviewNode(preview);
+    const auto node = CreatePreviewNode(BE::CreatePreview(Settings(), kFile).mPreview);
+    EXPECT_EQ(node->GetNodeType(), QRT::ImmutableString::CreateStatic("RenderableNodePreviewImpl"));
     const auto& impl = dynamic_cast<const RenderableNodePreviewImpl&>(*node);
     struct Key
     {
@@ -292,39 +191,26 @@ TEST_F(PreviewCutlistTest, KeysFollowTheMediaNodesWithTheInstanceHashedAndFrameB
         bool mHashed;
         std::string mValue;
     };
-    const std::vector<Key> keys = {
-        {"MediaNode::MediaInstanceString", true, mPath},
-        {"MediaNode::StreamFrameRate", true, "23543520"},
-        {"MediaNode::StreamFrameWidth", true, "16"},
-        {"MediaNode::StreamFrameHeight", true, "8"},
-        {"MediaNode::StreamPixelAspectRatioNum", true, "1"},
-        {"MediaNode::StreamFieldType", true, "0"},
-        {"MediaNode::StreamPullDownCadence", true, "0"},
-        {"MediaNode::ContentEnd", true, std::to_string(Video(kFileFrames).GetTicks())},
-        {"MediaNode::StreamFrameBlend", false, "0"},
-    };
-    for (const Key& key : keys)
+    for (const Key& key : std::vector<Key>{
+             {"MediaNode::MediaInstanceString", true, mPath},
+             {"MediaNode::StreamFrameRate", true, "23543520"},
+             {"MediaNode::StreamFrameWidth", true, "16"},
+             {"MediaNode::StreamFieldType", true, "0"},
+             {"MediaNode::ContentEnd", true, std::to_string(Video(6).GetTicks())},
+             {"MediaNode::StreamFrameBlend", false, "0"},
+         })
     {
         SCOPED_TRACE(key.mName);
-        const QRT::ImmutableString name = QRT::ImmutableString::CreateStatic(key.mName);
+        const auto name = QRT::ImmutableString::CreateStatic(key.mName);
         MF::RenderablePropertyValue value;
         ASSERT_EQ(node->GetProperty(name, value), QRT::kResult_Success);
         EXPECT_EQ(value, key.mValue);
         EXPECT_EQ(impl.FindHashedProperty(name) != nullptr, key.mHashed);
     }
-    // Its prefetch reaches the file's frames through its own producer.
+    // Its prefetch reaches the file through its own producer.
     RenderableNodePrefetchList prefetches;
-    CutlistRenderParams params = vrtest::MakeParams(16, 8);
-    params.mFrameRate = mt::kFrameRate_Video2997;
-    impl.Prefetch({Video(0), Video(3)}, params, prefetches);
+    impl.Prefetch({Video(0), Video(3)}, vrtest::MakeParams(16, 8), prefetches);
     EXPECT_EQ(prefetches.size(), 1u);
-    // The material takes part in the hash: another file, another node.
-    BE::PreviewSettings moved = Settings();
-    moved.mPath = mCopy;
-    std::ofstream(moved.mPath, std::ios::binary) << std::ifstream(mPath, std::ios::binary).rdbuf();
-    const QRT::InterfaceRef<BE::IPreviewNode> copy = Preview(moved, BE::PreviewKind::kFileSource);
-    ASSERT_TRUE(copy);
-    EXPECT_NE(CreatePreviewNode(copy)->GetNodeHash(), node->GetNodeHash());
 }
 
 TEST_F(PreviewCutlistTest, ObjectsThatAreNotThatKindOfPreviewAreRefused)
@@ -333,31 +219,22 @@ TEST_F(PreviewCutlistTest, ObjectsThatAreNotThatKindOfPreviewAreRefused)
     bars.mKind = BE::MediaKind::kPattern;
     bars.mLocation = "pattern:bars";
     const QRT::InterfaceRef<QRT::QRTUnknown> media = BE::CreateMedia(bars).mMedia;
-    const QRT::InterfaceRef<QRT::QRTUnknown> range =
-        Preview(Settings(), BE::PreviewKind::kSequenceRange);
-    const QRT::InterfaceRef<QRT::QRTUnknown> file =
-        Preview(Settings(), BE::PreviewKind::kFileSource);
-    struct Case
+    const QRT::InterfaceRef<QRT::QRTUnknown> range = BE::CreatePreview(Settings(), kRange).mPreview;
+    const QRT::InterfaceRef<QRT::QRTUnknown> file = BE::CreatePreview(Settings(), kFile).mPreview;
+    for (const auto& [object, kind] :
+         std::vector<std::pair<QRT::InterfaceRef<QRT::QRTUnknown>, BE::PreviewKind>>{
+             {media, kRange}, {media, kFile}, {file, kRange}, {range, kFile}})
     {
-        QRT::InterfaceRef<QRT::QRTUnknown> mObject;
-        BE::PreviewKind mOperation;
-    };
-    for (const Case& c : std::vector<Case>{{media, BE::PreviewKind::kSequenceRange},
-                                           {media, BE::PreviewKind::kFileSource},
-                                           {file, BE::PreviewKind::kSequenceRange},
-                                           {range, BE::PreviewKind::kFileSource}})
-    {
-        CutlistRef cutlist = CutlistRef();
-        EXPECT_EQ(Build(c.mObject, c.mOperation, cutlist), QRT::kResult_NotFound);
+        CutlistRef cutlist;
+        EXPECT_EQ(Build(object, kind, cutlist), QRT::kResult_NotFound);
         EXPECT_FALSE(cutlist);
     }
-    // Material that cannot be opened makes no preview.
-    BE::PreviewSettings missing = Settings();
-    missing.mPath = ::testing::TempDir() + "no_such_preview.y4m";
-    EXPECT_FALSE(BE::CreatePreview(missing, BE::PreviewKind::kFileSource).mPreview);
-    BE::PreviewSettings backwards = Settings();
+    // Material that cannot be opened, or a range backwards, makes no preview.
+    BE::PreviewSettings missing = Settings(), backwards = Settings();
+    missing.mPath += ".missing.y4m";
     backwards.mEnd = Video(1);
-    EXPECT_FALSE(BE::CreatePreview(backwards, BE::PreviewKind::kFileSource).mPreview);
+    EXPECT_FALSE(BE::CreatePreview(missing, kFile).mPreview);
+    EXPECT_FALSE(BE::CreatePreview(backwards, kFile).mPreview);
 }
 
 } // namespace
