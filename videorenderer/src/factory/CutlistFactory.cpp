@@ -17,6 +17,7 @@
 #include "graph/RenderableNodeAdjustmentImpl.h"
 #include "graph/RenderableNodeEffectImpl.h"
 #include "graph/RenderableNodeMulticamImpl.h"
+#include "graph/RenderableNodePreviewImpl.h"
 #include "graph/RenderableNodeTransitionImpl.h"
 #include "graph/SequenceNodes.h"
 
@@ -543,20 +544,34 @@ public:
         return QRT::kResult_Success;
     }
 
-    // Preview nodes are made from the host's preview objects, which this
-    // host does not have: no object answers their interfaces.
-    QRT::Result CreatePreviewCutlist(const MF::HostObjectRef& /*inPreview*/,
+    // A preview of a sequence range lies over that range of the sequence;
+    // the segment's node time 0 at its start is the file's first frame.
+    QRT::Result CreatePreviewCutlist(const MF::HostObjectRef& inPreview,
                                      CutlistRef& outCutlist) override
     {
         outCutlist.Reset();
-        return QRT::kResult_NotFound;
+        const auto range = QRT::QueryRef<BE::IPreviewRange>(inPreview);
+        if (!range)
+            return QRT::kResult_NotFound;
+        const QRT::InterfaceRef<BE::IPreviewNode> preview = range->GetPreview();
+        const BE::PreviewSettings& settings = Require(preview).GetPreviewSettings();
+        outCutlist = SealOneSegment(settings.mStart, settings.mEnd, CreatePreviewNode(preview));
+        return QRT::kResult_Success;
     }
 
-    QRT::Result CreatePreviewSourceCutlist(const MF::HostObjectRef& /*inPreviewSource*/,
+    // A preview file played on its own starts at time zero.
+    QRT::Result CreatePreviewSourceCutlist(const MF::HostObjectRef& inPreviewSource,
                                            CutlistRef& outCutlist) override
     {
         outCutlist.Reset();
-        return QRT::kResult_NotFound;
+        const auto file = QRT::QueryRef<BE::IPreviewFileSource>(inPreviewSource);
+        if (!file)
+            return QRT::kResult_NotFound;
+        const QRT::InterfaceRef<BE::IPreviewNode> preview = file->GetPreview();
+        const BE::PreviewSettings& settings = Require(preview).GetPreviewSettings();
+        outCutlist =
+            SealOneSegment(kTime_Zero, settings.mEnd - settings.mStart, CreatePreviewNode(preview));
+        return QRT::kResult_Success;
     }
 
     QRT::Result CreateMergedCutlist(const std::vector<CutlistRef>& inCutlists,
