@@ -42,6 +42,8 @@ struct EffectSetup
     std::optional<mvxmediatypes::TickTime> mDuration;
     MF::BinaryData mOpaqueData;
     std::uint32_t mInstanceID = 0;
+    // The folder relative file names of the settings are taken from.
+    std::string mBaseFolder;
 };
 
 // A writable BGRA picture with straight alpha, 8-bit or float components.
@@ -75,6 +77,7 @@ public:
     bool IsTimeVariant() const override { return false; }
     bool IsReentrant() const override { return true; }
     std::uint32_t GetInstanceID() const override { return mSetup.mInstanceID; }
+    const std::string& GetBaseFolder() const { return mSetup.mBaseFolder; }
     // Stages a frame of another format as BGRA float, renders it with
     // RenderStaged and converts the result back.
     QRT::Result Render(const RenderContext& inContext, QRT::InterfaceRef<MF::IVideoFrame>& ioFrame,

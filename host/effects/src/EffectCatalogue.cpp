@@ -238,6 +238,7 @@ EffectMade CreateEffect(const BE::EffectSettings& inSettings,
     setup.mMatchName = inSettings.mMatchName;
     setup.mDuration = inDuration;
     setup.mOpaqueData = inSettings.mOpaqueData;
+    setup.mBaseFolder = inSettings.mBaseFolder;
     ParamReader reader(inSettings, made);
     for (const ParamSpec& spec : entry->mParams)
         if (!reader.Read(spec, setup.mParams.emplace_back()))

@@ -15,6 +15,7 @@
 #include <algorithm>
 #include <cmath>
 #include <cstdint>
+#include <filesystem>
 #include <mutex>
 #include <string>
 #include <vector>
@@ -207,8 +208,9 @@ constexpr ParamSpec kImageMatteParams[] = {
 };
 
 // Image matte: as the track matte, with a still PNG image, scaled to the
-// frame, as the matte. The image's path is the effect's opaque data; it is
-// read at the first render, once. A path that cannot be read fails every
+// frame, as the matte. The image's path is the effect's opaque data (a
+// relative one is taken from the timeline file's folder); it is read at the
+// first render, once. A path that cannot be read fails every
 // render with the reader's status.
 class ImageMatteEffect : public EffectBase
 {
@@ -221,19 +223,23 @@ public:
     QRT::Result Render(const RenderContext& inContext, FrameRef& ioFrame,
                        const LayerInputs& /*inLayers*/) override
     {
-        std::call_once(
-            mRead,
-            [&]
-            {
-                MF::BinaryData path;
-                if (!GetOpaqueData(path))
-                {
-                    mStatus = VF::kResult_PngCannotOpen;
-                    return;
-                }
-                const auto bytes = path.GetBytes();
-                mStatus = VF::ReadPngFile(std::string(bytes.begin(), bytes.end()), mImage).mResult;
-            });
+        std::call_once(mRead,
+                       [&]
+                       {
+                           MF::BinaryData path;
+                           if (!GetOpaqueData(path))
+                           {
+                               mStatus = VF::kResult_PngCannotOpen;
+                               return;
+                           }
+                           const auto bytes = path.GetBytes();
+                           // A relative name is the timeline file's folder's.
+                           std::filesystem::path file(std::string(bytes.begin(), bytes.end()));
+                           if (file.is_relative() && !GetBaseFolder().empty())
+                               file = std::filesystem::path(GetBaseFolder()) / file;
+                           mStatus =
+                               VF::ReadPngFile(file.lexically_normal().string(), mImage).mResult;
+                       });
         if (QRT::Failed(mStatus))
             return mStatus;
         // The delivered picture's size; the frame's own without one.

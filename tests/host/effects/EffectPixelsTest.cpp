@@ -459,17 +459,23 @@ TEST(EffectPixels, MattesKeyByTheirLayerOrImage)
             EXPECT_NEAR(At(*result, x, 0, 3), 255 * (invert ? 1 - keep : keep), 1.0) << x;
         }
     }
-    // An image matte reads its PNG (the opaque data): luma of white and black.
+    // An image matte reads its PNG (the opaque data; a relative name from the
+    // settings' folder): luma of white and black.
     FrameRef image = MakeFrame(2, 1);
     Set(*image, 0, 0, {255, 255, 255, 255});
     Set(*image, 1, 0, {0, 0, 0, 255});
-    const std::string path = ::testing::TempDir() + "/image-matte.png";
-    ASSERT_TRUE(VF::WritePngFile(path, image).Succeeded());
-    for (const auto& [file, status, alphas] :
-         {std::tuple{path, QRT::kResult_Success, std::array{255.0, 0.0}},
-          std::tuple{path + ".missing", VF::kResult_PngCannotOpen, std::array{255.0, 255.0}}})
+    const std::string folder = ::testing::TempDir();
+    ASSERT_TRUE(VF::WritePngFile(folder + "/image-matte.png", image).Succeeded());
+    for (const auto& [file, base, status, alphas] :
+         {std::tuple{std::string("image-matte.png"), folder, QRT::kResult_Success,
+                     std::array{255.0, 0.0}},
+          std::tuple{folder + "/image-matte.png.missing", std::string(), VF::kResult_PngCannotOpen,
+                     std::array{255.0, 255.0}}})
     {
-        BE::EffectSettings settings{std::string(kMatch_ImageMatte), {{"using", "luma"}}, {}, {}};
+        BE::EffectSettings settings;
+        settings.mMatchName = kMatch_ImageMatte;
+        settings.mParams = {{"using", "luma"}};
+        settings.mBaseFolder = base;
         settings.mOpaqueData = MF::BinaryData(file.data(), file.size());
         FrameRef frame = MakeFrame(2, 1);
         Set(*frame, 0, 0, {10, 20, 30, 255});

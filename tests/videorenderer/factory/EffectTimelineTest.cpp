@@ -143,7 +143,7 @@ TEST(EffectTimelineTest, FrameParallelRenderingOfTheBlurMatchesSerialRendering)
                                                                {"time": "11f", "value": 5}]}},
         {"match": "KX.VNTR ProcAmp", "params": {"brightness": 10}}])");
     // The blur renders several frames at once, each with its own buffers.
-    ASSERT_TRUE(FX::CreateEffect({"VR.GaussianBlur", {}, {}, {}}).mEffect->IsReentrant());
+    ASSERT_TRUE(FX::CreateEffect({"VR.GaussianBlur", {}, {}, {}, {}}).mEffect->IsReentrant());
     constexpr int kFrames = 12, kThreads = 4;
     std::vector<std::string> parallel(kFrames);
     {

@@ -141,8 +141,16 @@ struct EffectSettings
     // Numeric parameters given as numbers or points, constant or keyed, in
     // the item's time.
     std::map<std::string, KeyframeCurve> mKeyframedParams;
+    // The folder that relative file names in the settings (an image matte's
+    // picture) are taken from: the timeline file's. Where the settings came
+    // from, not what they say, so not compared.
+    std::string mBaseFolder;
 
-    friend bool operator==(const EffectSettings&, const EffectSettings&) = default;
+    friend bool operator==(const EffectSettings& inA, const EffectSettings& inB)
+    {
+        return inA.mMatchName == inB.mMatchName && inA.mParams == inB.mParams &&
+               inA.mOpaqueData == inB.mOpaqueData && inA.mKeyframedParams == inB.mKeyframedParams;
+    }
 };
 
 struct TransitionSettings

@@ -269,6 +269,7 @@ EffectSettings TimelineReader::ReadEffect(const Node& inNode, mt::FrameRate inRa
     }
     if (inNode.Has("opaque"))
         settings.mOpaqueData = MF::BinaryData::FromText(inNode.String("opaque"));
+    settings.mBaseFolder = mBaseFolder;
     if (mCheck)
     {
         const EffectCheckResult checked = mCheck(settings);

@@ -84,13 +84,14 @@ BE::SequenceRef FullModel(const std::string& inFolder)
     clip.mAlpha = {mt::kAlphaChannel_Premultiplied, true, true, 0xFF102030u};
     clip.mPulldown = {true, mt::kPulldownCadence_23_BC};
     full.mEffects = {
-        {"vr.Blur", {{"radius", "4"}, {"axis", "x"}}, MF::BinaryData::FromText("fx"), {}},
+        {"vr.Blur", {{"radius", "4"}, {"axis", "x"}}, MF::BinaryData::FromText("fx"), {}, {}},
         {"vr.Tint",
          {},
          {},
          {{"amount",
            BE::KeyframeCurve::Scalar(0, {Key(0, 5, 0, K::kLinear), Key(1, 9, 0, K::kHold)})},
-          {"centre", BE::KeyframeCurve::Point({1, -2})}}}};
+          {"centre", BE::KeyframeCurve::Point({1, -2})}},
+         {}}};
     full.mTransitions = {
         {"vr.CrossDissolve", TickTime::TicksToTime(12345), Seconds(1), true, {{"border", "2"}}}};
     BE::TrackItemSettings adjustment = Item(6, 7);
