@@ -25,6 +25,8 @@ TEST_F(RenderablePropertyValueTest, IntegersBooleansAndTimesArePlainDecimalAndPa
     EXPECT_EQ(ML::FormatPropertyValue(false), "0");
     EXPECT_EQ(ML::FormatPropertyValue(TickTime::TicksToTime(23543520)), "23543520");
     EXPECT_EQ(ML::FormatPropertyValue(mvxmediatypes::kTime_Max), "9223372036854775807");
+    const std::uint8_t bytes[] = {0x00, 0xAB, 0x1F};
+    EXPECT_EQ(ML::FormatPropertyValue(MF::BinaryData(bytes, sizeof(bytes))), "00ab1f");
     // Parsing takes back what formatting writes and refuses any other text.
     std::uint32_t color = 7;
     EXPECT_TRUE(ML::ParsePropertyValue("4278190335", color));

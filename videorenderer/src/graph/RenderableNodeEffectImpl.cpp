@@ -4,6 +4,7 @@
 
 #include "ML/MatchNames.h"
 #include "ML/RenderFlags.h"
+#include "ML/RenderablePropertyValue.h"
 #include "ML/SubTreeRender.h"
 #include "QRT/Allocated.h"
 #include "QRT/Exception.h"
@@ -24,20 +25,6 @@ constexpr std::string_view kOperatorHashText = "EffectNodeOperator";
 QRT::ImmutableString Key(const char* inName)
 {
     return QRT::ImmutableString::CreateStatic(inName);
-}
-
-// A binary block as property text: two lower-case hexadecimal digits per byte.
-std::string EncodeBinary(const MF::BinaryData& inData)
-{
-    static constexpr char kDigits[] = "0123456789abcdef";
-    std::string text;
-    text.reserve(inData.GetSize() * 2);
-    for (const std::uint8_t byte : inData.GetBytes())
-    {
-        text += kDigits[byte >> 4];
-        text += kDigits[byte & 15];
-    }
-    return text;
 }
 
 // What an operator keeps of its node.
@@ -182,7 +169,7 @@ void RenderableNodeEffectImpl::SetEffect(const QRT::InterfaceRef<FX::IEffect>& i
     if (inEffect->HasDuration())
         SetTypedProperty(Key("EffectNode::EffectDuration"), inEffect->GetDuration(), true);
     if (MF::BinaryData opaque; inEffect->GetOpaqueData(opaque))
-        SetProperty(Key("EffectNode::FilterOpaqueData"), EncodeBinary(opaque), true);
+        SetProperty(Key("EffectNode::FilterOpaqueData"), FormatPropertyValue(opaque), true);
     std::string params = std::to_string(inEffect->GetParamCount()) + "\n";
     for (std::uint32_t i = 0; i < inEffect->GetParamCount(); ++i)
         params += inEffect->GetParam(i).GetText() + "\n";

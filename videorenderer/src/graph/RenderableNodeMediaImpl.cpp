@@ -5,6 +5,7 @@
 #include "BE/CutlistProvider.h"
 #include "ML/RenderFlags.h"
 #include "ML/RenderableCutlistSource.h"
+#include "ML/RenderablePropertyValue.h"
 #include "ML/RenderableSourceFilters.h"
 #include "ML/RenderableVideoSources.h"
 #include "QRT/Allocated.h"
@@ -25,20 +26,6 @@ using mvxmediatypes::TickTime;
 QRT::ImmutableString Key(const char* inName)
 {
     return QRT::ImmutableString::CreateStatic(inName);
-}
-
-// A binary block as property text: two lower-case hexadecimal digits per byte.
-std::string EncodeBinary(const MF::BinaryData& inData)
-{
-    static constexpr char kDigits[] = "0123456789abcdef";
-    std::string text;
-    text.reserve(inData.GetSize() * 2);
-    for (const std::uint8_t byte : inData.GetBytes())
-    {
-        text += kDigits[byte >> 4];
-        text += kDigits[byte & 15];
-    }
-    return text;
 }
 
 // What tells this media's material apart from any other's: its kind,
@@ -200,8 +187,8 @@ void RenderableNodeMediaImpl::BuildSourceChain(const MediaNodeSetup& inSetup)
     // The keys.
     SetTypedProperty(Key("MediaNode::ClipID"), inSetup.mClipID, false);
     SetProperty(Key("MediaNode::MediaInstanceString"), media.GetMediaSettings().mLocation, false);
-    SetProperty(Key("MediaNode::MediaModState"), EncodeBinary(MaterialIdentity(media, videoSource)),
-                true);
+    SetProperty(Key("MediaNode::MediaModState"),
+                FormatPropertyValue(MaterialIdentity(media, videoSource)), true);
     SetTypedProperty(Key("MediaNode::MediaStreamGroup"),
                      static_cast<std::uint64_t>(inSetup.mStreamIndex), true);
     SetProperty(Key("MediaNode::MediaStreamLabel"), inSetup.mStreamLabel, true);
@@ -225,7 +212,8 @@ void RenderableNodeMediaImpl::BuildSourceChain(const MediaNodeSetup& inSetup)
                      settings.mPixelAspectRatio.GetDenominator(), true);
     SetTypedProperty(Key("MediaNode::StreamFieldType"),
                      static_cast<std::int32_t>(settings.mFieldType), true);
-    SetProperty(Key("MediaNode::StreamOpaqueData"), EncodeBinary(media.GetOpaqueData()), true);
+    SetProperty(Key("MediaNode::StreamOpaqueData"), FormatPropertyValue(media.GetOpaqueData()),
+                true);
     if (const auto duration = QRT::QueryRef<BE::IMediaDuration>(inSetup.mMedia))
     {
         SetTypedProperty(Key("MediaNode::ContentStart"), mvxmediatypes::kTime_Zero, true);
@@ -251,9 +239,10 @@ void RenderableNodeMediaImpl::BuildSourceChain(const MediaNodeSetup& inSetup)
     const BE::ColorProfile& profile = media.GetColorProfile();
     SetProperty(Key("MediaNode::SelectedColorProfileName"), profile.mName, true);
     if (profile.mData)
-        SetProperty(Key("MediaNode::SelectedColorProfileData"),
-                    EncodeBinary(MF::BinaryData(profile.mData->data(), profile.mData->size())),
-                    true);
+        SetProperty(
+            Key("MediaNode::SelectedColorProfileData"),
+            FormatPropertyValue(MF::BinaryData(profile.mData->data(), profile.mData->size())),
+            true);
     // Half the height difference, when odd, moves the picture by one line
     // against the sequence's fields.
     const bool fieldsDiffer =

@@ -20,20 +20,6 @@ QRT::ImmutableString Key(const char* inName)
     return QRT::ImmutableString::CreateStatic(inName);
 }
 
-// A binary block as property text: two lower-case hexadecimal digits per byte.
-std::string EncodeBinary(const MF::BinaryData& inData)
-{
-    static constexpr char kDigits[] = "0123456789abcdef";
-    std::string text;
-    text.reserve(inData.GetSize() * 2);
-    for (const std::uint8_t byte : inData.GetBytes())
-    {
-        text += kDigits[byte >> 4];
-        text += kDigits[byte & 15];
-    }
-    return text;
-}
-
 std::string PointText(const TX::TransitionPoint& inPoint)
 {
     return FormatPropertyValue(double{inPoint.mX}) + "," + FormatPropertyValue(double{inPoint.mY});
@@ -56,7 +42,7 @@ RenderableNodeTransitionImpl::RenderableNodeTransitionImpl(const TransitionNodeS
     const TX::TransitionParameters& p = mParameters;
     SetProperty(Key("TransitionNode::TransitionMatchName"), mTransition->GetMatchName(), true);
     SetProperty(Key("TransitionNode::TransitionOpaqueData"),
-                EncodeBinary(mTransition->GetOpaqueData()), true);
+                FormatPropertyValue(mTransition->GetOpaqueData()), true);
     SetProperty(Key("TransitionNode::TransitionStartPosition"), PointText(p.mStartPosition), true);
     SetProperty(Key("TransitionNode::TransitionEndPosition"), PointText(p.mEndPosition), true);
     SetProperty(Key("TransitionNode::TransitionCenterPosition"), PointText(p.mCenterPosition),

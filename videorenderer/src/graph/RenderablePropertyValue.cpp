@@ -125,4 +125,17 @@ bool ParsePropertyValue(std::string_view inText, mvxmediatypes::TickTime& outVal
     return true;
 }
 
+MF::RenderablePropertyValue FormatPropertyValue(const MF::BinaryData& inValue)
+{
+    static constexpr char kDigits[] = "0123456789abcdef";
+    MF::RenderablePropertyValue text;
+    text.reserve(inValue.GetSize() * 2);
+    for (const std::uint8_t byte : inValue.GetBytes())
+    {
+        text += kDigits[byte >> 4];
+        text += kDigits[byte & 15];
+    }
+    return text;
+}
+
 } // namespace ML
