@@ -23,19 +23,10 @@ WIDTH=1920
 HEIGHT=1080
 
 JOB="$BUILD_DIR/bin/effect_job"
-if [ ! -x "$JOB" ]; then
-  echo "effects: $JOB not found; build the target effect_job first" >&2
-  exit 1
-fi
-if ! command -v ffmpeg >/dev/null; then
-  echo "effects: ffmpeg not found; run scripts/install-bench-deps" >&2
-  exit 1
-fi
-
-if [ -z "${WORK_DIR:-}" ]; then
-  WORK_DIR="$(mktemp -d)"
-  trap 'rm -rf "$WORK_DIR"' EXIT
-fi
+SCRIPT=effects
+source "$ROOT/bench/compare/common.sh"
+need_built "$JOB" effect_job
+need_tools ffmpeg
 INPUT="$WORK_DIR/input.bgra"
 if [ ! -s "$INPUT" ]; then
   echo "effects: generating $FRAMES frames of ${WIDTH}x${HEIGHT} in $WORK_DIR" >&2

@@ -42,16 +42,10 @@ MODES="${MODES:-1t def}"
 JOBS="${JOBS:-J1 J2 J3}"
 VRENDER="$BUILD_DIR/bin/vrender"
 
-[ -x "$VRENDER" ] || { echo "jobs: $VRENDER not found; build the target vrender first" >&2; exit 2; }
-for tool in ffmpeg melt python3; do
-  command -v "$tool" >/dev/null || { echo "jobs: $tool not found; run scripts/install-bench-deps" >&2; exit 2; }
-done
-[ -x /usr/bin/time ] || { echo "jobs: /usr/bin/time not found; run scripts/install-bench-deps" >&2; exit 2; }
-
-if [ -z "${WORK_DIR:-}" ]; then
-  WORK_DIR="$(mktemp -d)"
-  trap 'rm -rf "$WORK_DIR"' EXIT
-fi
+SCRIPT=jobs
+source "$ROOT/bench/compare/common.sh"
+need_built "$VRENDER" vrender
+need_tools ffmpeg melt python3 time
 MEDIA="$WORK_DIR/media"
 mkdir -p "$MEDIA" "$WORK_DIR/f50"
 FF=(ffmpeg -hide_banner -nostdin -loglevel error -nostats)

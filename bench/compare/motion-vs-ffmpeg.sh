@@ -22,19 +22,10 @@ OFFSET_X=480
 OFFSET_Y=270
 
 JOB="$BUILD_DIR/bin/ir_motion_job"
-if [ ! -x "$JOB" ]; then
-  echo "motion-vs-ffmpeg: $JOB not found; build the target ir_motion_job first" >&2
-  exit 1
-fi
-if ! command -v ffmpeg >/dev/null; then
-  echo "motion-vs-ffmpeg: ffmpeg not found; run scripts/install-bench-deps" >&2
-  exit 1
-fi
-
-if [ -z "${WORK_DIR:-}" ]; then
-  WORK_DIR="$(mktemp -d)"
-  trap 'rm -rf "$WORK_DIR"' EXIT
-fi
+SCRIPT=motion-vs-ffmpeg
+source "$ROOT/bench/compare/common.sh"
+need_built "$JOB" ir_motion_job
+need_tools ffmpeg
 BG="$WORK_DIR/background.bgra"
 FG="$WORK_DIR/foreground.bgra"
 

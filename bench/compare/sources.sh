@@ -25,14 +25,10 @@ CORES="${CORES:-1}"
 JOBS="${JOBS:-passthrough,scale,deinterlace,halfspeed,png}"
 VRENDER="$BUILD_DIR/bin/vrender"
 
-[ -x "$VRENDER" ] || { echo "sources: $VRENDER not found; build the target vrender first" >&2; exit 2; }
-command -v ffmpeg >/dev/null || { echo "sources: ffmpeg not found; run scripts/install-bench-deps" >&2; exit 2; }
-[ -x /usr/bin/time ] || { echo "sources: /usr/bin/time not found; run scripts/install-bench-deps" >&2; exit 2; }
-
-if [ -z "${WORK_DIR:-}" ]; then
-  WORK_DIR="$(mktemp -d)"
-  trap 'rm -rf "$WORK_DIR"' EXIT
-fi
+SCRIPT=sources
+source "$ROOT/bench/compare/common.sh"
+need_built "$VRENDER" vrender
+need_tools ffmpeg time
 CLIP="$WORK_DIR/clip-1080p-420.y4m"
 if [ ! -s "$CLIP" ]; then
   echo "sources: generating $FRAMES frames of 1920x1080 4:2:0 in $CLIP" >&2

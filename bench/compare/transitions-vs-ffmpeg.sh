@@ -23,13 +23,11 @@ FRAMES="${FRAMES:-50}"
 RUNS="${RUNS:-3}"
 BENCH="$BUILD_DIR/bin/bench_transitions"
 
-[ -x "$BENCH" ] || { echo "transitions-vs-ffmpeg: $BENCH not found; build the target bench_transitions first" >&2; exit 2; }
-command -v ffmpeg >/dev/null || { echo "transitions-vs-ffmpeg: ffmpeg not found; run scripts/install-bench-deps" >&2; exit 2; }
+SCRIPT=transitions-vs-ffmpeg
+source "$ROOT/bench/compare/common.sh"
+need_built "$BENCH" bench_transitions
+need_tools ffmpeg
 
-if [ -z "${WORK_DIR:-}" ]; then
-  WORK_DIR="$(mktemp -d)"
-  trap 'rm -rf "$WORK_DIR"' EXIT
-fi
 FF=(ffmpeg -hide_banner -nostdin -loglevel error -nostats)
 RAW=(-f rawvideo -pix_fmt gbrp -s 1920x1080 -r 25)
 if [ ! -s "$WORK_DIR/b.gbrp" ]; then
